@@ -1,0 +1,85 @@
+#pragma once
+
+#include <atomic>
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+#include <utility>
+
+namespace ironmoat {
+
+/// From which threads a block's references may be taken and given back.
+///
+/// `oneThread` blocks count without atomic operations: the service marks the blocks of one request
+/// so, because a message, its records and its reply live and die inside one call on one thread.
+/// Everything handed to a daemon is `anyThread`.
+enum class Sharing : std::uint8_t { anyThread, oneThread };
+
+/// Immutable bytes with a reference count in front; the memory behind every String and Data.
+/// Written once by BlockBuilder, then only read. At most 4 GiB - 1.
+class Block {
+ public:
+  Block(const Block&) = delete;
+  Block& operator=(const Block&) = delete;
+
+  [[nodiscard]] const char* bytes() const noexcept {
+    return reinterpret_cast<const char*>(this + 1);
+  }
+  [[nodiscard]] std::uint32_t size() const noexcept { return size_; }
+  [[nodiscard]] Sharing sharing() const noexcept { return sharing_; }
+
+  void retain() noexcept {
+    if (sharing_ == Sharing::oneThread) {
+      references_.store(references_.load(std::memory_order_relaxed) + 1, std::memory_order_relaxed);
+    } else {
+      references_.fetch_add(1, std::memory_order_relaxed);
+    }
+  }
+
+  void release() noexcept {
+    if (sharing_ == Sharing::oneThread) {
+      const std::uint64_t left = references_.load(std::memory_order_relaxed) - 1;
+      references_.store(left, std::memory_order_relaxed);
+      if (left == 0) std::free(this);
+    } else if (references_.fetch_sub(1, std::memory_order_acq_rel) == 1) {
+      std::free(this);
+    }
+  }
+
+ private:
+  friend class BlockBuilder;
+  explicit Block(Sharing sharing) noexcept : sharing_(sharing) {}
+
+  std::atomic<std::uint64_t> references_{1};  // 64 bits: no sender can make it wrap
+  std::uint32_t size_ = 0;
+  Sharing sharing_;
+};
+
+/// An owning reference to a Block, or none.
+class BlockRef {
+ public:
+  BlockRef() noexcept = default;
+  /// Takes over a reference that the caller holds.
+  static BlockRef adopt(Block* block) noexcept { return BlockRef(block); }
+  BlockRef(const BlockRef& other) noexcept : block_(other.block_) {
+    if (block_ != nullptr) block_->retain();
+  }
+  BlockRef(BlockRef&& other) noexcept : block_(std::exchange(other.block_, nullptr)) {}
+  BlockRef& operator=(BlockRef other) noexcept {
+    std::swap(block_, other.block_);
+    return *this;
+  }
+  ~BlockRef() {
+    if (block_ != nullptr) block_->release();
+  }
+
+  [[nodiscard]] Block* get() const noexcept { return block_; }
+  [[nodiscard]] Block* operator->() const noexcept { return block_; }
+  explicit operator bool() const noexcept { return block_ != nullptr; }
+
+ private:
+  explicit BlockRef(Block* block) noexcept : block_(block) {}
+  Block* block_ = nullptr;
+};
+
+}  // namespace ironmoat

@@ -1,0 +1,62 @@
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+#include <utility>
+
+namespace ironmoat {
+
+/// A message was refused. The same bytes give the same error, always.
+///
+/// `what()` is a sentence for people that never repeats the sender's text.
+class DecodingError : public std::runtime_error {
+ public:
+  enum class Kind : std::uint8_t {
+    malformed,      ///< the bytes are no property list; `offset()` says where
+    limitExceeded,  ///< over one of ironmoat/limits.h
+    typeMismatch,   ///< a value of the wrong kind
+    outOfRange,     ///< an integer that does not fit its field
+    keyNotFound,    ///< a required key is missing
+  };
+
+  DecodingError(Kind kind, std::string path, const std::string& message,
+                std::optional<std::uint64_t> offset = std::nullopt)
+      : std::runtime_error(message), kind_(kind), path_(std::move(path)), offset_(offset) {}
+
+  [[nodiscard]] Kind kind() const noexcept { return kind_; }
+  /// Where, in wire keys: `mml[1].dtl[0].U`; empty for the message itself; for a missing key the
+  /// path that it would have.
+  [[nodiscard]] const std::string& path() const noexcept { return path_; }
+  /// Byte of the message at which it stops being a property list.
+  [[nodiscard]] std::optional<std::uint64_t> offset() const noexcept { return offset_; }
+
+ private:
+  Kind kind_;
+  std::string path_;
+  std::optional<std::uint64_t> offset_;
+};
+
+/// No answer could be had about a message: nothing is known of its bytes.
+class ServiceError : public std::runtime_error {
+ public:
+  enum class Kind : std::uint8_t {
+    crashed,      ///< the service died over this request
+    timedOut,     ///< no reply within the deadline
+    unavailable,  ///< no service could be started or reached, or it cannot serve this request
+  };
+
+  ServiceError(Kind kind, const std::string& message) : std::runtime_error(message), kind_(kind) {}
+  [[nodiscard]] Kind kind() const noexcept { return kind_; }
+
+ private:
+  Kind kind_;
+};
+
+/// The enumerator's own name, as in `typeMismatch`.
+std::string_view nameOf(DecodingError::Kind kind) noexcept;
+std::string_view nameOf(ServiceError::Kind kind) noexcept;
+
+}  // namespace ironmoat

@@ -1,0 +1,31 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+/// What one message may cost. Over any of these a message is refused with `limitExceeded`; nothing
+/// is allocated ahead of the check and nothing of the message is kept.
+namespace ironmoat::limits {
+
+/// Bytes of one message. Bounds frames, blocks and every 32-bit offset into them.
+inline constexpr std::size_t messageBytes = std::size_t{16} << 20;
+
+/// Containers inside one another, the top-level dictionary counted as the first; a payload within
+/// a payload takes two (the list and the dictionary). Stops stack exhaustion: decoding, conversion,
+/// encoding and destruction recurse at most this deep.
+inline constexpr std::uint32_t nestedContainers = 512;
+
+/// Bytes of wire records in lists, slots included, counted before a list is allocated. Stops a few
+/// bytes of input (`<dict/>`, or one shared object referenced over and over) from asking for a
+/// whole record of kilobytes each time.
+inline constexpr std::size_t recordBytes = std::size_t{64} << 20;
+
+/// Bytes of text and data delivered into fields, counted each time a shared value is used. Stops a
+/// shared megabyte referenced thousands of times from becoming gigabytes of reply.
+inline constexpr std::size_t deliveredBytes = std::size_t{64} << 20;
+
+/// Bytes of one reply. No record can exceed it: its text and data are bounded by `deliveredBytes`,
+/// and everything else takes less room in a reply than in `recordBytes`.
+inline constexpr std::size_t replyBytes = std::size_t{144} << 20;
+
+}  // namespace ironmoat::limits

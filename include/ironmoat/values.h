@@ -1,0 +1,162 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <span>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "ironmoat/block.h"
+#include "ironmoat/optional.h"
+
+namespace ironmoat {
+
+/// Signed 64-bit integers. Two C++ types, so that a field declared as one is never wired to a field
+/// declared as the other.
+using Int = long;         // NOLINT(google-runtime-int)
+using Int64 = long long;  // NOLINT(google-runtime-int)
+using Bool = bool;
+static_assert(sizeof(Int) == 8 && sizeof(Int64) == 8);
+
+template <class T>
+using List = std::vector<T>;
+
+namespace detail {
+
+/// A range of a Block that keeps the block alive. Absent is all zero; an empty range holds no block
+/// and is told from absence by its offset.
+class Slice {
+ public:
+  Slice() noexcept = default;
+  /// Requires offset + length <= block->size(). Takes a reference of its own.
+  Slice(Block* block, std::uint32_t offset, std::uint32_t length) noexcept {
+    if (length == 0) return;
+    block->retain();
+    block_ = block;
+    offset_ = offset;
+    length_ = length;
+  }
+  Slice(const Slice& other) noexcept
+      : block_(other.block_), offset_(other.offset_), length_(other.length_) {
+    if (block_ != nullptr) block_->retain();
+  }
+  Slice(Slice&& other) noexcept
+      : block_(std::exchange(other.block_, nullptr)),
+        offset_(std::exchange(other.offset_, kEmpty)),
+        length_(std::exchange(other.length_, 0)) {}
+  Slice& operator=(Slice other) noexcept {
+    std::swap(block_, other.block_);
+    std::swap(offset_, other.offset_);
+    std::swap(length_, other.length_);
+    return *this;
+  }
+  ~Slice() {
+    if (block_ != nullptr) block_->release();
+  }
+
+  static Slice absent() noexcept {
+    Slice slice;
+    slice.offset_ = 0;
+    return slice;
+  }
+  [[nodiscard]] bool isAbsent() const noexcept { return block_ == nullptr && offset_ == 0; }
+
+  [[nodiscard]] const char* begin() const noexcept {
+    return block_ == nullptr ? "" : block_->bytes() + offset_;
+  }
+  [[nodiscard]] std::uint32_t length() const noexcept { return length_; }
+  [[nodiscard]] std::string_view view() const noexcept { return {begin(), length_}; }
+  [[nodiscard]] Block* block() const noexcept { return block_; }
+  [[nodiscard]] std::uint32_t offset() const noexcept { return offset_; }
+
+  /// The same bytes in a block of their own.
+  static Slice copyOf(std::string_view bytes, Sharing sharing = Sharing::anyThread);
+
+ private:
+  static constexpr std::uint32_t kEmpty = 1;
+
+  Block* block_ = nullptr;
+  std::uint32_t offset_ = kEmpty;
+  std::uint32_t length_ = 0;
+};
+
+}  // namespace detail
+
+/// Immutable Unicode text, always valid UTF-8, at most 4 GiB - 1 bytes. Copying is O(1).
+///
+/// A String taken from a record is a slice of that record's whole message: keeping one keeps the
+/// message's memory. `detached()` gives a copy that keeps nothing else. Copies may be used from
+/// several threads at once.
+class String {
+ public:
+  String() noexcept = default;
+  /// Copies the text. Throws std::invalid_argument when it is not valid UTF-8.
+  String(std::string_view text);  // NOLINT(google-explicit-constructor)
+  String(const char* text)
+      : String(std::string_view(text)) {}  // NOLINT(google-explicit-constructor)
+  /// Internal: the caller has checked that the slice is valid UTF-8.
+  explicit String(detail::Slice validText) noexcept : slice_(std::move(validText)) {}
+
+  [[nodiscard]] std::string_view view() const noexcept { return slice_.view(); }
+  operator std::string_view() const noexcept {
+    return view();
+  }  // NOLINT(google-explicit-constructor)
+  /// Bytes of UTF-8, not characters.
+  [[nodiscard]] std::size_t size() const noexcept { return slice_.length(); }
+  [[nodiscard]] bool empty() const noexcept { return size() == 0; }
+  [[nodiscard]] String detached() const { return String(detail::Slice::copyOf(view())); }
+
+  friend bool operator==(const String& a, const String& b) noexcept { return a.view() == b.view(); }
+
+ private:
+  friend struct detail::Niche<String>;
+  detail::Slice slice_;
+};
+
+/// Immutable bytes, at most 4 GiB - 1. Copying is O(1); lifetime and threads as for String.
+class Data {
+ public:
+  Data() noexcept = default;
+  /// Copies the bytes.
+  explicit Data(std::span<const std::uint8_t> bytes);
+  explicit Data(std::string_view bytes) : slice_(detail::Slice::copyOf(bytes)) {}
+  explicit Data(detail::Slice slice) noexcept : slice_(std::move(slice)) {}
+
+  [[nodiscard]] std::span<const std::uint8_t> bytes() const noexcept {
+    return {reinterpret_cast<const std::uint8_t*>(slice_.begin()), slice_.length()};
+  }
+  [[nodiscard]] std::string_view view() const noexcept { return slice_.view(); }
+  [[nodiscard]] std::size_t size() const noexcept { return slice_.length(); }
+  [[nodiscard]] bool empty() const noexcept { return size() == 0; }
+  [[nodiscard]] Data detached() const { return Data(detail::Slice::copyOf(view())); }
+  [[nodiscard]] const detail::Slice& slice() const noexcept { return slice_; }
+
+  friend bool operator==(const Data& a, const Data& b) noexcept { return a.view() == b.view(); }
+
+ private:
+  friend struct detail::Niche<Data>;
+  detail::Slice slice_;
+};
+
+namespace detail {
+
+template <class T>
+struct SliceNiche {
+  static constexpr bool exists = true;
+  static T absent() noexcept { return T(Slice::absent()); }
+};
+template <>
+struct Niche<String> : SliceNiche<String> {
+  static bool isAbsent(const String& value) noexcept { return value.slice_.isAbsent(); }
+};
+template <>
+struct Niche<Data> : SliceNiche<Data> {
+  static bool isAbsent(const Data& value) noexcept { return value.slice_.isAbsent(); }
+};
+
+}  // namespace detail
+
+static_assert(sizeof(Optional<String>) == 16 && sizeof(Optional<Data>) == 16);
+
+}  // namespace ironmoat

@@ -1,0 +1,94 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <span>
+#include <string_view>
+
+#include "ironmoat/values.h"
+#include "plist/scratch_array.h"
+#include "values/block_builder.h"
+
+namespace ironmoat::plist {
+
+enum class Kind : std::uint8_t {
+  dictionary,
+  array,
+  string,
+  data,
+  integer,          ///< fits in a signed 64-bit integer
+  unsignedInteger,  ///< 2^63 to 2^64 - 1: an integer that no field can hold
+  boolean,
+  real,
+  date,
+  uid,
+};
+
+/// For people: "dictionary", "data", "integer", ...
+std::string_view nameOf(Kind kind) noexcept;
+
+/// A node's place in its document.
+using NodeIndex = std::uint32_t;
+
+/// One value, in 16 bytes.
+struct Node {
+  Kind kind;
+  bool transformed;       ///< string, data: the bytes stand in the side block, not in the source
+  std::uint16_t height;   ///< containers on the longest way down, this one included; scalars 0
+  std::uint32_t count;    ///< dictionary: entries; array: elements; string, data: bytes
+  std::uint64_t payload;  ///< containers: first child; string, data: offset; scalars: the value
+};
+static_assert(sizeof(Node) == 16);
+
+/// A whole property list, flat: nodes, and for each container a span of child indices (of a
+/// dictionary first all keys, then all values). Text and data are ranges of two blocks: the source,
+/// where the message has them literally, and a side block for what had to be transformed (UTF-16,
+/// entities, base64).
+///
+/// Whoever fills a document establishes, and every reader of it relies on: indices and ranges are
+/// in bounds; keys are strings; strings are valid UTF-8; there is no cycle below the root and no
+/// way down through more than limits::nestedContainers containers. A node may be the child of
+/// several containers.
+class Document {
+ public:
+  Document() noexcept = default;
+  Document(const Document&) = delete;
+  Document& operator=(const Document&) = delete;
+
+  [[nodiscard]] NodeIndex root() const noexcept { return root_; }
+  [[nodiscard]] const Node& node(NodeIndex index) const noexcept { return nodes_[index]; }
+
+  [[nodiscard]] std::span<const NodeIndex> elements(const Node& array) const noexcept {
+    return children_.span(array.payload, array.count);
+  }
+  [[nodiscard]] std::span<const NodeIndex> keys(const Node& dictionary) const noexcept {
+    return children_.span(dictionary.payload, dictionary.count);
+  }
+  [[nodiscard]] std::span<const NodeIndex> values(const Node& dictionary) const noexcept {
+    return children_.span(dictionary.payload + dictionary.count, dictionary.count);
+  }
+
+  /// The bytes of a string or data node; valid as long as the document.
+  [[nodiscard]] std::string_view text(const Node& node) const noexcept {
+    const Block* block = (node.transformed ? side_ : source_).get();
+    return block == nullptr ? std::string_view()
+                            : std::string_view(block->bytes() + node.payload, node.count);
+  }
+  /// The same as an owning slice, which outlives the document.
+  [[nodiscard]] detail::Slice slice(const Node& node) const noexcept {
+    return {(node.transformed ? side_ : source_).get(), static_cast<std::uint32_t>(node.payload),
+            node.count};
+  }
+
+ private:
+  friend class BinaryReader;
+  friend class DocumentBuilder;
+
+  ScratchArray<Node, 96> nodes_;
+  ScratchArray<NodeIndex, 160> children_;
+  NodeIndex root_ = 0;
+  BlockRef source_;
+  BlockRef side_;
+};
+
+}  // namespace ironmoat::plist

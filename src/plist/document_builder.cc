@@ -1,0 +1,42 @@
+#include "plist/document_builder.h"
+
+#include <algorithm>
+#include <cstring>
+
+#include "ironmoat/errors.h"
+#include "ironmoat/limits.h"
+#include "plist/refusal.h"
+
+namespace ironmoat::plist {
+
+void DocumentBuilder::begin(Kind kind) {
+  if (open_.size() == limits::nestedContainers) throw tooDeep();
+  const auto index = static_cast<NodeIndex>(document_.nodes_.size());
+  add({kind, false, 0, 0, 0});
+  open_.push({index, static_cast<std::uint32_t>(pending_.size()), 0});
+}
+
+void DocumentBuilder::end() {
+  const Open closed = open_.back();
+  open_.shrinkTo(open_.size() - 1);
+  const std::size_t children = pending_.size() - closed.firstPending;
+  Node& node = document_.nodes_[closed.node];
+  node.height = static_cast<std::uint16_t>(closed.height + 1);
+  node.payload = document_.children_.size();
+  NodeIndex* place = document_.children_.extend(children);
+  if (node.kind == Kind::dictionary) {
+    const std::size_t entries = children / 2;
+    node.count = static_cast<std::uint32_t>(entries);
+    for (std::size_t i = 0; i < entries; ++i) {
+      place[i] = pending_[closed.firstPending + 2 * i];
+      place[entries + i] = pending_[closed.firstPending + 2 * i + 1];
+    }
+  } else {
+    node.count = static_cast<std::uint32_t>(children);
+    for (std::size_t i = 0; i < children; ++i) place[i] = pending_[closed.firstPending + i];
+  }
+  pending_.shrinkTo(closed.firstPending);
+  if (!open_.empty()) open_.back().height = std::max(open_.back().height, node.height);
+}
+
+}  // namespace ironmoat::plist

@@ -1,0 +1,82 @@
+#include "values/utf8.h"
+
+#include <cstdint>
+#include <cstring>
+
+namespace ironmoat {
+
+std::size_t asciiPrefix(std::string_view text) noexcept {
+  constexpr std::uint64_t kHighBits = 0x8080808080808080U;
+  std::size_t at = 0;
+  for (; text.size() - at >= 16; at += 16) {
+    std::uint64_t words[2];
+    std::memcpy(words, text.data() + at, sizeof words);
+    if (((words[0] | words[1]) & kHighBits) != 0) break;
+  }
+  while (at < text.size() && static_cast<unsigned char>(text[at]) < 0x80) ++at;
+  return at;
+}
+
+std::size_t utf8SequenceLength(std::string_view text) noexcept {
+  const auto byte = [&](std::size_t i) { return static_cast<unsigned char>(text[i]); };
+  const unsigned lead = byte(0);
+  // The second byte's range excludes what is over long, a surrogate or past U+10FFFF.
+  unsigned low = 0x80;
+  unsigned high = 0xBF;
+  std::size_t length = 0;
+  if (lead >= 0xC2 && lead <= 0xDF) {
+    length = 2;
+  } else if (lead >= 0xE0 && lead <= 0xEF) {
+    length = 3;
+    if (lead == 0xE0) low = 0xA0;
+    if (lead == 0xED) high = 0x9F;
+  } else if (lead >= 0xF0 && lead <= 0xF4) {
+    length = 4;
+    if (lead == 0xF0) low = 0x90;
+    if (lead == 0xF4) high = 0x8F;
+  }
+  if (length == 0 || text.size() < length || byte(1) < low || byte(1) > high) return 0;
+  for (std::size_t i = 2; i < length; ++i) {
+    if ((byte(i) & 0xC0) != 0x80) return 0;
+  }
+  return length;
+}
+
+std::size_t validUtf8Prefix(std::string_view text) noexcept {
+  std::size_t at = asciiPrefix(text);
+  while (at < text.size()) {
+    const std::size_t length = utf8SequenceLength(text.substr(at));
+    if (length == 0) break;
+    at += length;
+    if (at < text.size() && static_cast<unsigned char>(text[at]) < 0x80) {
+      at += asciiPrefix(text.substr(at));
+    }
+  }
+  return at;
+}
+
+std::size_t writeUtf8(char32_t codePoint, char* out) noexcept {
+  const auto put = [&](std::size_t i, char32_t bits) { out[i] = static_cast<char>(bits); };
+  if (codePoint < 0x80) {
+    put(0, codePoint);
+    return 1;
+  }
+  if (codePoint < 0x800) {
+    put(0, 0xC0 | (codePoint >> 6));
+    put(1, 0x80 | (codePoint & 0x3F));
+    return 2;
+  }
+  if (codePoint < 0x10000) {
+    put(0, 0xE0 | (codePoint >> 12));
+    put(1, 0x80 | ((codePoint >> 6) & 0x3F));
+    put(2, 0x80 | (codePoint & 0x3F));
+    return 3;
+  }
+  put(0, 0xF0 | (codePoint >> 18));
+  put(1, 0x80 | ((codePoint >> 12) & 0x3F));
+  put(2, 0x80 | ((codePoint >> 6) & 0x3F));
+  put(3, 0x80 | (codePoint & 0x3F));
+  return 4;
+}
+
+}  // namespace ironmoat

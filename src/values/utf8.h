@@ -1,0 +1,27 @@
+#pragma once
+
+#include <cstddef>
+#include <string_view>
+
+namespace ironmoat {
+
+/// How many leading bytes are ASCII.
+std::size_t asciiPrefix(std::string_view text) noexcept;
+
+/// Length in bytes of the longest prefix that is well-formed UTF-8 (no surrogates, nothing over
+/// long, nothing past U+10FFFF).
+std::size_t validUtf8Prefix(std::string_view text) noexcept;
+
+inline bool isValidUtf8(std::string_view text) noexcept {
+  return validUtf8Prefix(text) == text.size();
+}
+
+/// Length in bytes of the well-formed UTF-8 sequence at the start of `text`, which begins with a
+/// byte of 0x80 or more; 0 when there is none.
+std::size_t utf8SequenceLength(std::string_view text) noexcept;
+
+/// Writes `codePoint` (a Unicode scalar value) as UTF-8 to `out`, which has room for 4 bytes;
+/// returns the bytes written.
+std::size_t writeUtf8(char32_t codePoint, char* out) noexcept;
+
+}  // namespace ironmoat
