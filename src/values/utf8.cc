@@ -79,4 +79,27 @@ std::size_t writeUtf8(char32_t codePoint, char* out) noexcept {
   return 4;
 }
 
+std::u16string utf16FromUtf8(std::string_view text) {
+  std::u16string units;
+  units.reserve(text.size());
+  for (std::size_t at = 0; at < text.size();) {
+    const auto lead = static_cast<unsigned char>(text[at++]);
+    char32_t codePoint = lead;
+    if (lead >= 0x80) {
+      const int following = lead >= 0xF0 ? 3 : lead >= 0xE0 ? 2 : 1;
+      codePoint = lead & (0x3FU >> following);
+      for (int i = 0; i < following; ++i) {
+        codePoint = codePoint << 6 | (static_cast<unsigned char>(text[at++]) & 0x3F);
+      }
+    }
+    if (codePoint >= 0x10000) {
+      units.push_back(static_cast<char16_t>(0xD800 + ((codePoint - 0x10000) >> 10)));
+      units.push_back(static_cast<char16_t>(0xDC00 + (codePoint & 0x3FF)));
+    } else {
+      units.push_back(static_cast<char16_t>(codePoint));
+    }
+  }
+  return units;
+}
+
 }  // namespace ironmoat

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstddef>
+#include <string>
 #include <string_view>
 
 namespace ironmoat {
@@ -23,5 +24,8 @@ std::size_t utf8SequenceLength(std::string_view text) noexcept;
 /// Writes `codePoint` (a Unicode scalar value) as UTF-8 to `out`, which has room for 4 bytes;
 /// returns the bytes written.
 std::size_t writeUtf8(char32_t codePoint, char* out) noexcept;
+
+/// Well-formed UTF-8 as UTF-16.
+std::u16string utf16FromUtf8(std::string_view text);
 
 }  // namespace ironmoat

@@ -1,0 +1,67 @@
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <future>
+#include <memory>
+#include <string>
+
+#include "ironmoat/errors.h"
+#include "ironmoat/message_schema.h"
+#include "ironmoat/values.h"
+
+namespace ironmoat {
+
+namespace client {
+class Connection;
+}
+
+/// Hands messages to a service process of its own and gets records back.
+///
+/// The process is started on first use and again whenever it is gone; it ends with the client. When
+/// it dies or hangs, the messages it had been given are tried again one at a time on a fresh one:
+/// the message that is at fault fails, every other one gets its record. Each request has exactly
+/// one outcome.
+///
+/// Any number of threads may use one client at once, with any number of requests in flight. The
+/// client starts one thread, raises no signal and changes no signal's handling. After fork() it
+/// belongs to the parent: in the child every request fails with `unavailable`, and destroying the
+/// copy does nothing.
+class Client {
+ public:
+  struct Options {
+    /// The service's executable; empty: where the library was installed with it.
+    std::string program;
+    /// How long the service may work on one message. A request that is past it is tried once more,
+    /// alone, before it fails with `timedOut`; waiting for other requests does not count.
+    std::chrono::milliseconds deadline{2000};
+    /// Bytes of requests without an outcome, with some 500 more for each request. `submit` and
+    /// `unpack` wait for room, in the order of the calls; a message that is larger goes alone.
+    std::size_t maxBytesInFlight = std::size_t{64} << 20;
+  };
+
+  Client();
+  explicit Client(Options options);
+  Client(const Client&) = delete;
+  Client& operator=(const Client&) = delete;
+  /// Requests still in flight fail with ServiceError `unavailable`. Leaves no process, thread or
+  /// descriptor behind.
+  ~Client();
+
+  /// Waits for the record. Throws DecodingError when the message is refused, ServiceError when no
+  /// answer could be had.
+  template <MessageSchema R>
+  R unpack(const Data& message) {
+    return submit<R>(message).get();
+  }
+
+  /// The same without waiting for the outcome; the future throws what `unpack` would. `message` is
+  /// shared, not copied. Records wait in their futures, in the memory of whoever holds these.
+  template <MessageSchema R>
+  std::future<R> submit(const Data& message);
+
+ private:
+  std::unique_ptr<client::Connection> connection_;
+};
+
+}  // namespace ironmoat

@@ -1,0 +1,39 @@
+#pragma once
+
+#include <string_view>
+#include <utility>
+
+#include "ironmoat/fields.h"
+#include "ironmoat/values.h"
+
+namespace ironmoat {
+
+/// What DrelUserPayloadHttpHeaders is made with, in label order; `adhocServiceOverride` is labelled
+/// `with`.
+struct DrelUserPayloadHttpHeadersArguments {
+  Optional<String> adhocServiceOverride;
+  Optional<String> responseIdentifierString;
+  Optional<String> strictTransportSecurity;
+  Optional<String> traceId;
+  Optional<String> splunkHint;
+  Optional<String> asHttpHeader;
+
+  using R = DrelUserPayloadHttpHeadersArguments;
+  using Fields =
+      FieldList<R, &R::adhocServiceOverride, &R::responseIdentifierString,
+                &R::strictTransportSecurity, &R::traceId, &R::splunkHint, &R::asHttpHeader>;
+};
+static_assert(DrelUserPayloadHttpHeadersArguments::Fields::check());
+
+/// HTTP header values, each opaque text.
+struct DrelUserPayloadHttpHeaders : DrelUserPayloadHttpHeadersArguments {
+  using Arguments = DrelUserPayloadHttpHeadersArguments;
+
+  [[nodiscard]] static DrelUserPayloadHttpHeaders with(Arguments arguments);
+
+ private:
+  explicit DrelUserPayloadHttpHeaders(Arguments&& arguments) noexcept
+      : Arguments(std::move(arguments)) {}
+};
+
+}  // namespace ironmoat

@@ -1,0 +1,48 @@
+#pragma once
+
+#include <string_view>
+#include <utility>
+
+#include "ironmoat/fields.h"
+#include "ironmoat/http_headers.h"
+#include "ironmoat/values.h"
+
+namespace ironmoat {
+
+/// What VeskCommandWebTunnelResponse is made with, in label order; `command` is labelled `with`.
+struct VeskCommandWebTunnelResponseArguments {
+  Int command = 0;
+  Optional<Int> messageId;
+  Optional<Data> messageUUID;
+  Optional<Int> responseStatus;
+  Optional<String> contentType;
+  Optional<Int64> epochTimeNanos;
+  Optional<String> httpUrl;
+  Optional<DrelUserPayloadHttpHeaders> httpHeaders;
+  Optional<Data> httpBody;
+  Optional<String> httpBodyUrl;
+  Optional<Data> httpBodyKey;
+  Optional<Int> httpResponseStatus;
+  Optional<String> httpErrorMsg;
+
+  using R = VeskCommandWebTunnelResponseArguments;
+  using Fields =
+      FieldList<R, &R::command, &R::messageId, &R::messageUUID, &R::responseStatus, &R::contentType,
+                &R::epochTimeNanos, &R::httpUrl, &R::httpHeaders, &R::httpBody, &R::httpBodyUrl,
+                &R::httpBodyKey, &R::httpResponseStatus, &R::httpErrorMsg>;
+};
+static_assert(VeskCommandWebTunnelResponseArguments::Fields::check());
+
+/// The response to a web-tunnel command: an HTTP exchange beside the fields of a response.
+struct VeskCommandWebTunnelResponse : VeskCommandWebTunnelResponseArguments {
+  using Arguments = VeskCommandWebTunnelResponseArguments;
+  static constexpr std::string_view schemaName = "VeskCommandWebTunnelResponse";
+
+  [[nodiscard]] static VeskCommandWebTunnelResponse with(Arguments arguments);
+
+ private:
+  explicit VeskCommandWebTunnelResponse(Arguments&& arguments) noexcept
+      : Arguments(std::move(arguments)) {}
+};
+
+}  // namespace ironmoat

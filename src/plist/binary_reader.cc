@@ -1,0 +1,346 @@
+#include <algorithm>
+#include <cstdint>
+#include <limits>
+
+#include "ironmoat/errors.h"
+#include "ironmoat/limits.h"
+#include "plist/binary_format.h"
+#include "plist/reader.h"
+#include "plist/refusal.h"
+#include "values/utf8.h"
+
+namespace ironmoat::plist {
+
+using binary::bigEndian;
+using binary::Marker;
+
+/// Three passes, each linear in the message: every object of the table becomes a node; keys are
+/// checked to be text; the graph is measured, and refused when it is cyclic or too deep.
+class BinaryReader {
+ public:
+  BinaryReader(const Data& message, Document& document)
+      : bytes_(message.bytes().data()),
+        size_(message.size()),
+        base_(message.slice().offset()),
+        document_(document),
+        nodes_(document.nodes_),
+        children_(document.children_),
+        side_(message.slice().block() == nullptr ? Sharing::anyThread
+                                                 : message.slice().block()->sharing()) {
+    if (Block* block = message.slice().block(); block != nullptr) {
+      block->retain();
+      document.source_ = BlockRef::adopt(block);
+    }
+  }
+
+  void read() {
+    readTrailer();
+    readObjects();
+    checkKeys();
+    if (parentsFirst_) {
+      measureBackwards();
+    } else {
+      measureFromRoot();
+    }
+    document_.root_ = root_;
+    document_.side_ = side_.finish();
+  }
+
+ private:
+  static constexpr std::uint16_t kTooDeep = limits::nestedContainers + 1;
+  static constexpr std::uint16_t kOpen = std::numeric_limits<std::uint16_t>::max();
+
+  void readTrailer() {
+    constexpr std::size_t kSmallest = binary::kHeader.size() + 1 + 1 + binary::kTrailerSize;
+    if (size_ < kSmallest) throw malformed("binary property list cut short", size_);
+    if (!std::equal(binary::kHeader.begin(), binary::kHeader.end(), bytes_)) {
+      throw malformed("unknown version of the binary form", 6);
+    }
+    const std::size_t trailer = size_ - binary::kTrailerSize;
+    offsetSize_ = bytes_[trailer + 6];
+    referenceSize_ = bytes_[trailer + 7];
+    if (offsetSize_ < 1 || offsetSize_ > binary::kMaxSize) {
+      throw malformed("impossible size of offsets", trailer + 6);
+    }
+    if (referenceSize_ < 1 || referenceSize_ > binary::kMaxSize) {
+      throw malformed("impossible size of references", trailer + 7);
+    }
+    const std::uint64_t count = bigEndian(bytes_ + trailer + 8, 8);
+    const std::uint64_t root = bigEndian(bytes_ + trailer + 16, 8);
+    const std::uint64_t table = bigEndian(bytes_ + trailer + 24, 8);
+    if (table <= binary::kHeader.size() || table >= trailer) {
+      throw malformed("offset table out of bounds", trailer + 24);
+    }
+    // The table fills the room up to the trailer exactly. Dividing keeps the product from wrapping,
+    // and with it every object of the table has its bytes: the count is proven.
+    if (count != (trailer - table) / offsetSize_ || (trailer - table) % offsetSize_ != 0) {
+      throw malformed("offset table does not fit the object count", trailer + 8);
+    }
+    if (root >= count) throw malformed("top object is not in the table", trailer + 16);
+    objectsEnd_ = static_cast<std::size_t>(table);
+    objectCount_ = static_cast<std::size_t>(count);
+    root_ = static_cast<NodeIndex>(root);
+  }
+
+  void readObjects() {
+    Node* nodes = nodes_.extend(objectCount_);
+    // Objects may overlap, but not so much that their sum exceeds the room they share: that bounds
+    // the work by the size of the message.
+    std::size_t room = objectsEnd_ - binary::kHeader.size();
+    for (std::size_t i = 0; i < objectCount_; ++i) {
+      const std::size_t entry = objectsEnd_ + i * offsetSize_;
+      const std::uint64_t offset = bigEndian(bytes_ + entry, offsetSize_);
+      if (offset < binary::kHeader.size() || offset >= objectsEnd_) {
+        throw malformed("object offset out of bounds", entry);
+      }
+      current_ = static_cast<NodeIndex>(i);
+      const std::size_t start = static_cast<std::size_t>(offset);
+      const std::size_t end = readObject(start, nodes[i]);
+      if (end - start > room) throw malformed("objects overlap", start);
+      room -= end - start;
+    }
+  }
+
+  /// Reads the object at `at`, which is inside the object area; returns where it ends.
+  std::size_t readObject(std::size_t at, Node& node) {
+    const std::uint8_t marker = bytes_[at];
+    const std::uint8_t low = marker & 0x0F;
+    const std::size_t body = at + 1;
+    node = {Kind::boolean, false, 0, 0, 0};
+    switch (static_cast<Marker>(marker >> 4)) {
+      case Marker::simple:
+        if (marker != binary::kFalse && marker != binary::kTrue) break;
+        node.payload = marker == binary::kTrue ? 1 : 0;
+        return body;
+      case Marker::integer:
+        if (low > 4) break;
+        return readInteger(at, std::size_t{1} << low, node);
+      case Marker::real:
+        if (low != 2 && low != 3) break;
+        node.kind = Kind::real;
+        return need(body, std::size_t{1} << low, at);
+      case Marker::date:
+        if (low != 3) break;
+        node.kind = Kind::date;
+        return need(body, 8, at);
+      case Marker::uid:
+        node.kind = Kind::uid;
+        return need(body, low + std::size_t{1}, at);
+      case Marker::data:
+      case Marker::ascii:
+        return readBytes(at, node);
+      case Marker::utf16:
+        return readUtf16(at, node);
+      case Marker::array:
+      case Marker::dictionary:
+        return readContainer(at, node);
+    }
+    throw malformed("unknown kind of object", at);
+  }
+
+  /// `start + count`, proven to lie inside the object area.
+  [[nodiscard]] std::size_t need(std::size_t start, std::uint64_t count, std::size_t object) const {
+    if (count > objectsEnd_ - start) throw malformed("object runs out of bounds", object);
+    return start + static_cast<std::size_t>(count);
+  }
+
+  std::size_t readInteger(std::size_t at, std::size_t size, Node& node) const {
+    const std::size_t end = need(at + 1, size, at);
+    const unsigned char* bytes = bytes_ + at + 1;
+    node.kind = Kind::integer;
+    if (size <= 8) {
+      node.payload = bigEndian(bytes, size);  // 8 bytes: two's complement already
+      return end;
+    }
+    const std::uint64_t high = bigEndian(bytes, 8);
+    node.payload = bigEndian(bytes + 8, 8);
+    const bool topBit = (node.payload >> 63) != 0;
+    if (high == 0) {
+      if (topBit) node.kind = Kind::unsignedInteger;
+    } else if (high != std::numeric_limits<std::uint64_t>::max() || !topBit) {
+      throw malformed("integer wider than 64 bits", at);
+    }
+    return end;
+  }
+
+  /// The length of the object at `at` and, in `body`, where what it counts begins.
+  [[nodiscard]] std::uint64_t readLength(std::size_t at, std::size_t& body) const {
+    body = at + 1;
+    const std::uint8_t low = bytes_[at] & 0x0F;
+    if (low != binary::kLengthFollows) return low;
+    const std::size_t marker = body;
+    body = need(marker, 1, at);
+    if (bytes_[marker] < 0x10 || bytes_[marker] > 0x13) {
+      throw malformed("length is not an integer", marker);
+    }
+    const std::size_t size = std::size_t{1} << (bytes_[marker] & 0x0F);
+    const std::size_t digits = body;
+    body = need(digits, size, at);
+    return bigEndian(bytes_ + digits, size);  // a negative one is huge, and does not fit
+  }
+
+  std::size_t readBytes(std::size_t at, Node& node) const {
+    std::size_t body = 0;
+    const std::uint64_t length = readLength(at, body);
+    const std::size_t end = need(body, length, at);
+    node.kind = Kind::data;
+    node.count = static_cast<std::uint32_t>(length);
+    node.payload = base_ + body;
+    if (static_cast<Marker>(bytes_[at] >> 4) == Marker::ascii) {
+      node.kind = Kind::string;
+      const std::string_view text(reinterpret_cast<const char*>(bytes_) + body, node.count);
+      if (const std::size_t ascii = asciiPrefix(text); ascii != text.size()) {
+        throw malformed("ASCII text is not ASCII", body + ascii);
+      }
+    }
+    return end;
+  }
+
+  std::size_t readUtf16(std::size_t at, Node& node) {
+    std::size_t body = 0;
+    const std::uint64_t units = readLength(at, body);
+    if (units > objectsEnd_ / 2) throw malformed("object runs out of bounds", at);
+    const std::size_t end = need(body, units * 2, at);
+    const std::size_t start = side_.size();
+    // A unit takes at most 3 bytes of UTF-8; a pair takes 4.
+    char* out = side_.extend(static_cast<std::size_t>(units) * 3);
+    char* const first = out;
+    for (std::size_t i = body; i < end; i += 2) {
+      char32_t unit = static_cast<char32_t>(bytes_[i] << 8 | bytes_[i + 1]);
+      if (unit >= 0xD800 && unit <= 0xDFFF) {
+        const bool pair = unit < 0xDC00 && end - i >= 4 && (bytes_[i + 2] & 0xFC) == 0xDC;
+        if (!pair) throw malformed("unpaired surrogate", i);
+        const auto low = static_cast<char32_t>(bytes_[i + 2] << 8 | bytes_[i + 3]);
+        unit = 0x10000 + ((unit - 0xD800) << 10) + (low - 0xDC00);
+        i += 2;
+      }
+      out += writeUtf8(unit, out);
+    }
+    side_.truncate(start + static_cast<std::size_t>(out - first));
+    node = {Kind::string, true, 0, static_cast<std::uint32_t>(out - first), start};
+    return end;
+  }
+
+  std::size_t readContainer(std::size_t at, Node& node) {
+    const bool dictionary = static_cast<Marker>(bytes_[at] >> 4) == Marker::dictionary;
+    std::size_t body = 0;
+    const std::uint64_t count = readLength(at, body);
+    // Each element takes a byte at least, so that neither product can wrap.
+    if (count > objectsEnd_) throw malformed("object runs out of bounds", at);
+    const std::size_t references = static_cast<std::size_t>(count) * (dictionary ? 2 : 1);
+    const std::size_t end = need(body, references * referenceSize_, at);
+    node.kind = dictionary ? Kind::dictionary : Kind::array;
+    node.count = static_cast<std::uint32_t>(count);
+    node.payload = children_.size();
+    NodeIndex* children = children_.extend(references);
+    for (std::size_t i = 0; i < references; ++i) {
+      const std::size_t place = body + i * referenceSize_;
+      const std::uint64_t reference = bigEndian(bytes_ + place, referenceSize_);
+      if (reference >= objectCount_) throw malformed("reference is not in the table", place);
+      children[i] = static_cast<NodeIndex>(reference);
+      // Scalars may be shared from anywhere: they close no cycle and their height is known.
+      if (reference <= current_ && isContainer(nodes_[reference])) parentsFirst_ = false;
+    }
+    return end;
+  }
+
+  void checkKeys() const {
+    for (std::size_t i = 0; i < objectCount_; ++i) {
+      if (nodes_[i].kind != Kind::dictionary) continue;
+      for (const NodeIndex key : document_.keys(nodes_[i])) {
+        if (nodes_[key].kind != Kind::string) {
+          throw malformed("dictionary key is not text", offsetOf(i));
+        }
+      }
+    }
+  }
+
+  [[nodiscard]] std::span<const NodeIndex> childrenOf(const Node& node) const {
+    if (node.kind == Kind::dictionary) return document_.values(node);
+    if (node.kind == Kind::array) return document_.elements(node);
+    return {};
+  }
+  static bool isContainer(const Node& node) {
+    return node.kind == Kind::dictionary || node.kind == Kind::array;
+  }
+
+  /// What most writers produce: parents stand before their children, hence no cycle, and from the
+  /// last object to the first every height is known before it is asked for.
+  void measureBackwards() {
+    for (std::size_t i = objectCount_; i-- > 0;) {
+      Node& node = nodes_[i];
+      if (!isContainer(node)) continue;
+      std::uint16_t height = 0;
+      for (const NodeIndex child : childrenOf(node))
+        height = std::max(height, nodes_[child].height);
+      node.height = std::min<std::uint16_t>(height + 1, kTooDeep);
+    }
+    if (nodes_[root_].height == kTooDeep) throw tooDeep();
+  }
+
+  /// Any graph: depth first from the root, each container entered once, however often it is shared.
+  /// A height of 0 is a container not yet seen, kOpen one that is being walked.
+  void measureFromRoot() {
+    struct Step {
+      NodeIndex node;
+      std::uint32_t nextChild;
+      std::uint16_t height;
+    };
+    if (!isContainer(nodes_[root_])) return;
+    ScratchArray<Step, limits::nestedContainers> way;
+    const auto enter = [&](NodeIndex index) {
+      nodes_[index].height = kOpen;
+      way.push({index, 0, 0});
+    };
+    enter(root_);
+    while (true) {
+      Step& step = way.back();
+      const std::span<const NodeIndex> children = childrenOf(nodes_[step.node]);
+      if (step.nextChild == children.size()) {
+        const auto height = static_cast<std::uint16_t>(step.height + 1);
+        nodes_[step.node].height = height;
+        way.shrinkTo(way.size() - 1);
+        if (way.empty()) return;
+        way.back().height = std::max(way.back().height, height);
+        continue;
+      }
+      const NodeIndex child = children[step.nextChild++];
+      const Node& node = nodes_[child];
+      if (!isContainer(node)) continue;
+      if (node.height == kOpen) throw malformed("container inside itself", offsetOf(child));
+      // The child's own container counts even where its height is not yet known.
+      if (way.size() + std::max<std::size_t>(node.height, 1) > limits::nestedContainers) {
+        throw tooDeep();
+      }
+      if (node.height == 0) {
+        enter(child);
+      } else {
+        step.height = std::max(step.height, node.height);
+      }
+    }
+  }
+
+  [[nodiscard]] std::uint64_t offsetOf(std::size_t object) const {
+    return bigEndian(bytes_ + objectsEnd_ + object * offsetSize_, offsetSize_);
+  }
+
+  const unsigned char* const bytes_;
+  const std::size_t size_;
+  const std::size_t base_;  // of the message in its block
+  Document& document_;
+  ScratchArray<Node, 96>& nodes_;
+  ScratchArray<NodeIndex, 160>& children_;
+  BlockBuilder side_;
+
+  std::size_t offsetSize_ = 0;
+  std::size_t referenceSize_ = 0;
+  std::size_t objectCount_ = 0;
+  std::size_t objectsEnd_ = 0;  // also where the offset table begins
+  NodeIndex root_ = 0;
+  NodeIndex current_ = 0;
+  bool parentsFirst_ = true;  // no reference to a container that stands earlier
+};
+
+void readBinary(const Data& message, Document& document) { BinaryReader(message, document).read(); }
+
+}  // namespace ironmoat::plist

@@ -1,0 +1,73 @@
+#include "plist/decoder.h"
+
+#include <vector>
+
+namespace ironmoat::plist {
+
+namespace {
+
+std::int64_t integer(const Decoder& decoder) {
+  const Node& node = decoder.node();
+  if (node.kind == Kind::unsignedInteger) decoder.failOutOfRange();
+  return static_cast<std::int64_t>(decoder.expect(Kind::integer).payload);
+}
+
+}  // namespace
+
+void decodeInto(const Decoder& decoder, Int& value) { value = integer(decoder); }
+
+void decodeInto(const Decoder& decoder, Int64& value) { value = integer(decoder); }
+
+void decodeInto(const Decoder& decoder, Bool& value) {
+  value = decoder.expect(Kind::boolean).payload != 0;
+}
+
+void decodeInto(const Decoder& decoder, String& value) {
+  const Node& node = decoder.expect(Kind::string);
+  decoder.chargeDelivered(node.count);
+  value = String(decoder.document().slice(node));
+}
+
+void decodeInto(const Decoder& decoder, Data& value) {
+  const Node& node = decoder.expect(Kind::data);
+  decoder.chargeDelivered(node.count);
+  value = Data(decoder.document().slice(node));
+}
+
+std::string Decoder::path() const {
+  std::vector<const Decoder*> way;
+  for (const Decoder* at = this; at->parent_ != nullptr; at = at->parent_) way.push_back(at);
+  std::string path;
+  for (auto at = way.rbegin(); at != way.rend(); ++at) {
+    if ((*at)->key_ == nullptr) {
+      path.append("[").append(std::to_string((*at)->index_)).append("]");
+      continue;
+    }
+    if (!path.empty()) path += ".";
+    path += *(*at)->key_;
+  }
+  return path;
+}
+
+void Decoder::failMismatch(Kind expected) const {
+  std::string sentence("expected ");
+  sentence.append(nameOf(expected)).append(", found ").append(nameOf(node().kind));
+  throw DecodingError(DecodingError::Kind::typeMismatch, path(), sentence);
+}
+
+void Decoder::failOutOfRange() const {
+  throw DecodingError(DecodingError::Kind::outOfRange, path(),
+                      "integer does not fit in 64 bits with a sign");
+}
+
+void Decoder::failMissing(std::string_view key) const {
+  throw DecodingError(DecodingError::Kind::keyNotFound, Decoder(*this, key, node_).path(),
+                      "required key is missing");
+}
+
+void Decoder::failLimit(const char* what, std::size_t limit, const char* unit) const {
+  throw DecodingError(DecodingError::Kind::limitExceeded, path(),
+                      what + std::to_string(limit) + unit);
+}
+
+}  // namespace ironmoat::plist

@@ -1,0 +1,187 @@
+#pragma once
+
+#include <array>
+#include <bit>
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "ironmoat/errors.h"
+#include "ironmoat/limits.h"
+#include "ironmoat/values.h"
+#include "plist/document.h"
+
+namespace ironmoat::plist {
+
+/// What decoding one message may still cost; see ironmoat/limits.h.
+struct Budget {
+  std::size_t recordBytes = limits::recordBytes;
+  std::size_t deliveredBytes = limits::deliveredBytes;
+  std::size_t scannedEntries = limits::scannedEntries;
+};
+
+template <class Keys>
+class KeyedDecodingContainer;
+
+/// A decoder positioned on one value of a document. Lives on the stack, below its parent's; knows
+/// the way from the top, so that an error can name it.
+class Decoder {
+ public:
+  Decoder(const Document& document, Budget& budget) noexcept
+      : document_(document), budget_(budget), node_(document.root()) {}
+  /// The value under `key`, which must outlive the decoder, or the element at `index`.
+  Decoder(const Decoder& parent, const std::string_view& key, NodeIndex node) noexcept
+      : document_(parent.document_),
+        budget_(parent.budget_),
+        parent_(&parent),
+        key_(&key),
+        node_(node) {}
+  Decoder(const Decoder& parent, std::uint32_t index, NodeIndex node) noexcept
+      : document_(parent.document_),
+        budget_(parent.budget_),
+        parent_(&parent),
+        index_(index),
+        node_(node) {}
+  Decoder(const Decoder&) = delete;
+  Decoder& operator=(const Decoder&) = delete;
+
+  /// The current value's entries under the record's keys; throws `typeMismatch` when the value is
+  /// no dictionary.
+  template <class Keys>
+  [[nodiscard]] KeyedDecodingContainer<Keys> container() const {
+    return KeyedDecodingContainer<Keys>(*this);
+  }
+
+  [[nodiscard]] const Document& document() const noexcept { return document_; }
+  [[nodiscard]] const Node& node() const noexcept { return document_.node(node_); }
+
+  /// The current node; throws `typeMismatch` when it is of another kind.
+  const Node& expect(Kind kind) const {
+    const Node& node = this->node();
+    if (node.kind != kind) failMismatch(kind);
+    return node;
+  }
+  void chargeRecords(std::size_t count, std::size_t size) const {
+    charge(budget_.recordBytes, count * size, "lists of records take more than the limit of ",
+           limits::recordBytes, " bytes");
+  }
+  void chargeDelivered(std::size_t bytes) const {
+    charge(budget_.deliveredBytes, bytes, "text and data come to more than the limit of ",
+           limits::deliveredBytes, " bytes");
+  }
+  void chargeScanned(std::size_t entries) const {
+    charge(budget_.scannedEntries, entries, "shared dictionaries come to more than the limit of ",
+           limits::scannedEntries, " entries");
+  }
+
+  [[noreturn]] void failMismatch(Kind expected) const;
+  [[noreturn]] void failOutOfRange() const;
+  [[noreturn]] void failMissing(std::string_view key) const;
+
+ private:
+  void charge(std::size_t& left, std::size_t amount, const char* what, std::size_t limit,
+              const char* unit) const {
+    if (amount > left) failLimit(what, limit, unit);
+    left -= amount;
+  }
+  [[noreturn]] void failLimit(const char* what, std::size_t limit, const char* unit) const;
+  [[nodiscard]] std::string path() const;
+
+  const Document& document_;
+  Budget& budget_;
+  const Decoder* parent_ = nullptr;
+  const std::string_view* key_ = nullptr;
+  std::uint32_t index_ = 0;
+  NodeIndex node_;
+};
+
+/// How one value decodes into a field. Records bring an overload of their own.
+void decodeInto(const Decoder& decoder, Int& value);
+void decodeInto(const Decoder& decoder, Int64& value);
+void decodeInto(const Decoder& decoder, Bool& value);
+void decodeInto(const Decoder& decoder, String& value);
+void decodeInto(const Decoder& decoder, Data& value);
+
+template <class T>
+void decodeInto(const Decoder& decoder, List<T>& list) {
+  const Node& array = decoder.expect(Kind::array);
+  decoder.chargeRecords(array.count, sizeof(T));
+  list.reserve(array.count);  // proven by the document, paid for by the budget
+  std::uint32_t index = 0;
+  for (const NodeIndex element : decoder.document().elements(array)) {
+    decodeInto(Decoder(decoder, index++, element), list.emplace_back());
+  }
+}
+
+/// A dictionary, seen through an enumeration of keys: `Keys::count`, `Keys::at(index)`,
+/// `index()`, `stringValue()`, and `Keys::finder()`, which maps text to a case. Of several entries
+/// under one key the last one counts; entries under other keys are passed over.
+template <class Keys>
+class KeyedDecodingContainer {
+ public:
+  explicit KeyedDecodingContainer(const Decoder& decoder) : decoder_(decoder) {
+    const Node& dictionary = decoder.expect(Kind::dictionary);
+    decoder.chargeScanned(dictionary.count);
+    const Document& document = decoder.document();
+    const auto keys = document.keys(dictionary);
+    const auto values = document.values(dictionary);
+    const auto& find = Keys::finder();
+    for (std::size_t i = 0; i < keys.size(); ++i) {
+      const std::optional<Keys> key = find(document.text(document.node(keys[i])));
+      if (!key) continue;
+      seen_[key->index() / 64] |= std::uint64_t{1} << (key->index() % 64);
+      values_[key->index()] = values[i];
+    }
+  }
+
+  [[nodiscard]] bool contains(Keys key) const noexcept {
+    return ((seen_[key.index() / 64] >> (key.index() % 64)) & 1) != 0;
+  }
+
+  /// Throws `keyNotFound` when there is no entry, and what decoding its value throws.
+  template <class T>
+  [[nodiscard]] T decode(Keys key) const {
+    T value{};
+    decodeField(key, value);
+    return value;
+  }
+  template <class T>
+  [[nodiscard]] Optional<T> decodeIfPresent(Keys key) const {
+    Optional<T> value;
+    if (contains(key)) decodeField(key, value);
+    return value;
+  }
+
+  /// The same, into a record's member in place: a plain member is required, an optional one must
+  /// have been seen.
+  template <class T>
+  void decodeField(Keys key, T& value) const {
+    if (!contains(key)) decoder_.failMissing(key.stringValue());
+    decodeInto(Decoder(decoder_, key.stringValue(), values_[key.index()]), value);
+  }
+  template <class T>
+  void decodeField(Keys key, Optional<T>& value) const {
+    value = Optional<T>(T{});
+    decodeInto(Decoder(decoder_, key.stringValue(), values_[key.index()]), *value);
+  }
+
+  /// Calls `visit(key)` in the order of the cases, for each that was seen and each in `required`.
+  template <class Visitor>
+  void forEach(const std::array<std::uint64_t, (Keys::count + 63) / 64>& required,
+               Visitor&& visit) const {
+    for (std::size_t word = 0; word < seen_.size(); ++word) {
+      for (std::uint64_t left = seen_[word] | required[word]; left != 0; left &= left - 1) {
+        visit(Keys::at(word * 64 + static_cast<std::size_t>(std::countr_zero(left))));
+      }
+    }
+  }
+
+ private:
+  const Decoder& decoder_;
+  std::array<std::uint64_t, (Keys::count + 63) / 64> seen_{};
+  std::array<NodeIndex, Keys::count> values_;  // NOLINT: read only where seen_ says so
+};
+
+}  // namespace ironmoat::plist

@@ -1,0 +1,62 @@
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <span>
+#include <string_view>
+
+namespace ironmoat::records {
+
+/// No place: what the lookups answer for text that is no key.
+inline constexpr std::size_t kNoKey = 0xFF;
+inline constexpr std::size_t kMostKeys = 0xFF;  // places are bytes, one of which is kNoKey
+
+/// From key text to its place in a table, for short tables: the first key that equals it.
+class KeyScan {
+ public:
+  static constexpr std::size_t kLongest = 13;
+
+  constexpr explicit KeyScan(std::span<const std::string_view> keys) : keys_(keys) {}
+
+  [[nodiscard]] std::size_t find(std::string_view text) const noexcept {
+    for (std::size_t i = 0; i < keys_.size(); ++i) {
+      if (keys_[i] == text) return i;
+    }
+    return kNoKey;
+  }
+
+ private:
+  std::span<const std::string_view> keys_;
+};
+
+/// From key text to its place in a table, for long tables: one multiplication, one look into a
+/// table of bytes and one comparison. Read-only once built.
+class KeyIndex {
+ public:
+  /// Finds a multiplier under which the keys, which must be distinct and outlive the index, take
+  /// different slots.
+  explicit KeyIndex(std::span<const std::string_view> keys);
+
+  /// The place of the key that equals `text`, or kNoKey.
+  [[nodiscard]] std::size_t find(std::string_view text) const noexcept {
+    const std::size_t place = slots_[slotOf(fold(text), multiplier_)];
+    return place != kNoKey && keys_[place] == text ? place : kNoKey;
+  }
+
+ private:
+  // 2,048 slots for 150 keys: about one multiplier in 230 keeps them all apart.
+  static constexpr unsigned kSlotBits = 11;
+
+  static std::uint64_t fold(std::string_view text) noexcept;
+  static std::size_t slotOf(std::uint64_t folded, std::uint64_t multiplier) noexcept {
+    return static_cast<std::size_t>((folded * multiplier) >> (64 - kSlotBits));
+  }
+  bool tryMultiplier(std::uint64_t multiplier) noexcept;
+
+  std::span<const std::string_view> keys_;
+  std::uint64_t multiplier_ = 0;
+  std::array<std::uint8_t, std::size_t{1} << kSlotBits> slots_;
+};
+
+}  // namespace ironmoat::records

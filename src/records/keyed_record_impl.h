@@ -1,0 +1,86 @@
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+
+#include "plist/decoder.h"
+#include "plist/encoder.h"
+#include "records/keyed_record.h"
+
+/// What a record's .cc derives from its table: checks, decoding, encoding.
+namespace ironmoat::records {
+
+/// Does not compile for a table that is not one with its record.
+template <class R>
+constexpr bool wellFormed() {
+  static_assert(Table<R>::rows.keysAreDistinct(), "two rows have the same wire key");
+  return detail::overMembers(
+      Table<R>::rows, []<auto... Members>() {
+        static_assert((detail::hasRule<typename Field<Members>::Type> && ...),
+                      "no decoding rule covers a member's type");
+        return FieldList<R, Members...>::check();
+      });
+}
+
+/// Decodes the fields of `record`, freshly made, in table order. The first error ends it.
+template <class R>
+void decodeFields(const plist::Decoder& decoder, R& record) {
+  static_assert(wellFormed<R>());
+  using Keys = typename R::CodingKeys;
+  using Container = plist::KeyedDecodingContainer<Keys>;
+  using DecodeOne = void (*)(const Container&, Keys, R&);
+  static constexpr auto decodeOne = detail::overMembers(
+      Table<R>::rows, []<auto... Members>() {
+        return std::array<DecodeOne, Keys::count>{
+            [](const Container& container, Keys key, R& into) {
+              container.decodeField(key, into.*Members);
+            }...};
+      });
+  static constexpr auto required = detail::overMembers(
+      Table<R>::rows, []<auto... Members>() {
+        std::array<std::uint64_t, (Keys::count + 63) / 64> bits{};
+        std::size_t index = 0;
+        ((detail::isRequired<typename Field<Members>::Type>
+              ? void(bits[index / 64] |= std::uint64_t{1} << (index % 64))
+              : void(),
+          ++index),
+         ...);
+        return bits;
+      });
+  const Container container = decoder.container<Keys>();
+  container.forEach(required, [&](Keys key) { decodeOne[key.index()](container, key, record); });
+}
+
+/// Writes `record` as a dictionary: required fields always, optional ones when present.
+template <class R>
+void encodeFields(plist::Encoder& encoder, const R& record) {
+  using Keys = typename R::CodingKeys;
+  auto container = encoder.container<Keys>();
+  std::size_t index = 0;
+  const auto encodeOne = [&]<class T>(const T& value) {
+    const Keys key = Keys::at(index++);
+    if constexpr (detail::isRequired<T>) {
+      container.encode(value, key);
+    } else {
+      container.encodeIfPresent(value, key);
+    }
+  };
+  detail::overMembers(
+      Table<R>::rows, [&]<auto... Members>() { (encodeOne(record.*Members), ...); });
+}
+
+}  // namespace ironmoat::records
+
+/// Defines decoding and encoding of `Record`; stands once, in the record's .cc.
+#define IRONMOAT_KEYED_RECORD(Record)                                                           \
+  Record Record::decode(const plist::Decoder& decoder) {                                        \
+    Record record{};                                                                            \
+    records::decodeFields(decoder, record);                                                     \
+    return record;                                                                              \
+  }                                                                                             \
+  void decodeInto(const plist::Decoder& decoder, Record& record) {                              \
+    records::decodeFields(decoder, record);                                                     \
+  }                                                                                             \
+  void Record::encode(plist::Encoder& encoder) const { records::encodeFields(encoder, *this); } \
+  static_assert(records::wellFormed<Record>())

@@ -1,0 +1,90 @@
+#pragma once
+
+#include <cstddef>
+#include <string_view>
+#include <type_traits>
+#include <utility>
+
+#include "ironmoat/fields.h"
+#include "records/keyed_record.h"
+
+/// From a wire record to the arguments of an output record's initialiser, wired by name and type
+/// while compiling.
+namespace ironmoat {
+
+/// Converts nothing: every argument passes through.
+struct NothingConverted {
+  using Fields = FieldList<NothingConverted>;
+};
+
+namespace detail {
+
+template <class R>
+struct FieldsOf {
+  using Type = typename R::Fields;
+};
+template <class R>
+requires requires { typename R::CodingKeys; }
+struct FieldsOf<R> {
+  using Type = typename std::remove_const_t<decltype(records::Table<R>::rows)>::template Fields<R>;
+};
+
+/// Picks a Field out of a list by its place, or void past its end; by overload resolution, which
+/// costs the compiler less than walking the list 150 times.
+template <std::size_t Index, class F>
+struct Placed {};
+template <class Places, class List>
+struct Placing;
+template <std::size_t... I, class R, auto... Members>
+struct Placing<std::index_sequence<I...>, FieldList<R, Members...>> : Placed<I, Field<Members>>... {
+};
+template <std::size_t Index, class F>
+F pick(const Placed<Index, F>*);
+template <std::size_t Index>
+void pick(...);
+
+template <class R>
+constexpr std::size_t fieldIndex(std::string_view name) {
+  const auto& names = FieldsOf<R>::Type::names;
+  std::size_t index = 0;
+  while (index < names.size() && names[index] != name) ++index;
+  return index;
+}
+/// The member of `R` that is called `Name::name`, as a Field, or void.
+template <class R, class Name>
+using FieldNamed = decltype(pick<fieldIndex<R>(Name::name)>(
+    static_cast<const Placing<std::make_index_sequence<FieldsOf<R>::Type::count>,
+                              typename FieldsOf<R>::Type>*>(nullptr)));
+
+/// What argument `Argument` is made of: the converted part of its name, else the wire field of its
+/// name, which must be of exactly its type.
+template <class Argument, class Wire, class Converted>
+typename Argument::Type argumentOf(const Wire& wire, Converted& converted) {
+  using Part = FieldNamed<Converted, Argument>;
+  if constexpr (!std::is_void_v<Part>) {
+    return std::move(Part::in(converted));
+  } else {
+    using Same = FieldNamed<Wire, Argument>;
+    static_assert(!std::is_void_v<Same>, "no wire field has this argument's name");
+    static_assert(std::is_same_v<typename Same::Type, typename Argument::Type>,
+                  "the wire field of this argument's name is of another type");
+    return Same::in(wire);
+  }
+}
+
+}  // namespace detail
+
+/// The arguments for `Output::with`: the parts in `converted`, and every other one as `wire` has
+/// it.
+template <class Output, class Wire, class Converted = NothingConverted>
+typename Output::Arguments argumentsFrom(const Wire& wire, Converted converted = {}) {
+  using Arguments = typename Output::Arguments;
+  return [&]<auto... Members>(FieldList<Arguments, Members...>) {
+    static_assert(sizeof...(Members) == detail::FieldsOf<Wire>::Type::count,
+                  "a wire field has no argument");
+    return Arguments{detail::argumentOf<Field<Members>>(wire, converted)...};
+  }
+  (typename Arguments::Fields());
+}
+
+}  // namespace ironmoat

@@ -1,0 +1,85 @@
+#include "unpackers/corvel_payload_unpacker.h"
+
+#include "records/message_payload.h"
+#include "unpackers/conversion.h"
+#include "unpackers/decode_message.h"
+#include "unpackers/header_block.h"
+
+namespace ironmoat {
+
+namespace {
+
+/// The eight arguments that do not pass through, in the order in which they are made.
+struct Converted {
+  List<DrelUserPayload> dstIdTokenList;
+  List<DrelUserPayload> corvelMessageList;
+  Optional<DrelUserPayloadHttpHeaders> httpHeaders;
+  Optional<DrelUserPayloadDeliveryContext> deliveryContext;
+  List<DrelHoplinePluginRequest> pluginRequests;
+  List<DrelHoplineAllocationStatus> allocationStatuses;
+  List<DrelHoplineSelfAllocToken> selfAllocTokenList;
+  List<DrelHoplinePluginAllocation> pluginAllocations;
+
+  using R = Converted;
+  using Fields = FieldList<R, &R::dstIdTokenList, &R::corvelMessageList, &R::httpHeaders,
+                           &R::deliveryContext, &R::pluginRequests, &R::allocationStatuses,
+                           &R::selfAllocTokenList, &R::pluginAllocations>;
+};
+
+DrelUserPayload convertPayload(const VeskCorvelProtocolPayload& wire);
+
+/// An absent list and an empty one both give an empty one.
+List<DrelUserPayload> convertPayloads(const Optional<List<VeskCorvelProtocolPayload>>& wire) {
+  List<DrelUserPayload> output;
+  if (!wire) return output;
+  output.reserve(wire->size());
+  for (const VeskCorvelProtocolPayload& element : *wire) output.push_back(convertPayload(element));
+  return output;
+}
+
+template <class Output, class Wire>
+List<Output> convertRelayList(const Optional<List<Wire>>& wire) {
+  List<Output> output;
+  if (!wire) return output;
+  output.reserve(wire->size());
+  for (const Wire& element : *wire) output.push_back(Output::with(argumentsFrom<Output>(element)));
+  return output;
+}
+
+Optional<DrelUserPayloadDeliveryContext> convertDeliveryContext(
+    const Optional<VeskCorvelProtocolDeliveryContext>& wire) {
+  if (!wire) return {};
+  return DrelUserPayloadDeliveryContext::with(argumentsFrom<DrelUserPayloadDeliveryContext>(*wire));
+}
+
+/// Apart from convertPayload, so that the kilobytes of arguments are on the stack once and not once
+/// for each level of nesting.
+[[gnu::noinline]] DrelUserPayload makePayload(const VeskCorvelProtocolPayload& wire,
+                                              Converted&& converted) {
+  return DrelUserPayload::with(argumentsFrom<DrelUserPayload>(wire, std::move(converted)));
+}
+
+/// Children before parents. Recurses as deep as payloads nest: at most half of
+/// limits::nestedContainers, which the reader has checked.
+DrelUserPayload convertPayload(const VeskCorvelProtocolPayload& wire) {
+  Converted converted{
+      .dstIdTokenList = convertPayloads(wire.dstIdTokenList),
+      .corvelMessageList = convertPayloads(wire.corvelMessageList),
+      .httpHeaders = convertHeaderBlock(wire.httpHeaders),
+      .deliveryContext = convertDeliveryContext(wire.deliveryContext),
+      .pluginRequests = convertRelayList<DrelHoplinePluginRequest>(wire.pluginRequests),
+      .allocationStatuses = convertRelayList<DrelHoplineAllocationStatus>(wire.allocationStatuses),
+      .selfAllocTokenList = convertRelayList<DrelHoplineSelfAllocToken>(wire.selfAllocTokenList),
+      .pluginAllocations = convertRelayList<DrelHoplinePluginAllocation>(wire.pluginAllocations),
+  };
+  return makePayload(wire, std::move(converted));
+}
+
+}  // namespace
+
+DrelUserPayload VeskCorvelPayloadUnpacker::unpack(const Data& message) const {
+  const auto wire = decodeMessage<VeskCorvelProtocolPayload>(message);
+  return convertPayload(wire);
+}
+
+}  // namespace ironmoat

@@ -1,0 +1,15 @@
+#pragma once
+
+#include "host/message_unpacker.h"
+#include "ironmoat/user_payload.h"
+
+namespace ironmoat {
+
+struct VeskCorvelPayloadUnpacker {
+  using MessageSchemaType = DrelUserPayload;
+  /// Throws DecodingError, and what an output record's initialiser refuses with, unchanged.
+  [[nodiscard]] DrelUserPayload unpack(const Data& message) const;
+};
+static_assert(MessageUnpacker<VeskCorvelPayloadUnpacker>);
+
+}  // namespace ironmoat

@@ -1,0 +1,15 @@
+#pragma once
+
+#include "host/message_unpacker.h"
+#include "ironmoat/web_tunnel_response.h"
+
+namespace ironmoat {
+
+struct VeskCommandWebTunnelResponseUnpacker {
+  using MessageSchemaType = VeskCommandWebTunnelResponse;
+  /// Throws DecodingError, and what an output record's initialiser refuses with, unchanged.
+  [[nodiscard]] VeskCommandWebTunnelResponse unpack(const Data& message) const;
+};
+static_assert(MessageUnpacker<VeskCommandWebTunnelResponseUnpacker>);
+
+}  // namespace ironmoat
