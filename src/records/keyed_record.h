@@ -176,10 +176,7 @@ class CodingKeys {
     static_assert(count <= kMostKeys);
   }
   static constexpr const std::array<std::string_view, count>& names() {
-    return detail::overMembers(
-        Table<R>::rows, []<auto... Members>()->const std::array<std::string_view, count>& {
-          return FieldList<R, Members...>::names;
-        });
+    return std::remove_const_t<decltype(Table<R>::rows)>::template Fields<R>::names;
   }
   static constexpr std::size_t indexOf(std::string_view name) {
     std::size_t index = 0;

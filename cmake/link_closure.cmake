@@ -1,0 +1,32 @@
+# Fails the configuration when a room reaches another one over any number of links.
+#
+#   ironmoat_assert_unreachable(<room> FROM <room>)
+
+function(ironmoat_link_closure target result)
+  set(seen)
+  set(open ${target})
+  while(open)
+    list(POP_FRONT open next)
+    if(NOT TARGET ${next} OR next IN_LIST seen)
+      continue()
+    endif()
+    list(APPEND seen ${next})
+    foreach(property LINK_LIBRARIES INTERFACE_LINK_LIBRARIES)
+      get_target_property(links ${next} ${property})
+      if(links)
+        # $<LINK_ONLY:x> and its like still link x.
+        string(REGEX REPLACE "\\$<[^:>]*:([^>]*)>" "\\1" links "${links}")
+        list(APPEND open ${links})
+      endif()
+    endforeach()
+  endwhile()
+  set(${result} ${seen} PARENT_SCOPE)
+endfunction()
+
+function(ironmoat_assert_unreachable room)
+  cmake_parse_arguments(ASSERT "" "FROM" "" ${ARGN})
+  ironmoat_link_closure(ironmoat_${ASSERT_FROM} closure)
+  if(ironmoat_${room} IN_LIST closure)
+    message(FATAL_ERROR "room '${ASSERT_FROM}' must not reach room '${room}': ${closure}")
+  endif()
+endfunction()
