@@ -19,8 +19,10 @@ class BlockBuilder {
 
   [[nodiscard]] std::size_t size() const noexcept { return size_; }
   [[nodiscard]] std::size_t capacity() const noexcept { return capacity_; }
-  /// Valid until the next call that grows.
-  [[nodiscard]] char* bytes() noexcept { return reinterpret_cast<char*>(block_ + 1); }
+  /// Null while there is no capacity; valid until the next call that grows.
+  [[nodiscard]] char* bytes() noexcept {
+    return block_ == nullptr ? nullptr : reinterpret_cast<char*>(block_ + 1);
+  }
 
   /// Makes room for `count` more bytes without another allocation.
   void reserve(std::size_t count) {

@@ -1,0 +1,114 @@
+// The frame assembler and every frame's parser. The first byte chooses how the rest, one
+// connection's bytes, is split into reads.
+//
+// Oracles: how bytes arrive changes nothing, and what parses is appended again as the same bytes.
+
+#include <algorithm>
+#include <cstdint>
+#include <cstdlib>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "frames/at_block_end.h"
+#include "frames/frame.h"
+#include "frames/frame_assembler.h"
+
+namespace {
+
+using namespace ironmoat;
+using namespace ironmoat::frames;
+
+constexpr std::size_t kMaxBody = 100'000;
+
+struct Outcome {
+  std::vector<Data> bodies;
+  bool broken = false;
+  bool midFrame = false;
+};
+
+/// Reads sizes from a small generator seeded with `seed`; 0: as much as fits each time.
+Outcome assemble(std::string_view stream, std::uint32_t seed) {
+  FrameAssembler assembler(kMaxBody, Sharing::anyThread);
+  Outcome outcome;
+  std::uint32_t state = seed;
+  try {
+    while (!stream.empty()) {
+      const std::span<char> room = assembler.room();
+      if (room.empty()) std::abort();
+      std::size_t count = std::min(room.size(), stream.size());
+      if (seed != 0) {
+        state = state * 1664525 + 1013904223;
+        const std::size_t most = std::size_t{1} << (state >> 28);
+        count = std::min(count, 1 + (state >> 8) % most);
+      }
+      stream.copy(room.data(), count);
+      stream.remove_prefix(count);
+      assembler.commit(count);
+      while (auto body = assembler.next()) outcome.bodies.push_back(*std::move(body));
+    }
+    outcome.midFrame = assembler.midFrame();
+  } catch (const FrameError&) {
+    outcome.broken = true;
+  }
+  return outcome;
+}
+
+/// What `parse` makes of `body`, if anything, `append` writes as the frame that `body` came in.
+template <class Parse, class Append>
+void expectSame(const Data& body, Parse parse, Append append) {
+  std::optional<decltype(parse(body))> parsed;
+  try {
+    parsed.emplace(parse(body));
+  } catch (const FrameError&) {
+    return;
+  }
+  BlockBuilder out;
+  append(out, *parsed);
+  const std::string_view frame(out.bytes(), out.size());
+  if (frame.substr(kLengthBytes) != body.view()) std::abort();
+  const Outcome again = assemble(frame, 0);
+  if (again.bodies.size() != 1 || again.bodies[0] != body || again.midFrame) std::abort();
+}
+
+void parse(const Data& body) {
+  expectSame(body, parseHello, appendHello);
+  expectSame(body, parseRequest, [&](BlockBuilder& out, const Request& request) {
+    if (requestId(body) != request.id) std::abort();
+    appendRequest(out, request.id, request.outputType, request.message.view());
+  });
+  expectSame(body, parseReply, [&](BlockBuilder& out, const Reply& reply) {
+    const std::size_t start = beginReply(out, reply.id, reply.status);
+    out.append(reply.body.view());
+    endReply(out, start);
+    const auto inside = [&](const auto& parse) {
+      return [&](const Data&) { return parse(reply.body); };
+    };
+    if (reply.status == Status::refused) {
+      expectSame(body, inside(parseRefusal), [&](BlockBuilder& again, const DecodingError& error) {
+        appendRefusal(again, reply.id, error);
+      });
+    } else if (reply.status != Status::record) {
+      expectSame(body, inside(parseSentence), [&](BlockBuilder& again, const std::string& text) {
+        appendSentence(again, reply.id, reply.status, text);
+      });
+    }
+  });
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  if (size == 0) return 0;
+  const std::string_view stream(reinterpret_cast<const char*>(data) + 1, size - 1);
+  const Outcome whole = assemble(stream, 0);
+  const Outcome split = assemble(stream, data[0]);
+  if (whole.bodies != split.bodies || whole.broken != split.broken ||
+      whole.midFrame != split.midFrame) {
+    std::abort();
+  }
+  for (const Data& body : whole.bodies) parse(atBlockEnd(body.view()));
+  return 0;
+}

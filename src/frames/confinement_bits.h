@@ -1,0 +1,65 @@
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <string_view>
+
+namespace ironmoat::frames {
+
+/// What confines a service, on every one of its threads; the bits of Hello::confinement.
+enum class Confinement : std::uint32_t {
+  systemCallFilter = 1U << 0U,   ///< any call that is not listed kills the process
+  noNewPrivileges = 1U << 1U,    ///< running a set-user-ID program gives nothing
+  notDumpable = 1U << 2U,        ///< not to be traced by its user's other processes
+  noCoreFile = 1U << 3U,         ///< core size limit 0: no message is left on disk
+  noFileGrowth = 1U << 4U,       ///< file size limit 0
+  noOpenFiles = 1U << 5U,        ///< the standard three descriptors and, limit 0, no other
+  noProcesses = 1U << 6U,        ///< process limit 0, threads included
+  addressSpaceLimit = 1U << 7U,  ///< of confinement/confinement.h or a lower one it was given
+  noNewCode = 1U << 8U,          ///< memory once writable never becomes executable; Linux 6.3
+  endsWithParent = 1U << 9U,     ///< killed when the thread that started it ends
+};
+
+struct ConfinementName {
+  Confinement part;
+  std::string_view name;
+};
+inline constexpr std::array kConfinementNames = {
+    ConfinementName{Confinement::systemCallFilter, "system call filter"},
+    ConfinementName{Confinement::noNewPrivileges, "no new privileges"},
+    ConfinementName{Confinement::notDumpable, "not dumpable"},
+    ConfinementName{Confinement::noCoreFile, "no core file"},
+    ConfinementName{Confinement::noFileGrowth, "no file growth"},
+    ConfinementName{Confinement::noOpenFiles, "no open files"},
+    ConfinementName{Confinement::noProcesses, "no processes"},
+    ConfinementName{Confinement::addressSpaceLimit, "address space limit"},
+    ConfinementName{Confinement::noNewCode, "no new code"},
+    ConfinementName{Confinement::endsWithParent, "ends with parent"},
+};
+
+/// Sanitizers map terabytes, open files and start a process to report what they find: their builds
+/// go without what forbids that, on both ends of the line.
+#ifdef IRONMOAT_SANITIZED
+inline constexpr bool kSanitizedBuild = true;
+#else
+inline constexpr bool kSanitizedBuild = false;
+#endif
+
+[[nodiscard]] constexpr bool standsSanitizers(Confinement part) noexcept {
+  return part == Confinement::noNewPrivileges || part == Confinement::noCoreFile ||
+         part == Confinement::noNewCode || part == Confinement::endsWithParent;
+}
+
+/// What a service of this build has in force whatever the kernel, or else does not serve.
+inline constexpr std::uint32_t kRequiredConfinement = [] {
+  std::uint32_t bits = 0;
+  for (const ConfinementName& known : kConfinementNames) {
+    const bool everywhere = known.part != Confinement::noNewCode;
+    if (everywhere && (!kSanitizedBuild || standsSanitizers(known.part))) {
+      bits |= static_cast<std::uint32_t>(known.part);
+    }
+  }
+  return bits;
+}();
+
+}  // namespace ironmoat::frames

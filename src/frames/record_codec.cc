@@ -1,0 +1,37 @@
+#include "frames/record_codec.h"
+
+#include <utility>
+
+#include "frames/record_reader.h"
+#include "frames/record_writer.h"
+#include "ironmoat/command_response.h"
+#include "ironmoat/user_payload.h"
+#include "ironmoat/web_tunnel_response.h"
+
+namespace ironmoat::frames {
+
+template <MessageSchema R>
+void encodeRecord(const R& record, BlockBuilder& out) {
+  Writer writer(out);
+  writer.record(record);
+  writer.finish();
+}
+
+template <MessageSchema R>
+R decodeRecord(const Data& body) {
+  Reader reader(body);
+  typename R::Arguments arguments;
+  reader.record<R>(arguments);
+  reader.finish();
+  return R::with(std::move(arguments));
+}
+
+#define IRONMOAT_CODEC_OF(R)                              \
+  template void encodeRecord<R>(const R&, BlockBuilder&); \
+  template R decodeRecord<R>(const Data&)
+
+IRONMOAT_CODEC_OF(VeskCommandResponse);
+IRONMOAT_CODEC_OF(VeskCommandWebTunnelResponse);
+IRONMOAT_CODEC_OF(DrelUserPayload);
+
+}  // namespace ironmoat::frames

@@ -1,0 +1,159 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <utility>
+
+#include "frames/little_endian.h"
+#include "frames/record_layout.h"
+#include "ironmoat/limits.h"
+#include "values/utf8.h"
+
+namespace ironmoat::frames {
+
+/// Reads one record out of a body that nobody vouches for.
+class Reader {
+ public:
+  explicit Reader(const Data& body)
+      : block_(body.slice().block()), at_(body.view().data()), end_(at_ + body.size()) {}
+
+  template <Record R>
+  [[gnu::noinline]] void record(typename R::Arguments& into) {
+    using Arguments = typename R::Arguments;
+    if (++depth_ > limits::nestedContainers) refuse("records are nested too deeply");
+    const char* const bits = take(Layout<Arguments>::presence);
+    checkPresence<Layout<Arguments>>(bits);
+    fields<Arguments>(typename Arguments::Fields(), into, bits);
+    --depth_;
+  }
+
+  void finish() const {
+    if (at_ != end_) refuse("bytes follow the record");
+  }
+
+ private:
+  template <class L>
+  static void checkPresence(const char* bits) {
+    std::uint8_t missing = 0;
+    for (std::size_t i = 0; i < L::presence; ++i) {
+      missing |= static_cast<std::uint8_t>(L::required[i] & ~static_cast<std::uint8_t>(bits[i]));
+    }
+    if (missing != 0) refuse("a field that every record has is missing");
+    if ((static_cast<std::uint8_t>(bits[L::presence - 1]) & L::unusedInLast) != 0) {
+      refuse("a field that no record has is present");
+    }
+  }
+
+  template <class A, auto... Members>
+  [[gnu::always_inline]] void fields(FieldList<A, Members...>, A& into, const char* bits) {
+    std::size_t i = 0;
+    (field(into.*Members, i++, bits), ...);
+  }
+
+  template <class T>
+  [[gnu::always_inline]] void field(T& into, std::size_t, const char*) {
+    into = read<T>();
+  }
+
+  template <class T>
+  [[gnu::always_inline]] void field(List<T>& into, std::size_t, const char*) {
+    fill(into);
+  }
+
+  template <class T>
+  [[gnu::always_inline]] void field(Optional<T>& into, std::size_t i, const char* bits) {
+    if ((bits[i / 8] >> (i % 8) & 1) == 0) return;
+    // Still absent, so it owns nothing and can be built over, which saves the moves of assigning.
+    if constexpr (isList<T>) {
+      fill(**std::construct_at(&into, T()));
+    } else {
+      std::construct_at(&into, read<T>());
+    }
+  }
+
+  template <class T>
+  T read() {
+    if constexpr (Number<T>) {
+      return load<T>(take(sizeof(T)));
+    } else if constexpr (std::same_as<T, Bool>) {
+      const char byte = *take(1);
+      if (byte != 0 && byte != 1) refuse("a truth value is neither 0 nor 1");
+      return byte == 1;
+    } else if constexpr (std::same_as<T, Data>) {
+      return Data(bytes());
+    } else if constexpr (std::same_as<T, String>) {
+      return text();
+    } else {
+      return nested<T>();
+    }
+  }
+
+  /// A record that is no element lies on the stack while its fields are read, so it has to be a
+  /// small one.
+  template <Record R>
+  [[gnu::noinline]] R nested() {
+    static_assert(sizeof(R) <= 512);
+    typename R::Arguments arguments;
+    record<R>(arguments);
+    return R::with(std::move(arguments));
+  }
+
+  template <class T>
+  [[gnu::noinline]] void fill(List<T>& elements) {
+    static_assert(leastBytes<T>() > 0, "or a few bytes could announce any number of elements");
+    const std::size_t count = load<std::uint32_t>(take(4));
+    if (count > left() / leastBytes<T>()) refuse("a list announces more than there is");
+    if (count > recordBytes_ / sizeof(T)) refuse("the lists take too much memory");
+    recordBytes_ -= count * sizeof(T);
+    if (count == 0) return;
+    elements.reserve(count);
+    if constexpr (Record<T>) {
+      // Kept off the stack: records of kilobytes may lie inside one another here.
+      const auto arguments = std::make_unique<std::optional<typename T::Arguments>>();
+      for (std::size_t i = 0; i < count; ++i) {
+        record<T>(arguments->emplace());
+        append(elements, **arguments);
+      }
+    } else {
+      for (std::size_t i = 0; i < count; ++i) elements.push_back(read<T>());
+    }
+  }
+
+  /// A function of its own, so that what it needs of the stack is not held while records nest.
+  template <Record R>
+  [[gnu::noinline]] static void append(List<R>& to, typename R::Arguments& arguments) {
+    to.push_back(R::with(std::move(arguments)));
+  }
+
+  [[gnu::noinline]] String text() {
+    detail::Slice text = bytes();
+    if (!isValidUtf8(text.view())) refuse("a text is not valid UTF-8");
+    return String(std::move(text));
+  }
+
+  [[gnu::noinline]] detail::Slice bytes() {
+    const std::size_t length = load<std::uint32_t>(take(4));
+    const char* const first = take(length);
+    if (length > deliveredBytes_) refuse("the record carries too much text and data");
+    deliveredBytes_ -= length;
+    return {block_, static_cast<std::uint32_t>(first - block_->bytes()),
+            static_cast<std::uint32_t>(length)};
+  }
+
+  const char* take(std::size_t count) {
+    if (count > left()) refuse("the record ends too early");
+    return std::exchange(at_, at_ + count);
+  }
+  [[nodiscard]] std::size_t left() const noexcept { return static_cast<std::size_t>(end_ - at_); }
+
+  Block* const block_;
+  const char* at_;
+  const char* const end_;
+  std::size_t recordBytes_ = limits::recordBytes;
+  std::size_t deliveredBytes_ = limits::deliveredBytes;
+  std::uint32_t depth_ = 0;
+};
+
+}  // namespace ironmoat::frames
