@@ -1,0 +1,115 @@
+#include "plist/base64.h"
+
+#include <array>
+#include <bit>
+#include <cstdint>
+#include <cstring>
+
+#include "plist/xml_chars.h"
+
+namespace ironmoat::plist {
+
+namespace {
+
+constexpr char kAlphabet[] = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
+constexpr std::uint32_t kForeign = 0x80000000U;  // apart from the 24 bits that values take
+
+// For each of a group's four places, what a character contributes to its 24 bits.
+constexpr auto kBits = [] {
+  std::array<std::array<std::uint32_t, 256>, 4> bits{};
+  for (std::size_t place = 0; place < 4; ++place) {
+    bits[place].fill(kForeign);
+    for (std::uint32_t value = 0; value < 64; ++value) {
+      bits[place][static_cast<unsigned char>(kAlphabet[value])] = value << (18 - 6 * place);
+    }
+  }
+  return bits;
+}();
+
+std::uint32_t groupBits(const char* four) noexcept {
+  const auto at = [&](std::size_t i) { return static_cast<unsigned char>(four[i]); };
+  return kBits[0][at(0)] | kBits[1][at(1)] | kBits[2][at(2)] | kBits[3][at(3)];
+}
+
+/// Writes six bytes, and two more that the next ones replace.
+void putTwoGroups(std::uint32_t first, std::uint32_t second, char* out) noexcept {
+  std::uint64_t bytes = (std::uint64_t{first} << 40) | (std::uint64_t{second} << 16);
+  if constexpr (std::endian::native == std::endian::little) bytes = __builtin_bswap64(bytes);
+  std::memcpy(out, &bytes, sizeof bytes);
+}
+
+char* putBytes(std::uint32_t group, unsigned count, char* out) noexcept {
+  for (unsigned i = 0; i < count; ++i) *out++ = static_cast<char>(group >> (16 - 8 * i));
+  return out;
+}
+
+const char* skipSpace(const char* at, const char* end) noexcept {
+  while (at != end && isXmlSpace(*at)) ++at;
+  return at;
+}
+
+/// Writes to `out`, which has room for 3 bytes per 4 characters begun and 2 more, and leaves it
+/// past what was written. Returns null, or where the text is wrong.
+const char* decode(const char* at, const char* end, char*& out) noexcept {
+  for (;;) {
+    for (; end - at >= 8; at += 8, out += 6) {
+      const std::uint32_t first = groupBits(at);
+      const std::uint32_t second = groupBits(at + 4);
+      if (((first | second) & kForeign) != 0) break;
+      putTwoGroups(first, second, out);
+    }
+    // Something else is near, or the end: one group, character by character.
+    std::uint32_t group = 0;
+    unsigned place = 0;
+    for (; place < 4; ++place, ++at) {
+      at = skipSpace(at, end);
+      if (at == end) break;
+      const std::uint32_t bits = kBits[place][static_cast<unsigned char>(*at)];
+      if (bits == kForeign) break;
+      group |= bits;
+    }
+    if (place == 4) {
+      out = putBytes(group, 3, out);
+      continue;
+    }
+    if (place == 0) return at == end ? nullptr : at;
+    const unsigned count = place - 1;  // bytes that the last group holds
+    if (count == 0 || (group & (0xFFFFFFU >> (8 * count))) != 0) return at;
+    for (; place < 4; ++place, ++at) {
+      at = skipSpace(at, end);
+      if (at == end || *at != '=') return at;
+    }
+    out = putBytes(group, count, out);
+    at = skipSpace(at, end);
+    return at == end ? nullptr : at;
+  }
+}
+
+}  // namespace
+
+std::optional<std::size_t> decodeBase64(std::string_view text, BlockBuilder& out) {
+  if (text.empty()) return {};
+  const std::size_t before = out.size();
+  char* const start = out.extend((text.size() + 3) / 4 * 3 + 2);
+  char* end = start;
+  const char* wrong = decode(text.data(), text.data() + text.size(), end);
+  out.truncate(wrong == nullptr ? before + static_cast<std::size_t>(end - start) : before);
+  if (wrong == nullptr) return {};
+  return static_cast<std::size_t>(wrong - text.data());
+}
+
+void encodeBase64(std::string_view bytes, BlockBuilder& out) {
+  const auto byte = [&](std::size_t i) {
+    return i < bytes.size() ? std::uint32_t{static_cast<unsigned char>(bytes[i])} : 0;
+  };
+  char* to = bytes.empty() ? nullptr : out.extend((bytes.size() + 2) / 3 * 4);
+  for (std::size_t i = 0; i < bytes.size(); i += 3) {
+    const std::uint32_t group = (byte(i) << 16) | (byte(i + 1) << 8) | byte(i + 2);
+    *to++ = kAlphabet[group >> 18];
+    *to++ = kAlphabet[(group >> 12) & 63];
+    *to++ = i + 1 < bytes.size() ? kAlphabet[(group >> 6) & 63] : '=';
+    *to++ = i + 2 < bytes.size() ? kAlphabet[group & 63] : '=';
+  }
+}
+
+}  // namespace ironmoat::plist

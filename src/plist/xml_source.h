@@ -1,0 +1,46 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string_view>
+
+#include "ironmoat/values.h"
+
+namespace ironmoat::plist {
+
+/// A message as XML text: known to be UTF-8 and to hold only XML characters. A message in UTF-16 is
+/// transcoded into a block of its own; any other is its own text.
+class XmlSource {
+ public:
+  /// Throws DecodingError for bytes that are no such text. Keeps a reference to `message`.
+  explicit XmlSource(const Data& message);
+
+  /// Without the byte-order mark.
+  [[nodiscard]] std::string_view text() const noexcept { return text_; }
+  /// Where the text lies; none when the message is empty.
+  [[nodiscard]] const BlockRef& block() const noexcept { return block_; }
+  [[nodiscard]] std::uint32_t offsetInBlock(const char* at) const noexcept {
+    return static_cast<std::uint32_t>(at - block_->bytes());
+  }
+  [[nodiscard]] Sharing sharing() const noexcept {
+    return block_ ? block_->sharing() : Sharing::anyThread;
+  }
+
+  /// Refuses the message when it is not in the encoding that its declaration names; `at` is where.
+  void checkEncoding(std::string_view name, const char* at) const;
+
+  /// Throws `malformed` for the place `at` of the text, as an offset into the message.
+  [[noreturn]] void refuse(const char* reason, const char* at) const;
+
+ private:
+  void transcodeUtf16(bool bigEndian);
+  [[nodiscard]] std::uint32_t utf16Unit(std::size_t index) const noexcept;
+
+  const Data& message_;
+  BlockRef block_;
+  std::string_view text_;
+  bool utf16_ = false;
+  bool bigEndian_ = false;
+};
+
+}  // namespace ironmoat::plist

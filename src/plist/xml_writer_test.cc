@@ -1,0 +1,103 @@
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <limits>
+#include <stdexcept>
+#include <string>
+
+#include "ironmoat/limits.h"
+#include "plist/document_builder.h"
+#include "plist/reader.h"
+#include "plist/show_document.h"
+#include "plist/writer.h"
+
+namespace ironmoat::plist {
+namespace {
+
+template <class Fill>
+std::string written(Fill fill) {
+  Document document;
+  DocumentBuilder builder(document, {}, Sharing::anyThread);
+  fill(builder);
+  builder.finish();
+  const Data message = writeXml(document);
+  Document readBack;
+  readXml(message, readBack);
+  EXPECT_EQ(show(readBack), show(document));
+  return std::string(message.view());
+}
+
+TEST(XmlWriterTest, WritesOneElementALine) {
+  const std::string text = written([](DocumentBuilder& builder) {
+    builder.beginDictionary();
+    builder.string("list");
+    builder.beginArray();
+    builder.boolean(true);
+    builder.boolean(false);
+    builder.integer(std::numeric_limits<std::int64_t>::min());
+    builder.beginDictionary();
+    builder.end();
+    builder.beginArray();
+    builder.end();
+    builder.end();
+    builder.string("a<&>b");
+    builder.string(" \r\n\t]]>\"' \xF0\x9F\x98\x80");
+    builder.string("");
+    builder.data(std::string_view("\0\xff\x10\x80", 4));
+    builder.end();
+  });
+  EXPECT_EQ(text, R"(<?xml version="1.0" encoding="UTF-8"?>
+<plist version="1.0">
+<dict>
+	<key>list</key>
+	<array>
+		<true/>
+		<false/>
+		<integer>-9223372036854775808</integer>
+		<dict/>
+		<array/>
+	</array>
+	<key>a&lt;&amp;&gt;b</key>
+	<string> &#13;
+	]]&gt;"' )"
+                  "\xF0\x9F\x98\x80"
+                  R"(</string>
+	<key></key>
+	<data>AP8QgA==</data>
+</dict>
+</plist>
+)");
+}
+
+TEST(XmlWriterTest, GoesAsDeepAsADocumentCan) {
+  written([](DocumentBuilder& builder) {
+    for (std::uint32_t i = 0; i < limits::nestedContainers; ++i) builder.beginArray();
+    for (std::uint32_t i = 0; i < limits::nestedContainers; ++i) builder.end();
+  });
+}
+
+TEST(XmlWriterTest, RefusesWhatTheFormOrARecordCannotHold) {
+  for (const std::string_view text :
+       {std::string_view("a\0b", 3), std::string_view("\x1F"), std::string_view("\xEF\xBF\xBE"),
+        std::string_view("\xEF\xBF\xBF")}) {
+    EXPECT_THROW(written([&](DocumentBuilder& builder) { builder.string(text); }),
+                 std::invalid_argument);
+    EXPECT_THROW(written([&](DocumentBuilder& builder) {
+                   builder.beginDictionary();
+                   builder.string(text);
+                   builder.boolean(true);
+                   builder.end();
+                 }),
+                 std::invalid_argument);
+  }
+  for (const Kind kind : {Kind::real, Kind::date, Kind::uid}) {
+    EXPECT_THROW(written([&](DocumentBuilder& builder) { builder.opaque(kind); }),
+                 std::invalid_argument);
+  }
+  EXPECT_THROW(
+      written([](DocumentBuilder& builder) { builder.unsignedInteger(~std::uint64_t{0}); }),
+      std::invalid_argument);
+}
+
+}  // namespace
+}  // namespace ironmoat::plist
