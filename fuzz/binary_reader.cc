@@ -9,9 +9,9 @@
 #include "ironmoat/errors.h"
 #include "ironmoat/limits.h"
 #include "plist/reader.h"
-#include "plist/show_document.h"
-#include "plist/tight_message.h"
 #include "plist/writer.h"
+#include "support/show_document.h"
+#include "support/tight_message.h"
 
 namespace {
 
@@ -74,7 +74,7 @@ struct Walk {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  const Data message = tightMessage({reinterpret_cast<const char*>(data), size});
+  const Data message = testing::tightMessage({reinterpret_cast<const char*>(data), size});
   Document document;
   Document again;
   const std::string error = refusal(message, document);

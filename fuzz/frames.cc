@@ -12,9 +12,9 @@
 #include <string_view>
 #include <vector>
 
-#include "frames/at_block_end.h"
 #include "frames/frame.h"
 #include "frames/frame_assembler.h"
+#include "support/tight_message.h"
 
 namespace {
 
@@ -109,6 +109,6 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
       whole.midFrame != split.midFrame) {
     std::abort();
   }
-  for (const Data& body : whole.bodies) parse(atBlockEnd(body.view()));
+  for (const Data& body : whole.bodies) parse(testing::tightMessage(body.view()));
   return 0;
 }

@@ -9,10 +9,10 @@
 #include "frames/record_codec.h"
 #include "plist/encoder.h"
 #include "plist/property_list_decoder.h"
-#include "plist/tight_message.h"
 #include "records/command_response.h"
 #include "records/message_payload.h"
 #include "records/web_tunnel.h"
+#include "support/tight_message.h"
 #include "unpackers/command_response_unpacker.h"
 #include "unpackers/corvel_payload_unpacker.h"
 #include "unpackers/web_tunnel_response_unpacker.h"
@@ -70,7 +70,7 @@ void unpackAs(const Data& message) {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  const Data message = plist::tightMessage({reinterpret_cast<const char*>(data), size});
+  const Data message = testing::tightMessage({reinterpret_cast<const char*>(data), size});
   unpackAs<VeskCorvelPayloadUnpacker, VeskCorvelProtocolPayload>(message);
   unpackAs<VeskCommandResponseUnpacker, VeskCommandResponseSchema>(message);
   unpackAs<VeskCommandWebTunnelResponseUnpacker, VeskCommandWebTunnelResponseSchema>(message);

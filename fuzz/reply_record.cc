@@ -8,11 +8,11 @@
 #include <optional>
 #include <string_view>
 
-#include "frames/at_block_end.h"
 #include "frames/record_codec.h"
 #include "ironmoat/command_response.h"
 #include "ironmoat/user_payload.h"
 #include "ironmoat/web_tunnel_response.h"
+#include "support/tight_message.h"
 
 namespace {
 
@@ -35,7 +35,7 @@ void recode(const Data& body) {
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   if (size == 0) return 0;
-  const Data body = frames::atBlockEnd({reinterpret_cast<const char*>(data) + 1, size - 1});
+  const Data body = testing::tightMessage({reinterpret_cast<const char*>(data) + 1, size - 1});
   switch (data[0] % 3) {
     case 0:
       recode<VeskCommandResponse>(body);

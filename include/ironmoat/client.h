@@ -24,16 +24,18 @@ class Connection;
 /// one outcome.
 ///
 /// Any number of threads may use one client at once, with any number of requests in flight. The
-/// client starts one thread, raises no signal and changes no signal's handling. After fork() it
-/// belongs to the parent: in the child every request fails with `unavailable`, and destroying the
-/// copy does nothing.
+/// client keeps one thread, which takes none of the daemon's signals, and changes no signal's
+/// handling; a SIGCHLD comes when its process ends, and a handler that reaps it does no harm. After
+/// fork() a client that was used belongs to the parent: in the child every request fails with
+/// `unavailable`, and destroying the copy does nothing.
 class Client {
  public:
   struct Options {
     /// The service's executable; empty: where the library was installed with it.
     std::string program;
-    /// How long the service may work on one message. A request that is past it is tried once more,
-    /// alone, before it fails with `timedOut`; waiting for other requests does not count.
+    /// How long the service may work on one message, from 1 ms to a day. A request that is past it
+    /// is tried once more, alone, before it fails with `timedOut`; waiting for other requests does
+    /// not count.
     std::chrono::milliseconds deadline{2000};
     /// Bytes of requests without an outcome, with some 500 more for each request. `submit` and
     /// `unpack` wait for room, in the order of the calls; a message that is larger goes alone.
@@ -52,15 +54,20 @@ class Client {
   /// answer could be had.
   template <MessageSchema R>
   R unpack(const Data& message) {
-    return submit<R>(message).get();
+    return start<R>(message, true).get();
   }
 
   /// The same without waiting for the outcome; the future throws what `unpack` would. `message` is
   /// shared, not copied. Records wait in their futures, in the memory of whoever holds these.
   template <MessageSchema R>
-  std::future<R> submit(const Data& message);
+  std::future<R> submit(const Data& message) {
+    return start<R>(message, false);
+  }
 
  private:
+  template <MessageSchema R>
+  std::future<R> start(const Data& message, bool waits);
+
   std::unique_ptr<client::Connection> connection_;
 };
 

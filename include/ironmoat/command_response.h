@@ -3,8 +3,7 @@
 #include <string_view>
 #include <utility>
 
-#include "ironmoat/fields.h"
-#include "ironmoat/values.h"
+#include "ironmoat/output_record.h"
 
 namespace ironmoat {
 
@@ -30,6 +29,8 @@ struct VeskCommandResponseArguments {
                 &R::token, &R::internalBuild, &R::loggingProfile, &R::applicationId,
                 &R::requestType, &R::veskSessionId, &R::sharedSession, &R::protocolVersion>;
 };
+/// Throws what the host refuses.
+void admit(const VeskCommandResponseArguments& arguments);
 static_assert(VeskCommandResponseArguments::Fields::check());
 
 /// The response to a command. Its fields are read as `response.command`, `response.token`, ...
@@ -37,11 +38,13 @@ struct VeskCommandResponse : VeskCommandResponseArguments {
   using Arguments = VeskCommandResponseArguments;
   static constexpr std::string_view schemaName = "VeskCommandResponse";
 
-  /// The initialiser, and the only way to a record. Throws what the host refuses with.
-  [[nodiscard]] static VeskCommandResponse with(Arguments arguments);
-
- private:
-  explicit VeskCommandResponse(Arguments&& arguments) noexcept : Arguments(std::move(arguments)) {}
+  [[nodiscard]] static VeskCommandResponse with(Arguments arguments) {
+    return VeskCommandResponse([&] { return Arguments(std::move(arguments)); });
+  }
+  template <MakerOf<Arguments> Make>
+  explicit VeskCommandResponse(Make&& make) : Arguments(make()) {
+    admit(*this);
+  }
 };
 
 }  // namespace ironmoat

@@ -3,8 +3,7 @@
 #include <string_view>
 #include <utility>
 
-#include "ironmoat/fields.h"
-#include "ironmoat/values.h"
+#include "ironmoat/output_record.h"
 
 namespace ironmoat {
 
@@ -23,17 +22,21 @@ struct DrelUserPayloadHttpHeadersArguments {
       FieldList<R, &R::adhocServiceOverride, &R::responseIdentifierString,
                 &R::strictTransportSecurity, &R::traceId, &R::splunkHint, &R::asHttpHeader>;
 };
+/// Throws what the host refuses.
+void admit(const DrelUserPayloadHttpHeadersArguments& arguments);
 static_assert(DrelUserPayloadHttpHeadersArguments::Fields::check());
 
 /// HTTP header values, each opaque text.
 struct DrelUserPayloadHttpHeaders : DrelUserPayloadHttpHeadersArguments {
   using Arguments = DrelUserPayloadHttpHeadersArguments;
 
-  [[nodiscard]] static DrelUserPayloadHttpHeaders with(Arguments arguments);
-
- private:
-  explicit DrelUserPayloadHttpHeaders(Arguments&& arguments) noexcept
-      : Arguments(std::move(arguments)) {}
+  [[nodiscard]] static DrelUserPayloadHttpHeaders with(Arguments arguments) {
+    return DrelUserPayloadHttpHeaders([&] { return Arguments(std::move(arguments)); });
+  }
+  template <MakerOf<Arguments> Make>
+  explicit DrelUserPayloadHttpHeaders(Make&& make) : Arguments(make()) {
+    admit(*this);
+  }
 };
 
 }  // namespace ironmoat

@@ -25,8 +25,8 @@ inline constexpr std::size_t recordBytes = std::size_t{64} << 20;
 inline constexpr std::size_t deliveredBytes = std::size_t{64} << 20;
 
 /// Dictionary entries looked at while decoding, counted each time a shared dictionary is. A message
-/// that shares none cannot have more than half as many. Stops a dictionary of a million unknown keys
-/// from being scanned once for each of thousands of references to it.
+/// that shares none cannot have more than half as many. Stops a dictionary of a million unknown
+/// keys from being scanned once for each of thousands of references to it.
 inline constexpr std::size_t scannedEntries = std::size_t{16} << 20;
 
 /// Bytes of one reply. No record can exceed it: its text and data are bounded by `deliveredBytes`,

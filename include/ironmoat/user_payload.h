@@ -3,10 +3,9 @@
 #include <string_view>
 #include <utility>
 
-#include "ironmoat/fields.h"
 #include "ironmoat/http_headers.h"
+#include "ironmoat/output_record.h"
 #include "ironmoat/payload_parts.h"
-#include "ironmoat/values.h"
 
 namespace ironmoat {
 
@@ -203,6 +202,8 @@ struct DrelUserPayloadArguments {
       &R::relayServerType, &R::pluginAllocations, &R::hoplineErrorCode, &R::originalCommand,
       &R::isBulkedPayload, &R::wantsAppAck, &R::errorDomain, &R::expectsPeerResponse, &R::allowGDR>;
 };
+/// Throws what the host refuses.
+void admit(const DrelUserPayloadArguments& arguments);
 
 /// A message payload, with the payloads and relay records nested in it. Its six lists of records
 /// are always there and may be empty; every other field but `command` may be absent.
@@ -210,10 +211,13 @@ struct DrelUserPayload : DrelUserPayloadArguments {
   using Arguments = DrelUserPayloadArguments;
   static constexpr std::string_view schemaName = "DrelUserPayload";
 
-  [[nodiscard]] static DrelUserPayload with(Arguments arguments);
-
- private:
-  explicit DrelUserPayload(Arguments&& arguments) noexcept : Arguments(std::move(arguments)) {}
+  [[nodiscard]] static DrelUserPayload with(Arguments arguments) {
+    return DrelUserPayload([&] { return Arguments(std::move(arguments)); });
+  }
+  template <MakerOf<Arguments> Make>
+  explicit DrelUserPayload(Make&& make) : Arguments(make()) {
+    admit(*this);
+  }
 };
 static_assert(DrelUserPayloadArguments::Fields::check());
 

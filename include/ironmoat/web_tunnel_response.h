@@ -3,9 +3,8 @@
 #include <string_view>
 #include <utility>
 
-#include "ironmoat/fields.h"
 #include "ironmoat/http_headers.h"
-#include "ironmoat/values.h"
+#include "ironmoat/output_record.h"
 
 namespace ironmoat {
 
@@ -31,6 +30,8 @@ struct VeskCommandWebTunnelResponseArguments {
                 &R::epochTimeNanos, &R::httpUrl, &R::httpHeaders, &R::httpBody, &R::httpBodyUrl,
                 &R::httpBodyKey, &R::httpResponseStatus, &R::httpErrorMsg>;
 };
+/// Throws what the host refuses.
+void admit(const VeskCommandWebTunnelResponseArguments& arguments);
 static_assert(VeskCommandWebTunnelResponseArguments::Fields::check());
 
 /// The response to a web-tunnel command: an HTTP exchange beside the fields of a response.
@@ -38,11 +39,13 @@ struct VeskCommandWebTunnelResponse : VeskCommandWebTunnelResponseArguments {
   using Arguments = VeskCommandWebTunnelResponseArguments;
   static constexpr std::string_view schemaName = "VeskCommandWebTunnelResponse";
 
-  [[nodiscard]] static VeskCommandWebTunnelResponse with(Arguments arguments);
-
- private:
-  explicit VeskCommandWebTunnelResponse(Arguments&& arguments) noexcept
-      : Arguments(std::move(arguments)) {}
+  [[nodiscard]] static VeskCommandWebTunnelResponse with(Arguments arguments) {
+    return VeskCommandWebTunnelResponse([&] { return Arguments(std::move(arguments)); });
+  }
+  template <MakerOf<Arguments> Make>
+  explicit VeskCommandWebTunnelResponse(Make&& make) : Arguments(make()) {
+    admit(*this);
+  }
 };
 
 }  // namespace ironmoat

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <array>
+#include <bit>
 #include <cstdint>
 #include <string_view>
 
@@ -36,6 +37,18 @@ inline constexpr std::array kConfinementNames = {
     ConfinementName{Confinement::noNewCode, "no new code"},
     ConfinementName{Confinement::endsWithParent, "ends with parent"},
 };
+
+/// A service that cannot have a part exits with this plus the number of its bit.
+inline constexpr int kCannotConfineStatus = 64;
+
+/// The part whose lack an exit status tells of, if it does.
+[[nodiscard]] constexpr const ConfinementName* lackToldBy(int exitStatus) noexcept {
+  for (const ConfinementName& known : kConfinementNames) {
+    const int bit = std::countr_zero(static_cast<std::uint32_t>(known.part));
+    if (exitStatus == kCannotConfineStatus + bit) return &known;
+  }
+  return nullptr;
+}
 
 /// Sanitizers map terabytes, open files and start a process to report what they find: their builds
 /// go without what forbids that, on both ends of the line.

@@ -29,7 +29,7 @@ class FrameError : public std::runtime_error {
 /// The service's first frame.
 struct Hello {
   std::uint16_t version = kVersion;
-  std::uint32_t confinement = 0;  ///< bits of what is in force, see doc/frames.md
+  std::uint32_t confinement = 0;  ///< bits of frames::Confinement
   std::uint64_t messageBytes = 0;
   std::uint64_t recordBytes = 0;
   std::uint64_t deliveredBytes = 0;

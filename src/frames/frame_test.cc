@@ -6,9 +6,9 @@
 #include <string_view>
 #include <vector>
 
-#include "frames/at_block_end.h"
 #include "frames/frame_assembler.h"
 #include "ironmoat/limits.h"
+#include "support/tight_message.h"
 
 namespace ironmoat::frames {
 namespace {
@@ -86,11 +86,17 @@ TEST(FrameTest, ARefusalWithoutOffsetHasNone) {
 }
 
 TEST(FrameTest, BrokenBodiesAreRefused) {
-  const auto hello = [](const std::string& body) { (void)parseHello(atBlockEnd(body)); };
-  const auto request = [](const std::string& body) { (void)parseRequest(atBlockEnd(body)); };
-  const auto reply = [](const std::string& body) { (void)parseReply(atBlockEnd(body)); };
-  const auto refusal = [](const std::string& body) { (void)parseRefusal(atBlockEnd(body)); };
-  const auto sentence = [](const std::string& body) { (void)parseSentence(atBlockEnd(body)); };
+  const auto hello = [](const std::string& body) { (void)parseHello(testing::tightMessage(body)); };
+  const auto request = [](const std::string& body) {
+    (void)parseRequest(testing::tightMessage(body));
+  };
+  const auto reply = [](const std::string& body) { (void)parseReply(testing::tightMessage(body)); };
+  const auto refusal = [](const std::string& body) {
+    (void)parseRefusal(testing::tightMessage(body));
+  };
+  const auto sentence = [](const std::string& body) {
+    (void)parseSentence(testing::tightMessage(body));
+  };
 
   // Every byte up to here has to be there; what follows may have any length.
   const std::string goodHello = bodyOf(kHelloFrame);
@@ -101,7 +107,7 @@ TEST(FrameTest, BrokenBodiesAreRefused) {
   }
   for (std::size_t i = 0; i < 8 + 1 + 5; ++i) {
     EXPECT_THROW(request(goodRequest.substr(0, i)), FrameError) << i;
-    EXPECT_EQ(requestId(atBlockEnd(goodRequest.substr(0, i))).has_value(), i >= 8) << i;
+    EXPECT_EQ(requestId(testing::tightMessage(goodRequest.substr(0, i))).has_value(), i >= 8) << i;
   }
   for (std::size_t i = 0; i < 9; ++i) {
     EXPECT_THROW(reply(bodyOf(kRefusalFrame).substr(0, i)), FrameError) << i;

@@ -19,11 +19,13 @@ void encodeRecord(const R& record, BlockBuilder& out) {
 
 template <MessageSchema R>
 R decodeRecord(const Data& body) {
-  Reader reader(body);
-  typename R::Arguments arguments;
-  reader.record<R>(arguments);
-  reader.finish();
-  return R::with(std::move(arguments));
+  return R([&] {
+    Reader reader(body);
+    typename R::Arguments arguments{};
+    reader.record<R>(arguments);
+    reader.finish();
+    return arguments;
+  });
 }
 
 #define IRONMOAT_CODEC_OF(R)                              \

@@ -11,11 +11,11 @@
 #include <utility>
 #include <vector>
 
-#include "frames/at_block_end.h"
 #include "ironmoat/command_response.h"
 #include "ironmoat/limits.h"
 #include "ironmoat/user_payload.h"
 #include "ironmoat/web_tunnel_response.h"
+#include "support/tight_message.h"
 
 namespace ironmoat {
 
@@ -30,20 +30,17 @@ void called(const char* record) {
 }  // namespace
 
 // Initialisers that record their calls, in the place of the host's.
-#define RECORDED_INITIALISER(R)     \
-  R R::with(Arguments arguments) {  \
-    called(#R);                     \
-    return R(std::move(arguments)); \
-  }
-RECORDED_INITIALISER(VeskCommandResponse)
-RECORDED_INITIALISER(VeskCommandWebTunnelResponse)
-RECORDED_INITIALISER(DrelUserPayloadHttpHeaders)
-RECORDED_INITIALISER(DrelUserPayloadDeliveryContext)
-RECORDED_INITIALISER(DrelHoplinePluginRequest)
-RECORDED_INITIALISER(DrelHoplineAllocationStatus)
-RECORDED_INITIALISER(DrelHoplineSelfAllocToken)
-RECORDED_INITIALISER(DrelHoplinePluginAllocation)
-RECORDED_INITIALISER(DrelUserPayload)
+void admit(const VeskCommandResponseArguments&) { called("VeskCommandResponse"); }
+void admit(const VeskCommandWebTunnelResponseArguments&) { called("VeskCommandWebTunnelResponse"); }
+void admit(const DrelUserPayloadHttpHeadersArguments&) { called("DrelUserPayloadHttpHeaders"); }
+void admit(const DrelUserPayloadDeliveryContextArguments&) {
+  called("DrelUserPayloadDeliveryContext");
+}
+void admit(const DrelHoplinePluginRequestArguments&) { called("DrelHoplinePluginRequest"); }
+void admit(const DrelHoplineAllocationStatusArguments&) { called("DrelHoplineAllocationStatus"); }
+void admit(const DrelHoplineSelfAllocTokenArguments&) { called("DrelHoplineSelfAllocToken"); }
+void admit(const DrelHoplinePluginAllocationArguments&) { called("DrelHoplinePluginAllocation"); }
+void admit(const DrelUserPayloadArguments&) { called("DrelUserPayload"); }
 
 namespace frames {
 namespace {
@@ -61,7 +58,7 @@ std::string encoded(const R& record) {
 
 template <class R>
 std::string recoded(const std::string& body) {
-  return encoded(decodeRecord<R>(atBlockEnd(body)));
+  return encoded(decodeRecord<R>(testing::tightMessage(body)));
 }
 
 /// Fills fields with values that differ from one another, and from what a fresh field holds.
@@ -145,12 +142,12 @@ template <class R>
 void expectRoundTrips() {
   for (std::size_t only = 0; only < R::Arguments::Fields::count; ++only) {
     const R record = Sampler(1).record<R>([&](std::size_t i) { return i == only; });
-    EXPECT_TRUE(same(decodeRecord<R>(atBlockEnd(encoded(record))), record))
+    EXPECT_TRUE(same(decodeRecord<R>(testing::tightMessage(encoded(record))), record))
         << R::Arguments::Fields::names[only];
   }
   for (const std::size_t step : {1, 2, 3, 11}) {
     const R record = Sampler(2).record<R>([&](std::size_t i) { return i % step == 0; });
-    EXPECT_TRUE(same(decodeRecord<R>(atBlockEnd(encoded(record))), record)) << step;
+    EXPECT_TRUE(same(decodeRecord<R>(testing::tightMessage(encoded(record))), record)) << step;
   }
 }
 
@@ -174,7 +171,7 @@ TEST(RecordCodecTest, RecordsAreLaidOutAsDescribed) {
   const auto response = VeskCommandWebTunnelResponse::with(std::move(arguments));
   EXPECT_EQ(encoded(response), "\x91\0"s + kCommand + "\3\0\0\0a\xC3\xA9"s + kHeaders);
 
-  const Data body = atBlockEnd("\x91\0"s + kCommand + "\3\0\0\0a\xC3\xA9"s + kHeaders);
+  const Data body = testing::tightMessage("\x91\0"s + kCommand + "\3\0\0\0a\xC3\xA9"s + kHeaders);
   const auto back = decodeRecord<VeskCommandWebTunnelResponse>(body);
   EXPECT_TRUE(same(back, response));
   EXPECT_GE(back.contentType->view().data(), body.view().data());  // a slice, not a copy
@@ -200,10 +197,10 @@ TEST(RecordCodecTest, BytesThatBreakTheRulesAreRefused) {
   };
   for (const auto& row : rows) {
     try {
-      (void)decodeRecord<VeskCommandResponse>(atBlockEnd(row.body));
-      ADD_FAILURE() << testing::PrintToString(row.body);
+      (void)decodeRecord<VeskCommandResponse>(testing::tightMessage(row.body));
+      ADD_FAILURE() << ::testing::PrintToString(row.body);
     } catch (const RecordError& error) {
-      EXPECT_STREQ(error.what(), row.sentence) << testing::PrintToString(row.body);
+      EXPECT_STREQ(error.what(), row.sentence) << ::testing::PrintToString(row.body);
     }
   }
 }
@@ -222,7 +219,7 @@ void mutate() {
   const std::string good = encoded(Sampler(1).record<R>());
   const std::size_t step = good.size() / 500 + 1;
   for (std::size_t i = 0; i < good.size(); i += step) {
-    EXPECT_THROW((void)decodeRecord<R>(atBlockEnd(good.substr(0, i))), RecordError) << i;
+    EXPECT_THROW((void)decodeRecord<R>(testing::tightMessage(good.substr(0, i))), RecordError) << i;
     for (int bit = 0; bit < 8; ++bit) {
       std::string bad = good;
       bad[i] = static_cast<char>(bad[i] ^ (1 << bit));
@@ -288,8 +285,9 @@ TEST(RecordCodecTest, DepthIsBoundedAndFitsASmallStack) {
     const std::string closing = two.substr(before + one.size());
     std::string tooDeep;
     for (int i = 0; i < 100000; ++i) tooDeep += opening;
-    EXPECT_THROW((void)decodeRecord<Payload>(atBlockEnd(tooDeep)), RecordError);
-    EXPECT_THROW((void)decodeRecord<Payload>(atBlockEnd(opening + deepest + closing)), RecordError);
+    EXPECT_THROW((void)decodeRecord<Payload>(testing::tightMessage(tooDeep)), RecordError);
+    EXPECT_THROW((void)decodeRecord<Payload>(testing::tightMessage(opening + deepest + closing)),
+                 RecordError);
   });
 }
 
@@ -306,9 +304,9 @@ TEST(RecordCodecTest, ListsAreBoundedByTheMemoryTheyTake) {
     const std::string full = encoded(Payload::with(arguments));
     EXPECT_EQ(recoded<Payload>(full), full);
     arguments.corvelMessageList.push_back(Payload::with({}));
-    EXPECT_THROW(
-        (void)decodeRecord<Payload>(atBlockEnd(encoded(Payload::with(std::move(arguments))))),
-        RecordError);
+    EXPECT_THROW((void)decodeRecord<Payload>(
+                     testing::tightMessage(encoded(Payload::with(std::move(arguments))))),
+                 RecordError);
   }
 }
 
@@ -320,7 +318,7 @@ TEST(RecordCodecTest, TextAndDataAreBoundedInAll) {
   EXPECT_EQ(recoded<VeskCommandResponse>(full), full);
   arguments.applicationId = String("yz");
   const std::string over = encoded(VeskCommandResponse::with(arguments));
-  EXPECT_THROW((void)decodeRecord<VeskCommandResponse>(atBlockEnd(over)), RecordError);
+  EXPECT_THROW((void)decodeRecord<VeskCommandResponse>(testing::tightMessage(over)), RecordError);
 
   arguments.messageUUID = arguments.veskSessionId = arguments.token;
   EXPECT_THROW((void)encoded(VeskCommandResponse::with(std::move(arguments))), RecordError);
@@ -333,7 +331,7 @@ TEST(RecordCodecTest, InitialisersRunChildrenFirstAndMayRefuse) {
   Arguments outer{};
   outer.corvelMessageList.push_back(Payload::with(std::move(inner)));
   outer.deliveryContext = DrelUserPayloadDeliveryContext::with({});
-  const Data body = atBlockEnd(encoded(Payload::with(std::move(outer))));
+  const Data body = testing::tightMessage(encoded(Payload::with(std::move(outer))));
 
   made.clear();
   (void)decodeRecord<Payload>(body);

@@ -95,9 +95,11 @@ class Reader {
   template <Record R>
   [[gnu::noinline]] R nested() {
     static_assert(sizeof(R) <= 512);
-    typename R::Arguments arguments;
-    record<R>(arguments);
-    return R::with(std::move(arguments));
+    return R([&] {
+      typename R::Arguments arguments{};
+      record<R>(arguments);
+      return arguments;
+    });
   }
 
   template <class T>
@@ -124,7 +126,7 @@ class Reader {
   /// A function of its own, so that what it needs of the stack is not held while records nest.
   template <Record R>
   [[gnu::noinline]] static void append(List<R>& to, typename R::Arguments& arguments) {
-    to.push_back(R::with(std::move(arguments)));
+    to.emplace_back([&] { return typename R::Arguments(std::move(arguments)); });
   }
 
   [[gnu::noinline]] String text() {

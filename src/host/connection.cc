@@ -1,11 +1,12 @@
 #include "host/connection.h"
 
-#include <poll.h>
+#include <sys/select.h>
 #include <sys/uio.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <utility>
 
 #include "frames/frame.h"
@@ -14,12 +15,19 @@ namespace ironmoat::host {
 
 namespace {
 
+enum class Readiness : std::uint8_t { toRead, toWrite };
+
 /// A call on a descriptor failed for now: waits until it is ready. False when it failed for good.
-bool waitOut(int descriptor, short events) {
+/// By pselect, because poll takes no descriptors at all under an open-files limit of 0.
+bool waitOut(int descriptor, Readiness readiness) {
   if (errno == EINTR) return true;
   if (errno != EAGAIN && errno != EWOULDBLOCK) return false;
-  pollfd wait{descriptor, events, 0};
-  return poll(&wait, 1, -1) >= 0 || errno == EINTR;
+  fd_set only;
+  FD_ZERO(&only);
+  FD_SET(descriptor, &only);
+  fd_set* const toRead = readiness == Readiness::toRead ? &only : nullptr;
+  fd_set* const toWrite = readiness == Readiness::toWrite ? &only : nullptr;
+  return pselect(descriptor + 1, toRead, toWrite, nullptr, nullptr, nullptr) >= 0 || errno == EINTR;
 }
 
 }  // namespace
@@ -32,7 +40,7 @@ std::optional<Data> RequestSource::next() {
   while (!ended_) {
     try {
       if (std::optional<Data> body = assembler_.next()) return body;
-    } catch (...) {
+    } catch (const frames::FrameError&) {
       ended_ = true;
       throw;
     }
@@ -40,7 +48,7 @@ std::optional<Data> RequestSource::next() {
     const ssize_t count = read(descriptor_, room.data(), room.size());
     if (count > 0) {
       assembler_.commit(static_cast<std::size_t>(count));
-    } else if (count == 0 || !waitOut(descriptor_, POLLIN)) {
+    } else if (count == 0 || !waitOut(descriptor_, Readiness::toRead)) {
       ended_ = true;
     }
   }
@@ -52,22 +60,28 @@ void RequestSource::close() {
   ended_ = true;
 }
 
+ReplySink::ReplySink(int descriptor) : descriptor_(descriptor) {
+  waiting_.reserve(kMostFrames);
+  batch_.reserve(kMostFrames);
+}
+
 void ReplySink::send(BlockRef frame) {
   std::unique_lock lock(mutex_);
-  written_.wait(lock, [&] { return waitingBytes_ < kMostWaiting || broken_; });
+  written_.wait(lock, [&] {
+    return (waitingBytes_ < kMostWaiting && waiting_.size() < kMostFrames) || broken_;
+  });
   if (broken_ || !frame) return;
   waitingBytes_ += frame->size();
   waiting_.push_back(std::move(frame));
   if (writing_) return;
   writing_ = true;
-  std::vector<BlockRef> batch;
   while (!waiting_.empty()) {
-    batch.swap(waiting_);
+    batch_.swap(waiting_);
     waitingBytes_ = 0;
     lock.unlock();
     written_.notify_all();
-    writeAll(batch);
-    batch.clear();
+    writeAll(batch_);
+    batch_.clear();
     lock.lock();
   }
   writing_ = false;
@@ -87,7 +101,7 @@ void ReplySink::writeAll(const std::vector<BlockRef>& frames) {
     }
     const ssize_t result = writev(descriptor_, pieces, static_cast<int>(count));
     if (result < 0) {
-      if (!waitOut(descriptor_, POLLOUT)) broken_ = true;
+      if (!waitOut(descriptor_, Readiness::toWrite)) broken_ = true;
       continue;
     }
     written += static_cast<std::size_t>(result);

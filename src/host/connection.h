@@ -33,10 +33,11 @@ class RequestSource {
 
 /// Replies onto a descriptor, from any thread. A thread that finds another one writing leaves its
 /// reply to it, so that replies finished together leave in one write. Blocks while more is waiting
-/// than `kMostWaiting`: a peer that does not read cannot make the service grow.
+/// than `kMostWaiting`: a peer that does not read cannot make the service grow. Takes no memory to
+/// send, so that a reply that is there gets out.
 class ReplySink {
  public:
-  explicit ReplySink(int descriptor) : descriptor_(descriptor) {}
+  explicit ReplySink(int descriptor);
 
   /// Takes one whole frame.
   void send(BlockRef frame);
@@ -44,7 +45,8 @@ class ReplySink {
   [[nodiscard]] bool broken() const noexcept { return broken_; }
 
  private:
-  static constexpr std::size_t kMostWaiting = std::size_t{32} << 20;
+  static constexpr std::size_t kMostWaiting = std::size_t{32} << 20;  // bytes
+  static constexpr std::size_t kMostFrames = 1024;
 
   void writeAll(const std::vector<BlockRef>& frames);
 
@@ -52,6 +54,7 @@ class ReplySink {
   std::mutex mutex_;
   std::condition_variable written_;
   std::vector<BlockRef> waiting_;
+  std::vector<BlockRef> batch_;  // the writing thread's
   std::size_t waitingBytes_ = 0;
   bool writing_ = false;
   std::atomic<bool> broken_ = false;

@@ -4,12 +4,17 @@
 
 #include <algorithm>
 #include <csignal>
+#include <cstdlib>
 #include <exception>
+#include <latch>
 #include <new>
+#include <shared_mutex>
 #include <thread>
 
+#include "confinement/confinement.h"
 #include "frames/frame.h"
 #include "host/connection.h"
+#include "host/memory_turns.h"
 #include "ironmoat/errors.h"
 
 namespace ironmoat {
@@ -25,7 +30,7 @@ void IronmoatServer::add(std::string_view outputType, Handler handler) {
   registrations_.push_back({outputType, std::move(handler)});
 }
 
-void IronmoatServer::serve(const Data& body, BlockBuilder& reply) const {
+void IronmoatServer::answer(const Data& body, BlockBuilder& reply) const {
   const std::uint64_t id = frames::requestId(body).value_or(0);
   const std::size_t start = reply.size();
   try {
@@ -39,52 +44,118 @@ void IronmoatServer::serve(const Data& body, BlockBuilder& reply) const {
     const std::size_t frame = frames::beginReply(reply, id, Status::record);
     found->handler(request.message, reply);
     return frames::endReply(reply, frame);
+  } catch (const std::bad_alloc&) {
+    reply.truncate(start);
+    throw;
   } catch (const DecodingError& error) {
     reply.truncate(start);
     frames::appendRefusal(reply, id, error);
   } catch (const frames::FrameError& error) {
     reply.truncate(start);
     frames::appendSentence(reply, id, Status::notServed, error.what());
-  } catch (const std::bad_alloc&) {
-    reply.truncate(start);
-    frames::appendRefusal(
-        reply, id,
-        {DecodingError::Kind::limitExceeded, "", "the message takes more memory than there is"});
   } catch (const std::exception& error) {
     reply.truncate(start);
     frames::appendSentence(reply, id, Status::failed, error.what());
   }
 }
 
+void IronmoatServer::serve(const Data& body, BlockBuilder& reply) const {
+  try {
+    answer(body, reply);
+  } catch (const std::bad_alloc&) {
+    frames::appendRefusal(
+        reply, frames::requestId(body).value_or(0),
+        {DecodingError::Kind::limitExceeded, "", "the message takes more memory than there is"});
+  }
+}
+
+namespace {
+
+constexpr int kMostFailuresToRead = 8;
+
+std::uint32_t confineOrExit() {
+  try {
+    return confinement::confine();
+  } catch (const confinement::CannotConfine& error) {
+    std::_Exit(error.exitStatus());
+  }
+}
+
+}  // namespace
+
 void IronmoatServer::run() {
-  std::signal(SIGPIPE, SIG_IGN);  // a peer that stops reading is an end, not a crash
+  // A peer that stops reading is an end, not a crash; so is output that is a file.
+  std::signal(SIGPIPE, SIG_IGN);
+  std::signal(SIGXFSZ, SIG_IGN);
+  confinement::prepareMemory();
   host::ReplySink sink(STDOUT_FILENO);
   host::RequestSource source(STDIN_FILENO);
+  host::MemoryTurns turns;
 
-  BlockBuilder hello;
-  frames::appendHello(hello, frames::Hello::ours());
-  sink.send(hello.finish());
-
+  const auto next = [&] {
+    for (int failures = 0;; ++failures) {
+      try {
+        return source.next();
+      } catch (const std::bad_alloc&) {
+        if (failures == kMostFailuresToRead) throw;
+        const std::unique_lock othersAreDone(turns);
+      }
+    }
+  };
+  // A reply is sent within the turn, for it is memory that counts.
+  const auto reply = [&](const Data& request) {
+    try {
+      const std::shared_lock together(turns);
+      BlockBuilder frame(Sharing::oneThread);
+      answer(request, frame);
+      return sink.send(frame.finish());
+    } catch (const std::bad_alloc&) {  // once more, then, below
+    }
+    const std::unique_lock alone(turns);
+    BlockBuilder frame(Sharing::oneThread);
+    serve(request, frame);
+    sink.send(frame.finish());
+  };
   // Leader and followers: whoever holds the source takes the next request out and serves it, while
   // the next one takes its place.
-  const auto work = [&] {
-    while (!sink.broken()) {
-      BlockBuilder reply(Sharing::oneThread);
-      try {
-        const std::optional<Data> request = source.next();
+  const auto serveAll = [&] {
+    try {
+      while (!sink.broken()) {
+        const std::optional<Data> request = next();
         if (!request) return;
-        serve(*request, reply);
-      } catch (const frames::FrameError& error) {
-        frames::appendSentence(reply, 0, Status::notServed, error.what());
+        reply(*request);
       }
-      sink.send(reply.finish());
+    } catch (const frames::FrameError& error) {
+      BlockBuilder frame(Sharing::oneThread);
+      frames::appendSentence(frame, 0, Status::notServed, error.what());
+      sink.send(frame.finish());
     }
     source.close();
   };
-  const unsigned threads = std::clamp(std::thread::hardware_concurrency(), 2U, 8U);
-  std::vector<std::jthread> followers;
-  for (unsigned i = 1; i < threads; ++i) followers.emplace_back(work);
-  work();
+
+  // This thread serves nothing: its stack would have to grow, which is fatal at the limit of the
+  // address space. Those of the others are there already.
+  constexpr unsigned kFewest = 2;
+  constexpr unsigned kMost = 8;
+  const unsigned threads = std::clamp(std::thread::hardware_concurrency(), kFewest, kMost);
+  std::latch started(threads);
+  std::latch confined(1);
+  std::vector<std::jthread> workers;
+  for (unsigned i = 0; i < threads; ++i) {
+    workers.emplace_back([&] {
+      started.count_down();
+      confined.wait();
+      serveAll();
+    });
+  }
+  started.wait();
+
+  frames::Hello hello = frames::Hello::ours();
+  if (confine_ == Confine::yes) hello.confinement = confineOrExit();
+  BlockBuilder greeting;
+  frames::appendHello(greeting, hello);
+  sink.send(greeting.finish());
+  confined.count_down();
 }
 
 }  // namespace ironmoat

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <concepts>
+#include <cstdint>
 #include <functional>
 #include <string_view>
 #include <utility>
@@ -20,7 +21,10 @@ class IronmoatServer {
   /// The shared instance. It lives as long as the process.
   static IronmoatServer& service();
 
-  IronmoatServer() = default;
+  enum class Confine : std::uint8_t { yes, no };
+
+  /// An unconfined server is for tests and measurements; clients refuse it.
+  explicit IronmoatServer(Confine confine = Confine::yes) noexcept : confine_(confine) {}
   IronmoatServer(const IronmoatServer&) = delete;
   IronmoatServer& operator=(const IronmoatServer&) = delete;
   virtual ~IronmoatServer() = default;
@@ -34,8 +38,10 @@ class IronmoatServer {
     });
   }
 
-  /// Serves until the end of input, on several threads, then returns once every reply is written.
-  /// Also returns when the peer breaks the protocol or stops reading: there is nothing left to do.
+  /// Confines the process for good, then serves until the end of input, on several threads, and
+  /// returns once every reply is written. Also returns when the peer breaks the protocol or stops
+  /// reading: there is nothing left to do. Where it cannot be confined, the process ends with an
+  /// exit status that says why (frames::lackToldBy), nothing having been read or written.
   virtual void run();
 
   /// One request: the frame body of a request to the whole frame of its reply. Never throws for
@@ -49,7 +55,10 @@ class IronmoatServer {
     Handler handler;
   };
   void add(std::string_view outputType, Handler handler);
+  /// As `serve`, but throws std::bad_alloc where memory runs out; `reply` is as it was then.
+  void answer(const Data& request, BlockBuilder& reply) const;
 
+  Confine confine_;
   std::vector<Registration> registrations_;
 };
 

@@ -48,7 +48,7 @@ inline constexpr std::uint8_t kTrue = 0x09;
 inline constexpr std::uint8_t kLengthFollows = 0x0F;
 
 /// `size` bytes (1 to 8) as an unsigned number.
-inline std::uint64_t bigEndian(const unsigned char* bytes, std::size_t size) noexcept {
+constexpr std::uint64_t bigEndian(const unsigned char* bytes, std::size_t size) noexcept {
   if (size == 1) return bytes[0];
   if (size == 2) return static_cast<std::uint64_t>(bytes[0]) << 8 | bytes[1];
   std::uint64_t value = 0;

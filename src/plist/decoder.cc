@@ -12,26 +12,37 @@ std::int64_t integer(const Decoder& decoder) {
   return static_cast<std::int64_t>(decoder.expect(Kind::integer).payload);
 }
 
+detail::Slice slice(const Decoder& decoder, Kind kind) {
+  const Node& node = decoder.expect(kind);
+  decoder.chargeDelivered(node.count);
+  return decoder.document().slice(node);
+}
+
 }  // namespace
 
-void decodeInto(const Decoder& decoder, Int& value) { value = integer(decoder); }
-
-void decodeInto(const Decoder& decoder, Int64& value) { value = integer(decoder); }
-
-void decodeInto(const Decoder& decoder, Bool& value) {
-  value = decoder.expect(Kind::boolean).payload != 0;
+template <>
+Int decodeScalar<Int>(const Decoder& decoder) {
+  return integer(decoder);
 }
 
-void decodeInto(const Decoder& decoder, String& value) {
-  const Node& node = decoder.expect(Kind::string);
-  decoder.chargeDelivered(node.count);
-  value = String(decoder.document().slice(node));
+template <>
+Int64 decodeScalar<Int64>(const Decoder& decoder) {
+  return integer(decoder);
 }
 
-void decodeInto(const Decoder& decoder, Data& value) {
-  const Node& node = decoder.expect(Kind::data);
-  decoder.chargeDelivered(node.count);
-  value = Data(decoder.document().slice(node));
+template <>
+Bool decodeScalar<Bool>(const Decoder& decoder) {
+  return decoder.expect(Kind::boolean).payload != 0;
+}
+
+template <>
+String decodeScalar<String>(const Decoder& decoder) {
+  return String(slice(decoder, Kind::string));
+}
+
+template <>
+Data decodeScalar<Data>(const Decoder& decoder) {
+  return Data(slice(decoder, Kind::data));
 }
 
 std::string Decoder::path() const {

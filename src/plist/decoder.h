@@ -2,8 +2,10 @@
 
 #include <array>
 #include <bit>
+#include <concepts>
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -97,13 +99,29 @@ class Decoder {
   NodeIndex node_;
 };
 
-/// How one value decodes into a field. Records bring an overload of their own.
-void decodeInto(const Decoder& decoder, Int& value);
-void decodeInto(const Decoder& decoder, Int64& value);
-void decodeInto(const Decoder& decoder, Bool& value);
-void decodeInto(const Decoder& decoder, String& value);
-void decodeInto(const Decoder& decoder, Data& value);
+/// The current value as a field of type T.
+template <class T>
+T decodeScalar(const Decoder& decoder);
+template <>
+Int decodeScalar<Int>(const Decoder& decoder);
+template <>
+Int64 decodeScalar<Int64>(const Decoder& decoder);
+template <>
+Bool decodeScalar<Bool>(const Decoder& decoder);
+template <>
+String decodeScalar<String>(const Decoder& decoder);
+template <>
+Data decodeScalar<Data>(const Decoder& decoder);
 
+template <class T>
+concept Scalar = std::same_as<T, Int> || std::same_as<T, Int64> || std::same_as<T, Bool> ||
+    std::same_as<T, String> || std::same_as<T, Data>;
+
+/// The same into a value that is there already. Records bring an overload of their own.
+template <Scalar T>
+void decodeInto(const Decoder& decoder, T& value) {
+  value = decodeScalar<T>(decoder);
+}
 template <class T>
 void decodeInto(const Decoder& decoder, List<T>& list) {
   const Node& array = decoder.expect(Kind::array);
@@ -154,8 +172,8 @@ class KeyedDecodingContainer {
     return value;
   }
 
-  /// The same, into a record's member in place: a plain member is required, an optional one must
-  /// have been seen.
+  /// The same, into a record's member in place: a plain member is required; an optional one must
+  /// have been seen, and be absent so far.
   template <class T>
   void decodeField(Keys key, T& value) const {
     if (!contains(key)) decoder_.failMissing(key.stringValue());
@@ -163,8 +181,13 @@ class KeyedDecodingContainer {
   }
   template <class T>
   void decodeField(Keys key, Optional<T>& value) const {
-    value = Optional<T>(T{});
-    decodeInto(Decoder(decoder_, key.stringValue(), values_[key.index()]), *value);
+    const Decoder decoder(decoder_, key.stringValue(), values_[key.index()]);
+    if constexpr (Scalar<T>) {
+      std::construct_at(&value, decodeScalar<T>(decoder));  // absent so far: it owns nothing
+    } else {
+      value = Optional<T>(T{});
+      decodeInto(decoder, *value);
+    }
   }
 
   /// Calls `visit(key)` in the order of the cases, for each that was seen and each in `required`.

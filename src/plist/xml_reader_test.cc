@@ -8,9 +8,9 @@
 #include "ironmoat/errors.h"
 #include "ironmoat/limits.h"
 #include "plist/reader.h"
-#include "plist/show_document.h"
-#include "plist/tight_message.h"
 #include "plist/xml_chars.h"
+#include "support/show_document.h"
+#include "support/tight_message.h"
 #include "values/utf8.h"
 
 namespace ironmoat::plist {
@@ -22,7 +22,7 @@ using namespace std::string_literals;
 std::string outcome(std::string_view message) {
   Document document;
   try {
-    readXml(tightMessage(message), document);
+    readXml(testing::tightMessage(message), document);
     return show(document);
   } catch (const DecodingError& error) {
     return error.what();

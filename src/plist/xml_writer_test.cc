@@ -8,8 +8,8 @@
 #include "ironmoat/limits.h"
 #include "plist/document_builder.h"
 #include "plist/reader.h"
-#include "plist/show_document.h"
 #include "plist/writer.h"
+#include "support/show_document.h"
 
 namespace ironmoat::plist {
 namespace {

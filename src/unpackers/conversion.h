@@ -77,7 +77,7 @@ typename Argument::Type argumentOf(const Wire& wire, Converted& converted) {
 /// The arguments for `Output::with`: the parts in `converted`, and every other one as `wire` has
 /// it.
 template <class Output, class Wire, class Converted = NothingConverted>
-typename Output::Arguments argumentsFrom(const Wire& wire, Converted converted = {}) {
+typename Output::Arguments argumentsFrom(const Wire& wire, Converted&& converted = {}) {
   using Arguments = typename Output::Arguments;
   return [&]<auto... Members>(FieldList<Arguments, Members...>) {
     static_assert(sizeof...(Members) == detail::FieldsOf<Wire>::Type::count,

@@ -26,14 +26,16 @@ struct Converted {
                            &R::selfAllocTokenList, &R::pluginAllocations>;
 };
 
-DrelUserPayload convertPayload(const VeskCorvelProtocolPayload& wire);
+DrelUserPayloadArguments convertPayload(const VeskCorvelProtocolPayload& wire);
 
 /// An absent list and an empty one both give an empty one.
 List<DrelUserPayload> convertPayloads(const Optional<List<VeskCorvelProtocolPayload>>& wire) {
   List<DrelUserPayload> output;
   if (!wire) return output;
   output.reserve(wire->size());
-  for (const VeskCorvelProtocolPayload& element : *wire) output.push_back(convertPayload(element));
+  for (const VeskCorvelProtocolPayload& element : *wire) {
+    output.emplace_back([&] { return convertPayload(element); });
+  }
   return output;
 }
 
@@ -42,7 +44,9 @@ List<Output> convertRelayList(const Optional<List<Wire>>& wire) {
   List<Output> output;
   if (!wire) return output;
   output.reserve(wire->size());
-  for (const Wire& element : *wire) output.push_back(Output::with(argumentsFrom<Output>(element)));
+  for (const Wire& element : *wire) {
+    output.emplace_back([&] { return argumentsFrom<Output>(element); });
+  }
   return output;
 }
 
@@ -52,16 +56,10 @@ Optional<DrelUserPayloadDeliveryContext> convertDeliveryContext(
   return DrelUserPayloadDeliveryContext::with(argumentsFrom<DrelUserPayloadDeliveryContext>(*wire));
 }
 
-/// Apart from convertPayload, so that the kilobytes of arguments are on the stack once and not once
-/// for each level of nesting.
-[[gnu::noinline]] DrelUserPayload makePayload(const VeskCorvelProtocolPayload& wire,
-                                              Converted&& converted) {
-  return DrelUserPayload::with(argumentsFrom<DrelUserPayload>(wire, std::move(converted)));
-}
-
-/// Children before parents. Recurses as deep as payloads nest: at most half of
-/// limits::nestedContainers, which the reader has checked.
-DrelUserPayload convertPayload(const VeskCorvelProtocolPayload& wire) {
+/// Children before parents: the arguments of the record's own initialiser, once every record in it
+/// is made. Recurses as deep as payloads nest: at most half of limits::nestedContainers, which the
+/// reader has checked.
+DrelUserPayloadArguments convertPayload(const VeskCorvelProtocolPayload& wire) {
   Converted converted{
       .dstIdTokenList = convertPayloads(wire.dstIdTokenList),
       .corvelMessageList = convertPayloads(wire.corvelMessageList),
@@ -72,14 +70,14 @@ DrelUserPayload convertPayload(const VeskCorvelProtocolPayload& wire) {
       .selfAllocTokenList = convertRelayList<DrelHoplineSelfAllocToken>(wire.selfAllocTokenList),
       .pluginAllocations = convertRelayList<DrelHoplinePluginAllocation>(wire.pluginAllocations),
   };
-  return makePayload(wire, std::move(converted));
+  return argumentsFrom<DrelUserPayload>(wire, std::move(converted));
 }
 
 }  // namespace
 
 DrelUserPayload VeskCorvelPayloadUnpacker::unpack(const Data& message) const {
   const auto wire = decodeMessage<VeskCorvelProtocolPayload>(message);
-  return convertPayload(wire);
+  return DrelUserPayload([&] { return convertPayload(wire); });
 }
 
 }  // namespace ironmoat

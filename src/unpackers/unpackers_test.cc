@@ -47,42 +47,31 @@ std::string joined() {
 
 }  // namespace
 
-VeskCommandResponse VeskCommandResponse::with(Arguments arguments) {
+void admit(const VeskCommandResponseArguments& arguments) {
   note("response", show(arguments.command));
-  return VeskCommandResponse(std::move(arguments));
 }
-VeskCommandWebTunnelResponse VeskCommandWebTunnelResponse::with(Arguments arguments) {
+void admit(const VeskCommandWebTunnelResponseArguments& arguments) {
   note("tunnel", show(arguments.command));
-  return VeskCommandWebTunnelResponse(std::move(arguments));
 }
-DrelUserPayloadHttpHeaders DrelUserPayloadHttpHeaders::with(Arguments arguments) {
+void admit(const DrelUserPayloadHttpHeadersArguments& arguments) {
   note("headers", show(arguments.adhocServiceOverride));
-  return DrelUserPayloadHttpHeaders(std::move(arguments));
 }
-DrelUserPayloadDeliveryContext DrelUserPayloadDeliveryContext::with(Arguments arguments) {
+void admit(const DrelUserPayloadDeliveryContextArguments& arguments) {
   note("context", show(arguments.count));
-  return DrelUserPayloadDeliveryContext(std::move(arguments));
 }
-DrelHoplinePluginRequest DrelHoplinePluginRequest::with(Arguments arguments) {
+void admit(const DrelHoplinePluginRequestArguments& arguments) {
   note("request", show(arguments.pluginName));
-  return DrelHoplinePluginRequest(std::move(arguments));
 }
-DrelHoplineAllocationStatus DrelHoplineAllocationStatus::with(Arguments arguments) {
+void admit(const DrelHoplineAllocationStatusArguments& arguments) {
   note("status", show(arguments.participantId));
-  return DrelHoplineAllocationStatus(std::move(arguments));
 }
-DrelHoplineSelfAllocToken DrelHoplineSelfAllocToken::with(Arguments arguments) {
+void admit(const DrelHoplineSelfAllocTokenArguments& arguments) {
   note("token", show(arguments.relayIp));
-  return DrelHoplineSelfAllocToken(std::move(arguments));
 }
-DrelHoplinePluginAllocation DrelHoplinePluginAllocation::with(Arguments arguments) {
+void admit(const DrelHoplinePluginAllocationArguments& arguments) {
   note("allocation", show(arguments.pluginName));
-  return DrelHoplinePluginAllocation(std::move(arguments));
 }
-DrelUserPayload DrelUserPayload::with(Arguments arguments) {
-  note("payload", show(arguments.command));
-  return DrelUserPayload(std::move(arguments));
-}
+void admit(const DrelUserPayloadArguments& arguments) { note("payload", show(arguments.command)); }
 
 namespace {
 

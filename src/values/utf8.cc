@@ -5,8 +5,23 @@
 
 namespace ironmoat {
 
+namespace {
+constexpr std::uint64_t kHighBits = 0x8080808080808080U;
+}
+
+bool isAscii(std::string_view text) noexcept {
+  if (text.size() < 8) return asciiPrefix(text) == text.size();
+  std::uint64_t bits = 0;
+  std::uint64_t word;
+  for (std::size_t at = 0; at < text.size() - 8; at += 8) {
+    std::memcpy(&word, text.data() + at, sizeof word);
+    bits |= word;
+  }
+  std::memcpy(&word, text.data() + text.size() - 8, sizeof word);
+  return ((bits | word) & kHighBits) == 0;
+}
+
 std::size_t asciiPrefix(std::string_view text) noexcept {
-  constexpr std::uint64_t kHighBits = 0x8080808080808080U;
   std::size_t at = 0;
   for (; text.size() - at >= 16; at += 16) {
     std::uint64_t words[2];

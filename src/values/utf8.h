@@ -9,6 +9,8 @@ namespace ironmoat {
 /// How many leading bytes are ASCII.
 std::size_t asciiPrefix(std::string_view text) noexcept;
 
+bool isAscii(std::string_view text) noexcept;
+
 /// Length in bytes of the longest prefix that is well-formed UTF-8 (no surrogates, nothing over
 /// long, nothing past U+10FFFF).
 std::size_t validUtf8Prefix(std::string_view text) noexcept;

@@ -7,7 +7,7 @@
 #include "ironmoat/values.h"
 #include "values/block_builder.h"
 
-namespace ironmoat::plist {
+namespace ironmoat::testing {
 
 /// The bytes at the very end of the memory that holds them, so that a sanitizer sees the first byte
 /// read past them; a Data made in the ordinary way has room behind a short message. For tests and
@@ -24,4 +24,4 @@ inline Data tightMessage(std::string_view bytes) {
                             static_cast<std::uint32_t>(bytes.size())));
 }
 
-}  // namespace ironmoat::plist
+}  // namespace ironmoat::testing

@@ -1,0 +1,57 @@
+# shellcheck shell=bash
+# Sourced by the other scripts: what they need on the machine and how they talk.
+
+root=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
+
+# Debian packages: to build and test, and what the checks of .ci/run need besides.
+packages=(cmake g++ libgtest-dev libseccomp-dev ninja-build pkg-config python3)
+# shellcheck disable=SC2034 # used by those who source this
+check_packages=("${packages[@]}" clang clang-format clang-tidy libclang-rt-dev)
+
+# Runs a command that has nothing to say unless it fails.
+quietly() {
+  local log
+  log=$(mktemp)
+  if ! "$@" >"$log" 2>&1 </dev/null; then
+    cat "$log" >&2
+    rm -f "$log"
+    echo "failed: $*" >&2
+    return 1
+  fi
+  rm -f "$log"
+}
+
+# Installs those of the packages that are missing, or says which they are to who may not.
+require_packages() {
+  local package missing=()
+  command -v dpkg-query >/dev/null || return 0 # not Debian: the build says what it lacks
+  for package in "$@"; do
+    [[ $(dpkg-query -W -f '${db:Status-Status}' "$package" 2>/dev/null) == installed ]] ||
+      missing+=("$package")
+  done
+  ((${#missing[@]} > 0)) || return 0
+  if ((EUID != 0)); then
+    echo "Some packages are missing. Install them, as root, with:" >&2
+    echo "  apt-get install ${missing[*]}" >&2
+    return 1
+  fi
+  echo "Installing ${missing[*]} ..." >&2
+  export DEBIAN_FRONTEND=noninteractive
+  quietly apt-get update
+  quietly apt-get install --yes --no-install-recommends "${missing[@]}"
+}
+
+# build PRESET [TARGET...]: builds the targets, or everything.
+build() (
+  preset=$1
+  shift
+  cd "$root" || exit
+  configure "$preset"
+  quietly cmake --build --preset "$preset" ${1+--target "$@"}
+)
+
+configure() {
+  [[ ! -e $root/build/$1/build.ninja ]] || return 0
+  echo "Building in build/$1; the first time takes a while ..." >&2
+  (cd "$root" && quietly cmake --preset "$1")
+}

@@ -1,0 +1,389 @@
+#include "ironmoat/client.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <cerrno>
+#include <filesystem>
+#include <fstream>
+#include <random>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "ironmoat/command_response.h"
+#include "ironmoat/limits.h"
+
+namespace ironmoat {
+namespace {
+
+using namespace std::chrono_literals;
+using Pending = std::future<VeskCommandResponse>;
+
+Client::Options options(std::string program, std::chrono::milliseconds deadline) {
+  Client::Options all;
+  all.program = std::move(program);
+  all.deadline = deadline;
+  return all;
+}
+Client::Options fake(std::chrono::milliseconds deadline = 20s) {
+  return options(FAKE_SERVICE, deadline);
+}
+
+/// The fake service under another name, which decides how it starts.
+std::string fakeCalled(const std::string& name) {
+  const auto folder = std::filesystem::path(testing::TempDir()) / std::to_string(::getpid());
+  std::filesystem::create_directories(folder);
+  std::filesystem::remove(folder / name);
+  std::filesystem::create_symlink(FAKE_SERVICE, folder / name);
+  return folder / name;
+}
+
+Pending submit(Client& client, const std::string& message) {
+  return client.submit<VeskCommandResponse>(Data(message));
+}
+std::vector<Pending> submitEchoes(Client& client, int count) {
+  std::vector<Pending> all;
+  for (int i = 0; i < count; ++i) all.push_back(submit(client, "echo " + std::to_string(i)));
+  return all;
+}
+
+/// What comes of it, as text: the record's number, or the error.
+template <class Call>
+std::string textOf(Call record) {
+  try {
+    return std::to_string(record().command);
+  } catch (const ServiceError& error) {
+    return std::string(nameOf(error.kind())) + ": " + error.what();
+  } catch (const DecodingError& error) {
+    return std::string(nameOf(error.kind())) + " at " + error.path() + ": " + error.what();
+  }
+}
+std::string outcome(Client& client, const std::string& message) {
+  return textOf([&] { return client.unpack<VeskCommandResponse>(Data(message)); });
+}
+std::string outcome(Pending& pending) {
+  return textOf([&] { return pending.get(); });
+}
+void expectEchoes(std::vector<Pending>& all) {
+  for (std::size_t i = 0; i < all.size(); ++i) EXPECT_EQ(outcome(all[i]), std::to_string(i));
+}
+
+/// Each test leaves descriptors, threads and children as they were.
+class ClientTest : public testing::Test {
+ public:
+  // Sanitizers start a thread of their own with the first thread.
+  static void SetUpTestSuite() {
+    std::thread([] {}).join();
+  }
+  ~ClientTest() override {
+    EXPECT_EQ(entries("/proc/self/fd"), descriptors_);
+    EXPECT_EQ(entries("/proc/self/task"), threads_);
+    EXPECT_EQ(::waitpid(-1, nullptr, WNOHANG), -1) << "a child was left";
+  }
+
+ private:
+  static std::size_t entries(const char* folder) {
+    const auto all = std::filesystem::directory_iterator(folder);
+    return static_cast<std::size_t>(std::distance(begin(all), end(all)));
+  }
+
+  std::size_t descriptors_ = entries("/proc/self/fd");
+  std::size_t threads_ = entries("/proc/self/task");
+};
+
+TEST_F(ClientTest, EachKindOfReplyIsItsOutcome) {
+  Client client(fake());
+  EXPECT_EQ(outcome(client, "echo -3"), "-3");
+  EXPECT_EQ(outcome(client, "refuse"), "typeMismatch at a[1].b: expected data");
+  EXPECT_EQ(outcome(client, "notServed"), "unavailable: nobody unpacks this");
+  EXPECT_EQ(outcome(client, std::string(limits::messageBytes + 1, 'x')),
+            "limitExceeded at : message of 16777217 bytes, more than 16777216");
+  EXPECT_EQ(outcome(client, "echo 1" + std::string(limits::messageBytes - 6, ' ')), "1");
+}
+
+TEST_F(ClientTest, RepliesFindTheirThreads) {
+  Client client(fake());
+  std::vector<std::thread> threads;
+  std::atomic<int> wrong = 0;
+  for (int t = 0; t < 6; ++t) {
+    threads.emplace_back([&, t] {
+      std::vector<std::pair<std::string, Pending>> pending;
+      for (int i = 0; i < 2000; ++i) {
+        const std::string number = std::to_string(t * 10000 + i);
+        const std::string message = (i % 3 == 0 ? "last " : "echo ") + number;
+        if (i < 1000 && t % 2 == 0) {
+          wrong += outcome(client, message) != number ? 1 : 0;
+          continue;
+        }
+        pending.emplace_back(number, submit(client, message));
+        if (pending.size() < 50) continue;
+        for (auto& [expected, future] : pending) wrong += outcome(future) != expected ? 1 : 0;
+        pending.clear();
+      }
+    });
+  }
+  for (auto& thread : threads) thread.join();
+  EXPECT_EQ(wrong, 0);
+}
+
+TEST_F(ClientTest, TheCulpritFailsAndItsNeighboursDoNot) {
+  const struct {
+    std::string message;
+    std::string service;
+  } rows[] = {
+      {"signal 10", "was killed by SIGUSR1 over this message"},
+      {"signal 31", "was killed by SIGSYS (a system call that its confinement forbids) over"},
+      {"exit 3", "exited with status 3 over this message"},
+      {"close", "closed its connection over this message"},
+      {"nextId", "sent a broken frame: a reply to no request over this message"},
+      {"absurdLength", "sent a broken frame: "},
+      {"badRecord", "sent a broken record: "},
+  };
+  for (const auto& row : rows) {
+    Client client(fake());
+    const std::string expected = "crashed: the service " + row.service;
+    EXPECT_EQ(outcome(client, row.message).substr(0, expected.size()), expected);
+    auto before = submitEchoes(client, 20);
+    Pending culprit = submit(client, row.message);
+    auto after = submitEchoes(client, 20);
+    expectEchoes(before);
+    EXPECT_EQ(outcome(culprit).substr(0, expected.size()), expected);
+    expectEchoes(after);
+  }
+}
+
+TEST_F(ClientTest, ATakenOverServiceHarmsNobodyElse) {
+  Client client(fake(300ms));
+  for (const char* first : {"takeOver 1", "twice 1", "unasked 1"}) {
+    EXPECT_EQ(outcome(client, first), "1") << "answered before it shows";
+    EXPECT_EQ(outcome(client, "echo 2"), "2");
+  }
+}
+
+TEST_F(ClientTest, AnyGarbledReplyIsSurvived) {
+  Client client(fake(500ms));
+  int crashes = 0;
+  for (int seed = 0; seed < 100; ++seed) {
+    const std::string got = outcome(client, "garble " + std::to_string(seed));
+    crashes += got.starts_with("crashed: ") ? 1 : 0;
+    EXPECT_EQ(outcome(client, "echo 2"), "2") << seed << ": " << got;
+  }
+  EXPECT_GT(crashes, 20);
+}
+
+TEST_F(ClientTest, OnlyTheRequestThatHangsTimesOut) {
+  for (const char* message : {"ignore", "hang", "drip"}) {
+    Client client(fake(300ms));
+    auto before = submitEchoes(client, 10);
+    Pending culprit = submit(client, message);
+    std::vector<Pending> after;  // together longer than a deadline
+    for (int i = 0; i < 8; ++i) after.push_back(submit(client, "slow 50"));
+    expectEchoes(before);
+    EXPECT_EQ(outcome(culprit), "timedOut: no reply within 300 ms") << message;
+    for (auto& pending : after) EXPECT_EQ(outcome(pending), "50");
+    EXPECT_EQ(outcome(client, message), "timedOut: no reply within 300 ms");
+  }
+}
+
+TEST_F(ClientTest, PoisonAmongAThousand) {
+  Client client(fake(300ms));
+  std::vector<Pending> all;
+  for (int i = 0; i < 1000; ++i) {
+    const std::string echo = "echo " + std::to_string(i);
+    all.push_back(submit(client, i == 100   ? "signal 9"
+                                 : i == 480 ? "ignore"
+                                 : i == 481 ? "exit 1"
+                                            : echo));
+  }
+  for (int i = 0; i < 1000; ++i) {
+    const std::string got = outcome(all[i]);
+    const std::string kind = i == 480 ? "timedOut" : "crashed";
+    const bool poison = i == 100 || i == 480 || i == 481;
+    EXPECT_EQ(got.substr(0, got.find(':')), poison ? kind : std::to_string(i));
+  }
+}
+
+TEST_F(ClientTest, BothDirectionsFull) {
+  Client::Options all = fake(60s);
+  all.maxBytesInFlight = std::size_t{128} << 20;
+  Client client(all);
+  std::vector<Pending> pending;
+  const std::string filler(std::size_t{8} << 20, ' ');
+  for (int i = 0; i < 12; ++i) pending.push_back(submit(client, "large 8000000" + filler));
+  for (auto& future : pending) EXPECT_EQ(future.get().token.value().size(), 8000000U);
+}
+
+TEST_F(ClientTest, BytesInFlightAreBounded) {
+  Client::Options all = fake();
+  all.maxBytesInFlight = 10000;
+  Client client(all);
+  EXPECT_EQ(outcome(client, "echo 5" + std::string(20000, ' ')), "5") << "larger, but alone";
+  std::atomic<int> submitted = 0;
+  Pending slow = submit(client, "slow 200" + std::string(8000, ' '));
+  std::thread other([&] {
+    for (int i = 0; i < 5; ++i) {
+      Pending pending = submit(client, "echo 1" + std::string(4000, ' '));
+      ++submitted;
+      pending.get();
+    }
+  });
+  std::this_thread::sleep_for(50ms);
+  EXPECT_EQ(submitted, 0);
+  EXPECT_EQ(outcome(slow), "200");
+  other.join();
+  EXPECT_EQ(submitted, 5);
+}
+
+TEST_F(ClientTest, WhatCannotServeIsUnavailable) {
+  const struct {
+    std::string program;
+    std::string outcome;
+  } rows[] = {
+      {"/nonexistent/service", "cannot start /nonexistent/service: No such file or directory"},
+      {"/", "cannot start /: Permission denied"},
+      {"/bin/ls", "/bin/ls sent a broken frame: "},
+      {fakeCalled("leaves"), "leaves exited with status 5 before it greeted"},
+      {fakeCalled("fails_to_confine"), "cannot be had: system call filter) before it greeted"},
+      {fakeCalled("unconfined"), "unconfined cannot be used: it is not confined: "},
+      {fakeCalled("garbled"), "garbled sent a broken frame: "},
+      {fakeCalled("other_limits"), "other_limits cannot be used: its limits are not those"},
+      {fakeCalled("silent"), "silent did not greet in time"},
+  };
+  for (const auto& row : rows) {
+    Client client(options(row.program, 1ms));
+    Pending first = submit(client, "echo 1");
+    for (const std::string& got : {outcome(client, "echo 2"), outcome(first)}) {
+      EXPECT_TRUE(got.starts_with("unavailable: ")) << got;
+      EXPECT_NE(got.find(row.outcome), std::string::npos) << got;
+    }
+  }
+}
+
+TEST_F(ClientTest, AServiceThatComesBackIsUsed) {
+  const std::string program = fakeCalled("replaced");
+  std::filesystem::remove(program);
+  Client client(options(program, 2s));
+  for (int i = 0; i < 4; ++i) EXPECT_EQ(outcome(client, "echo 1").substr(0, 11), "unavailable");
+  fakeCalled("replaced");
+  EXPECT_EQ(outcome(client, "echo 1"), "1");
+}
+
+TEST_F(ClientTest, GoesWithRequestsInFlight) {
+  std::vector<Pending> left;
+  {
+    const Client unused(fake());
+    Client client(fake());
+    left.push_back(submit(client, "hang"));
+    for (int i = 0; i < 100; ++i) left.push_back(submit(client, "echo 1"));
+  }
+  for (auto& pending : left) EXPECT_EQ(outcome(pending), "unavailable: the client was destroyed");
+}
+
+TEST_F(ClientTest, TheServiceInheritsNothing) {
+  const int descriptor = ::open("/dev/null", O_RDONLY);  // without CLOEXEC
+  sigset_t blocked;
+  sigset_t before;
+  sigfillset(&blocked);
+  ::pthread_sigmask(SIG_BLOCK, &blocked, &before);
+  ::signal(SIGUSR2, SIG_IGN);
+  EXPECT_EQ(outcome(*std::make_unique<Client>(fake()), "inherited"), "0");
+  ::signal(SIGUSR2, SIG_DFL);
+  ::pthread_sigmask(SIG_SETMASK, &before, nullptr);
+  ::close(descriptor);
+}
+
+void reapAll(int) {
+  const int error = errno;
+  while (::waitpid(-1, nullptr, WNOHANG) > 0) {
+  }
+  errno = error;
+}
+
+TEST_F(ClientTest, ADaemonThatReapsItsOwnChildrenDoesNoHarm) {
+  for (const auto handler : {SIG_IGN, reapAll}) {
+    const auto before = ::signal(SIGCHLD, handler);
+    {
+      Client client(fake());
+      EXPECT_EQ(outcome(client, "echo 1"), "1");
+      EXPECT_EQ(outcome(client, "exit 3").substr(0, 8), "crashed:");
+      EXPECT_EQ(outcome(client, "echo 2"), "2");
+    }
+    ::signal(SIGCHLD, before);
+  }
+}
+
+TEST_F(ClientTest, AForkedChildNeitherUsesNorKeepsTheService) {
+  int done[2];
+  ASSERT_EQ(::pipe(done), 0);
+  auto client = std::make_unique<Client>(fake());
+  EXPECT_EQ(outcome(*client, "echo 1"), "1");
+  const pid_t child = ::fork();
+  if (child == 0) {
+    const bool refused = outcome(*client, "echo 2").starts_with("unavailable: ");
+    client.reset();
+    char byte = 0;
+    // Lives on with copies of the client's descriptors until the parent's client is gone.
+    std::_Exit(::read(done[0], &byte, 1) == 1 && refused ? 0 : 1);
+  }
+  EXPECT_EQ(outcome(*client, "exit 1").substr(0, 8), "crashed:");
+  EXPECT_EQ(outcome(*client, "echo 4"), "4");
+  client.reset();
+  EXPECT_EQ(::write(done[1], "x", 1), 1);
+  int status = -1;
+  EXPECT_EQ(::waitpid(child, &status, 0), child);
+  EXPECT_EQ(status, 0);
+  ::close(done[0]);
+  ::close(done[1]);
+}
+
+void killChildren() {
+  for (const auto& task : std::filesystem::directory_iterator("/proc/self/task")) {
+    std::ifstream file(task.path() / "children");
+    for (pid_t pid = 0; file >> pid;) ::kill(pid, SIGKILL);
+  }
+}
+
+TEST_F(ClientTest, KilledAtRandomTimesUnderLoad) {
+  using Clock = std::chrono::steady_clock;
+  Client client(fake());
+  const auto start = Clock::now();
+  EXPECT_EQ(outcome(client, "echo 1"), "1");
+  const auto spell = 8 * (Clock::now() - start);
+
+  std::atomic<bool> stop = false;
+  std::atomic<int> records = 0;
+  std::atomic<int> killed = 0;
+  std::atomic<int> wrong = 0;
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([&, t] {
+      for (int i = 0; !stop; ++i) {
+        const std::string number = std::to_string(i * 10 + t);
+        Pending other = submit(client, "echo " + number);
+        for (const auto& got : {outcome(client, "echo " + number), outcome(other)}) {
+          const bool named = got.find("was killed by SIGKILL") != std::string::npos;
+          ++(got == number ? records : named ? killed : wrong);
+        }
+      }
+    });
+  }
+  std::mt19937 random(1);
+  int kills = 0;
+  for (; kills < 200 && Clock::now() - start < 10s; ++kills) {
+    std::this_thread::sleep_for(spell * (random() % 1000) / 1000);
+    killChildren();
+  }
+  stop = true;
+  for (auto& thread : threads) thread.join();
+  EXPECT_EQ(wrong, 0);
+  EXPECT_GT(records, kills);
+  EXPECT_LT(killed, kills);
+}
+
+}  // namespace
+}  // namespace ironmoat

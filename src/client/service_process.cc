@@ -1,0 +1,172 @@
+#include "client/service_process.h"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <spawn.h>
+#include <sys/socket.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
+
+#include <bit>
+#include <cerrno>
+#include <csignal>
+#include <cstdint>
+#include <cstring>
+#include <system_error>
+#include <utility>
+
+#include "frames/confinement_bits.h"
+
+namespace ironmoat::client {
+
+namespace {
+
+constexpr auto kPidfd = static_cast<idtype_t>(3);  // P_PIDFD, which older <sys/wait.h> lack
+
+[[noreturn]] void throwStartError(const std::string& program, int error) {
+  const bool passing =
+      error == EAGAIN || error == ENOMEM || error == EMFILE || error == ENFILE || error == ETXTBSY;
+  throw StartError("cannot start " + program + ": " + std::generic_category().message(error),
+                   passing);
+}
+
+/// posix_spawn's attribute objects, which want to be given back.
+struct SpawnSettings {
+  posix_spawn_file_actions_t actions;
+  posix_spawnattr_t attributes;
+  int error;
+
+  explicit SpawnSettings(int socket) {
+    posix_spawn_file_actions_init(&actions);
+    posix_spawnattr_init(&attributes);
+    sigset_t all;
+    sigset_t none;
+    sigfillset(&all);
+    sigemptyset(&none);
+    posix_spawnattr_setsigdefault(&attributes, &all);
+    posix_spawnattr_setsigmask(&attributes, &none);
+    posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF | POSIX_SPAWN_SETSIGMASK);
+    error = posix_spawn_file_actions_adddup2(&actions, socket, STDIN_FILENO);
+    if (error == 0) error = posix_spawn_file_actions_adddup2(&actions, socket, STDOUT_FILENO);
+    if (error == 0) {
+      error = posix_spawn_file_actions_addopen(&actions, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
+    }
+    if (error == 0) error = posix_spawn_file_actions_addclosefrom_np(&actions, STDERR_FILENO + 1);
+  }
+  SpawnSettings(const SpawnSettings&) = delete;
+  SpawnSettings& operator=(const SpawnSettings&) = delete;
+  ~SpawnSettings() {
+    posix_spawn_file_actions_destroy(&actions);
+    posix_spawnattr_destroy(&attributes);
+  }
+};
+
+/// A pidfd of our child, or -1. Where the daemon lets its children be reaped by themselves, the id
+/// may have passed to a stranger by now: a process that is no child of ours is not taken.
+int pidfdOfChild(pid_t pid) noexcept {
+  const int fd = static_cast<int>(::syscall(SYS_pidfd_open, pid, 0));
+  siginfo_t info;
+  if (fd >= 0 && ::waitid(kPidfd, static_cast<id_t>(fd), &info, WEXITED | WNOHANG | WNOWAIT) != 0) {
+    ::close(fd);
+    errno = ECHILD;
+    return -1;
+  }
+  return fd;
+}
+
+std::string exitWord(int status) {
+  std::string word = "exited with status " + std::to_string(status);
+  // A service that cannot be confined says so by 64 + the number of the bit.
+  for (const auto& [part, name] : frames::kConfinementNames) {
+    if (status != 64 + std::countr_zero(static_cast<std::uint32_t>(part))) continue;
+    word += " (this part of its confinement cannot be had: " + std::string(name) + ")";
+  }
+  return word;
+}
+
+}  // namespace
+
+ServiceProcess ServiceProcess::start(const std::string& program) {
+  int ends[2];
+  if (::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
+    throwStartError(program, errno);
+  }
+  FileDescriptor ours(ends[0]);
+  FileDescriptor theirs(ends[1]);
+  // Above the standard three, also in a daemon that has closed its own: otherwise the child's dup2
+  // would overwrite what it is about to read.
+  for (FileDescriptor* end : {&ours, &theirs}) {
+    if (end->get() > STDERR_FILENO) continue;
+    const int moved = ::fcntl(end->get(), F_DUPFD_CLOEXEC, STDERR_FILENO + 1);
+    if (moved < 0) throwStartError(program, errno);
+    *end = FileDescriptor(moved);
+  }
+  if (::fcntl(ours.get(), F_SETFL, O_NONBLOCK) != 0) throwStartError(program, errno);
+
+  const SpawnSettings settings(theirs.get());
+  if (settings.error != 0) throwStartError(program, settings.error);
+  char* arguments[] = {const_cast<char*>(program.c_str()), nullptr};
+  char* environment[] = {nullptr};
+  pid_t pid = 0;
+  const int error = ::posix_spawn(&pid, program.c_str(), &settings.actions, &settings.attributes,
+                                  arguments, environment);
+  if (error != 0) throwStartError(program, error);
+
+  const int pidfd = pidfdOfChild(pid);
+  if (pidfd < 0) {
+    const int reason = errno;
+    if (reason != ECHILD) {  // ours still, and not yet reaped: the id is good
+      ::kill(pid, SIGKILL);
+      while (::waitpid(pid, nullptr, 0) < 0 && errno == EINTR) {
+      }
+    }
+    throwStartError(program, reason);
+  }
+  return {std::move(ours), FileDescriptor(pidfd)};
+}
+
+ServiceProcess::ServiceProcess(FileDescriptor socket, FileDescriptor pidfd) noexcept
+    : socket_(std::move(socket)), pidfd_(std::move(pidfd)) {}
+
+ServiceProcess::~ServiceProcess() {
+  if (!pidfd_) return;
+  kill();
+  siginfo_t info;
+  while (::waitid(kPidfd, static_cast<id_t>(pidfd_.get()), &info, WEXITED) != 0 && errno == EINTR) {
+  }
+}
+
+void ServiceProcess::kill() const noexcept {
+  ::syscall(SYS_pidfd_send_signal, pidfd_.get(), SIGKILL, nullptr, 0);
+}
+
+bool ServiceProcess::endsWithin(std::chrono::milliseconds grace) const noexcept {
+  pollfd ended = {pidfd_.get(), POLLIN, 0};
+  int count = 0;
+  do {
+    count = ::poll(&ended, 1, static_cast<int>(grace.count()));
+  } while (count < 0 && errno == EINTR);
+  return count > 0;
+}
+
+std::string ServiceProcess::lastWord(std::chrono::milliseconds grace) {
+  const bool byItself = endsWithin(grace);
+  if (!byItself) kill();
+  siginfo_t info = {};
+  int result = 0;
+  do {
+    result = ::waitid(kPidfd, static_cast<id_t>(pidfd_.get()), &info, WEXITED);
+  } while (result != 0 && errno == EINTR);
+  pidfd_.reset();
+  if (!byItself) return "closed its connection";
+  // The daemon's own wait calls, or its ignoring SIGCHLD, can have taken the status.
+  if (result != 0) return "ended, and its status is lost";
+  if (info.si_code == CLD_EXITED) return exitWord(info.si_status);
+  const char* name = ::sigabbrev_np(info.si_status);
+  std::string word = "was killed by ";
+  word += name != nullptr ? std::string("SIG") + name : "signal " + std::to_string(info.si_status);
+  if (info.si_status == SIGSYS) word += " (a system call that its confinement forbids)";
+  return word;
+}
+
+}  // namespace ironmoat::client

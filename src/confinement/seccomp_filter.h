@@ -1,0 +1,10 @@
+#pragma once
+
+namespace ironmoat::confinement {
+
+/// Puts the filter in force on all threads: from now on a system call that is not on its list, or
+/// has other arguments than the list says, kills the process. False with errno set when that
+/// cannot be had. Needs no_new_privs, which it sets.
+[[nodiscard]] bool filterSystemCalls() noexcept;
+
+}  // namespace ironmoat::confinement

@@ -1,0 +1,65 @@
+#include "inspect/options.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+namespace ironmoat::inspect {
+namespace {
+
+using Arguments = std::vector<const char*>;
+
+TEST(Options, AreUnderstoodInEveryForm) {
+  struct Row {
+    Arguments arguments;
+    std::string type;
+    Format format;
+    std::string service;
+    std::vector<std::string> files;
+  };
+  const Row rows[] = {
+      {{}, "payload", Format::text, "", {"-"}},
+      {{"a", "-", "b"}, "payload", Format::text, "", {"a", "-", "b"}},
+      {{"--type", "command-response", "a"}, "command-response", Format::text, "", {"a"}},
+      {{"a", "--format=json", "--service=/s", "b"}, "payload", Format::json, "/s", {"a", "b"}},
+      {{"--type=web-tunnel-response"}, "web-tunnel-response", Format::text, "", {"-"}},
+      {{"--format", "json", "--format", "text"}, "payload", Format::text, "", {"-"}},
+      {{"--", "--type", "-x"}, "payload", Format::text, "", {"--type", "-x"}},
+      {{""}, "payload", Format::text, "", {""}},
+  };
+  for (const Row& row : rows) {
+    const Options options = parseOptions(row.arguments);
+    EXPECT_EQ(options.action, Action::unpack);
+    EXPECT_EQ(options.type, row.type);
+    EXPECT_EQ(options.format, row.format);
+    EXPECT_EQ(options.service, row.service);
+    EXPECT_EQ(options.files, row.files);
+  }
+}
+
+TEST(Options, WrongOnesAreNamed) {
+  const std::pair<Arguments, std::string> rows[] = {
+      {{"--colour"}, "unknown option '--colour'"},
+      {{"-x"}, "unknown option '-x'"},
+      {{"--typewriter"}, "unknown option '--typewriter'"},
+      {{"--type"}, "option '--type' needs a value"},
+      {{"--service="}, "option '--service' needs a program"},
+      {{"--format", "xml"}, "unknown format 'xml': text or json"},
+      {{"--type", "\x1B[2J"},
+       "unknown type '\\u{1b}[2J': one of payload, command-response, web-tunnel-response"},
+      {{"--self-test", "a"}, "option '--self-test' goes without files"},
+      {{"-", "-"}, "standard input can be read only once"},
+  };
+  for (const auto& [arguments, message] : rows) {
+    try {
+      parseOptions(arguments);
+      ADD_FAILURE() << message;
+    } catch (const UsageError& error) {
+      EXPECT_EQ(error.what(), message);
+    }
+  }
+}
+
+}  // namespace
+}  // namespace ironmoat::inspect

@@ -1,0 +1,276 @@
+// Servers as processes, looked at from outside: what they report, what the kernel says of them,
+// what they do where they cannot be confined, and how they share their limit of memory.
+
+#include <fcntl.h>
+#include <grp.h>
+#include <gtest/gtest.h>
+#include <poll.h>
+#include <seccomp.h>
+#include <sys/prctl.h>
+#include <sys/resource.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <csignal>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <thread>
+
+#include "confinement/confinement.h"
+#include "frames/frame.h"
+#include "frames/frame_assembler.h"
+#include "ironmoat/command_response.h"
+
+namespace ironmoat {
+namespace {
+
+using frames::Status;
+
+/// A process that runs `program` with a socket as its standard input and output.
+class Child {
+ public:
+  explicit Child(const std::function<void()>& program, int socketFlags = 0) {
+    int ends[2];
+    EXPECT_EQ(socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends), 0);
+    std::fflush(nullptr);
+    pid_ = fork();
+    if (pid_ == 0) {
+      if (socketFlags != 0) fcntl(ends[1], F_SETFL, socketFlags);
+      dup2(ends[1], STDIN_FILENO);
+      dup2(ends[1], STDOUT_FILENO);
+      program();
+      _exit(127);
+    }
+    close(ends[1]);
+    socket_ = ends[0];
+  }
+  Child(const Child&) = delete;
+  Child& operator=(const Child&) = delete;
+  ~Child() {
+    kill(pid_, SIGKILL);
+    static_cast<void>(end());
+    close(socket_);
+  }
+
+  [[nodiscard]] pid_t pid() const { return pid_; }
+
+  void send(std::string_view bytes) {
+    while (!bytes.empty()) {
+      const ssize_t count = ::send(socket_, bytes.data(), bytes.size(), MSG_NOSIGNAL);
+      ASSERT_GT(count, 0);
+      bytes.remove_prefix(static_cast<std::size_t>(count));
+    }
+  }
+  void request(std::uint64_t id, std::string_view message) {
+    BlockBuilder frame;
+    frames::appendRequest(frame, id, VeskCommandResponse::schemaName, message);
+    send({frame.bytes(), frame.size()});
+  }
+  void endInput() const { shutdown(socket_, SHUT_WR); }
+
+  /// The next frame's body; nothing at the end, or after 20 seconds.
+  std::optional<Data> receive() {
+    for (;;) {
+      if (auto body = assembler_.next()) return body;
+      pollfd ready = {socket_, POLLIN, 0};
+      if (poll(&ready, 1, 20'000) <= 0) return std::nullopt;
+      const auto room = assembler_.room();
+      const ssize_t count = read(socket_, room.data(), room.size());
+      if (count <= 0) return std::nullopt;
+      assembler_.commit(static_cast<std::size_t>(count));
+    }
+  }
+  std::uint32_t reportedConfinement() {
+    const auto body = receive();
+    return body ? frames::parseHello(*body).confinement : 0;
+  }
+  /// Waits for the process; what waitpid gives.
+  int end() {
+    if (!status_) {
+      status_ = -1;
+      waitpid(pid_, &*status_, 0);
+    }
+    return *status_;
+  }
+
+ private:
+  pid_t pid_ = 0;
+  int socket_ = -1;
+  std::optional<int> status_;
+  frames::FrameAssembler assembler_{frames::kMaxReplyBody, Sharing::anyThread};
+};
+
+/// By descriptor, for a user who may not search the folder that it is in.
+void run(const char* program) {
+  static char* const nothing[] = {nullptr};
+  fexecve(open(program, O_RDONLY | O_CLOEXEC), nothing, nothing);
+}
+void runService() { run(IRONMOAT_SERVICE); }
+void runTestServer() { run(TEST_SERVER); }
+
+/// Needs what a sanitizer does not stand.
+class FullyConfinedService : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    if (frames::kSanitizedBuild) {
+      GTEST_SKIP() << "built with a sanitizer, which needs what the confinement takes";
+    }
+  }
+};
+
+/// "Name: value" lines of a file in /proc.
+std::map<std::string, std::string> fieldsOf(const std::filesystem::path& file) {
+  std::map<std::string, std::string> fields;
+  std::ifstream in(file);
+  for (std::string line; std::getline(in, line);) {
+    const auto colon = line.find(":\t");
+    if (colon != std::string::npos) fields[line.substr(0, colon)] = line.substr(colon + 2);
+  }
+  return fields;
+}
+
+rlim_t limitOf(pid_t pid, __rlimit_resource resource) {
+  rlimit value = {};
+  EXPECT_EQ(prlimit(pid, resource, nullptr, &value), 0);
+  EXPECT_EQ(value.rlim_cur, value.rlim_max) << resource;
+  return value.rlim_max;
+}
+
+TEST(ConfinedService, ReportsWhatItsBuildRequires) {
+  const std::uint32_t bits = Child(runService).reportedConfinement();
+  EXPECT_EQ(bits & frames::kRequiredConfinement, frames::kRequiredConfinement);
+}
+
+TEST_F(FullyConfinedService, IsConfinedToTheKernelToo) {
+  Child service(runService);
+  ASSERT_TRUE(service.receive());
+  EXPECT_EQ(limitOf(service.pid(), RLIMIT_CORE), 0U);
+  EXPECT_EQ(limitOf(service.pid(), RLIMIT_FSIZE), 0U);
+  EXPECT_EQ(limitOf(service.pid(), RLIMIT_NOFILE), 0U);
+  EXPECT_EQ(limitOf(service.pid(), RLIMIT_NPROC), 0U);
+  EXPECT_EQ(limitOf(service.pid(), RLIMIT_AS), confinement::kAddressSpace);
+  int threads = 0;
+  const auto process = std::filesystem::path("/proc") / std::to_string(service.pid());
+  for (const auto& thread : std::filesystem::directory_iterator(process / "task")) {
+    const auto status = fieldsOf(thread.path() / "status");
+    EXPECT_EQ(status.at("Seccomp"), "2");
+    EXPECT_EQ(status.at("NoNewPrivs"), "1");
+    ++threads;
+  }
+  EXPECT_GE(threads, 3);
+}
+
+TEST_F(FullyConfinedService, WorksAsAnOrdinaryUser) {
+  if (geteuid() != 0) GTEST_SKIP() << "the other tests show it: this user is an ordinary one";
+  constexpr id_t kNobody = 65534;
+  Child service([] {
+    if (setgroups(0, nullptr) == 0 && setgid(kNobody) == 0 && setuid(kNobody) == 0) runService();
+  });
+  const std::uint32_t bits = service.reportedConfinement();
+  EXPECT_EQ(bits & frames::kRequiredConfinement, frames::kRequiredConfinement);
+  // What can be traced belongs to its user.
+  struct stat info = {};
+  ASSERT_EQ(stat(("/proc/" + std::to_string(service.pid()) + "/mem").c_str(), &info), 0);
+  EXPECT_EQ(info.st_uid, 0U);
+}
+
+TEST_F(FullyConfinedService, RefusesToServeUnconfined) {
+  struct Denied {
+    int call;
+    unsigned argument;
+    std::uint64_t value;
+    int status;
+  };
+  for (const Denied& denied : {
+           Denied{SCMP_SYS(seccomp), 0, SECCOMP_SET_MODE_FILTER, 64},
+           Denied{SCMP_SYS(prctl), 0, PR_SET_NO_NEW_PRIVS, 65},
+           Denied{SCMP_SYS(prctl), 0, PR_SET_DUMPABLE, 66},
+           Denied{SCMP_SYS(prlimit64), 1, RLIMIT_CORE, 67},
+           Denied{SCMP_SYS(prlimit64), 1, RLIMIT_FSIZE, 68},
+           Denied{SCMP_SYS(prlimit64), 1, RLIMIT_NOFILE, 69},
+           Denied{SCMP_SYS(prlimit64), 1, RLIMIT_NPROC, 70},
+           Denied{SCMP_SYS(prlimit64), 1, RLIMIT_AS, 71},
+           Denied{SCMP_SYS(prctl), 0, PR_SET_PDEATHSIG, 73},
+       }) {
+    Child service([&] {
+      scmp_filter_ctx filter = seccomp_init(SCMP_ACT_ALLOW);
+      const scmp_arg_cmp same = {denied.argument, SCMP_CMP_EQ, denied.value, 0};
+      seccomp_rule_add_array(filter, SCMP_ACT_ERRNO(EPERM), denied.call, 1, &same);
+      if (seccomp_load(filter) == 0) runService();
+    });
+    EXPECT_FALSE(service.receive()) << "greeted without " << denied.status;
+    const int status = service.end();
+    EXPECT_TRUE(WIFEXITED(status));
+    EXPECT_EQ(WEXITSTATUS(status), denied.status);
+  }
+}
+
+TEST(ConfinedService, EndsWithTheThreadThatStartedIt) {
+  std::unique_ptr<Child> service;
+  std::thread starter([&] {
+    service = std::make_unique<Child>(runService);
+    EXPECT_TRUE(service->receive());
+  });
+  starter.join();
+  const int status = service->end();
+  EXPECT_TRUE(WIFSIGNALED(status) && WTERMSIG(status) == SIGKILL);
+}
+
+TEST_F(FullyConfinedService, MemoryIsSharedAndRefusedToWhoWantsItAllAlone) {
+  Child server(runTestServer);
+  ASSERT_TRUE(server.receive());
+  // Any two of the small ones are too much together.
+  constexpr std::uint64_t kRequests = 40;
+  for (std::uint64_t id = 0; id < kRequests; ++id)
+    server.request(id, id % 8 == 0 ? "hold 1024" : "hold 600");
+  for (std::uint64_t i = 0; i < kRequests; ++i) {
+    const auto body = server.receive();
+    ASSERT_TRUE(body) << "after " << i;
+    const frames::Reply reply = frames::parseReply(*body);
+    if (reply.id % 8 == 0) {
+      ASSERT_EQ(reply.status, Status::refused) << reply.id;
+      EXPECT_EQ(frames::parseRefusal(reply.body).kind(), DecodingError::Kind::limitExceeded);
+    } else {
+      EXPECT_EQ(reply.status, Status::record) << reply.id;
+    }
+  }
+  server.endInput();
+  EXPECT_EQ(server.end(), 0);
+}
+
+TEST(ConfinedService, NonBlockingDescriptorsAndStopsDoNotMatter) {
+  Child server(runTestServer, O_NONBLOCK);
+  ASSERT_TRUE(server.receive());
+  const std::string large(std::size_t{8} << 20, 'x');
+  server.request(1, large);
+  using namespace std::chrono_literals;
+  for (int i = 0; i < 5; ++i) {
+    std::this_thread::sleep_for(5ms);  // waits to write, more than a socket holds
+    kill(server.pid(), SIGSTOP);
+    kill(server.pid(), SIGCONT);
+  }
+  const auto reply = server.receive();
+  ASSERT_TRUE(reply);
+  EXPECT_GT(reply->size(), large.size());
+  for (int i = 0; i < 5; ++i) {
+    std::this_thread::sleep_for(5ms);  // waits to read
+    kill(server.pid(), SIGSTOP);
+    kill(server.pid(), SIGCONT);
+  }
+  server.request(2, "hold 1");
+  EXPECT_TRUE(server.receive());
+  server.endInput();
+  EXPECT_EQ(server.end(), 0);
+}
+
+}  // namespace
+}  // namespace ironmoat

@@ -1,0 +1,295 @@
+// The confinement tried from inside: children that confine themselves and then do one thing.
+
+#include "confinement/confinement.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <linux/futex.h>
+#include <sys/mman.h>
+#include <sys/socket.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <array>
+#include <atomic>
+#include <cerrno>
+#include <condition_variable>
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <exception>
+#include <functional>
+#include <map>
+#include <mutex>
+#include <ostream>
+#include <stdexcept>
+#include <string>
+#include <thread>
+#include <vector>
+
+namespace ironmoat::confinement {
+namespace {
+
+using Arguments = std::array<long, 6>;
+
+/// How a child ended that ran `act`: "returned", an error's name as in "ENOENT", or a signal's.
+/// `act` returns what a system call does.
+std::string outcomeOf(const std::function<long()>& act) {
+  const pid_t child = fork();
+  if (child == 0) {
+    alarm(10);
+    const long result = act();
+    syscall(SYS_exit_group, result < 0 ? errno : 0);
+  }
+  int status = 0;
+  if (waitpid(child, &status, 0) != child) return "lost";
+  if (WIFSIGNALED(status)) return std::string("SIG") + sigabbrev_np(WTERMSIG(status));
+  return WEXITSTATUS(status) == 0 ? "returned" : strerrorname_np(WEXITSTATUS(status));
+}
+
+std::string confinedOutcomeOf(const std::function<long()>& act) {
+  return outcomeOf([&] {
+    confine();
+    return act();
+  });
+}
+
+std::string confinedCall(long number, const Arguments& a) {
+  return confinedOutcomeOf([&] { return syscall(number, a[0], a[1], a[2], a[3], a[4], a[5]); });
+}
+
+class ConfinementTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    if (frames::kSanitizedBuild) {
+      GTEST_SKIP() << "built with a sanitizer, which needs what the confinement takes";
+    }
+    std::fflush(nullptr);
+  }
+};
+
+constexpr long kReadWrite = PROT_READ | PROT_WRITE;
+constexpr long kPrivate = MAP_PRIVATE | MAP_ANONYMOUS;
+
+/// The calls that survive, with arguments that do.
+const std::map<long, Arguments>& listed() {
+  static const timespec noTime = {};
+  static const std::map<long, Arguments> calls = {
+      {SYS_read, {0, 0, 0}},
+      {SYS_write, {2, 0, 0}},
+      {SYS_writev, {1, 0, 0}},
+      {SYS_pselect6, {2, 0, 0, 0, reinterpret_cast<long>(&noTime), 0}},
+      {SYS_openat, {AT_FDCWD, reinterpret_cast<long>("/"), 0}},
+      {SYS_brk, {0}},
+      {SYS_mmap, {0, 4096, kReadWrite, kPrivate, -1, 0}},
+      {SYS_mremap, {0, 4096, 8192, MREMAP_MAYMOVE}},
+      {SYS_munmap, {0, 4096}},
+      {SYS_madvise, {0, 0, MADV_DONTNEED}},
+      {SYS_futex, {0, FUTEX_WAKE, 1}},
+      {SYS_sched_yield, {}},
+      {SYS_clock_gettime, {CLOCK_MONOTONIC, 0}},
+      {SYS_restart_syscall, {}},
+      {SYS_exit, {}},
+      {SYS_exit_group, {}},
+      {SYS_rt_sigprocmask, {SIG_BLOCK, 0, 0, 8}},
+      {SYS_getpid, {}},
+      {SYS_gettid, {}},
+      {SYS_tgkill, {0, 0, SIGABRT}},  // itself, put in below
+  };
+  return calls;
+}
+
+/// Calls of the kernel's own making for a traced program. Newer kernels ask no filter about them;
+/// made from anywhere but the kernel's page for it, one fails and the other is an illegal
+/// instruction.
+constexpr long kUretprobe = 335;
+constexpr long kUprobe = 336;
+
+TEST_F(ConfinementTest, OnlyListedSystemCallsSurvive) {
+  for (long number = 0; number < 512; ++number) {
+    const auto found = listed().find(number);
+    if (number == kUretprobe || number == kUprobe) {
+      EXPECT_NE(confinedCall(number, {}), "returned");
+    } else if (found == listed().end()) {
+      EXPECT_EQ(confinedCall(number, {}), "SIGSYS") << "system call " << number;
+    } else if (number != SYS_tgkill) {
+      EXPECT_NE(confinedCall(number, found->second), "SIGSYS") << "system call " << number;
+    }
+  }
+}
+
+struct Try {
+  const char* what;
+  long number;
+  Arguments arguments;
+  const char* outcome;
+};
+std::ostream& operator<<(std::ostream& out, const Try& tried) { return out << tried.what; }
+
+TEST_F(ConfinementTest, ArgumentsAreLimited) {
+  const long executable = reinterpret_cast<long>(&outcomeOf) & -4096L;
+  const long shared = MAP_SHARED | MAP_ANONYMOUS;
+  const timespec noTime = {};
+  const long time = reinterpret_cast<long>(&noTime);
+  const Try tries[] = {
+      {"read of another descriptor", SYS_read, {1, 0, 0}, "SIGSYS"},
+      {"write to the replies", SYS_write, {1, 0, 0}, "SIGSYS"},
+      {"write to the requests", SYS_write, {0, 0, 0}, "SIGSYS"},
+      {"last words", SYS_writev, {2, 0, 0}, "returned"},
+      {"writev to another descriptor", SYS_writev, {3, 0, 0}, "SIGSYS"},
+      {"waiting for other descriptors", SYS_pselect6, {4, 0, 0, 0, time, 0}, "SIGSYS"},
+      {"an existing file", SYS_openat, {AT_FDCWD, reinterpret_cast<long>("/")}, "ENOENT"},
+      {"a new file", SYS_openat, {-1, reinterpret_cast<long>("/tmp/x"), 0102, 0600}, "ENOENT"},
+
+      {"memory", SYS_mmap, {0, 4096, kReadWrite, kPrivate, -1}, "returned"},
+      {"memory not to be used", SYS_mmap, {0, 4096, PROT_NONE, kPrivate, -1}, "returned"},
+      {"memory to execute", SYS_mmap, {0, 4096, PROT_READ | PROT_EXEC, kPrivate, -1}, "SIGSYS"},
+      {"all rights", SYS_mmap, {0, 4096, kReadWrite | PROT_EXEC, kPrivate, -1}, "SIGSYS"},
+      {"high bits", SYS_mmap, {0, 4096, kReadWrite | (1L << 32), kPrivate, -1}, "SIGSYS"},
+      {"shared memory", SYS_mmap, {0, 4096, kReadWrite, shared, -1}, "SIGSYS"},
+      {"fixed memory",
+       SYS_mmap,
+       {executable, 4096, kReadWrite, kPrivate | MAP_FIXED, -1},
+       "SIGSYS"},
+      {"a mapped file", SYS_mmap, {0, 4096, PROT_READ, MAP_PRIVATE, 0}, "SIGSYS"},
+      {"a descriptor, anonymous", SYS_mmap, {0, 4096, PROT_READ, kPrivate, 0}, "SIGSYS"},
+      {"code made writable", SYS_mprotect, {executable, 4096, kReadWrite}, "SIGSYS"},
+      {"code moved", SYS_mremap, {executable, 4096, 4096, 3, 1L << 32}, "SIGSYS"},
+      {"code given back", SYS_madvise, {executable, 4096, MADV_REMOVE}, "SIGSYS"},
+
+      {"futex wake", SYS_futex, {0, FUTEX_WAKE_PRIVATE, 1}, "returned"},
+      {"futex wait", SYS_futex, {time, FUTEX_WAIT_PRIVATE, 1, time}, "EAGAIN"},
+      {"futex timed wait", SYS_futex, {time, FUTEX_WAIT_BITSET | 384, 1, time, 0, -1}, "EAGAIN"},
+      {"tgkill of init", SYS_tgkill, {1, 1, SIGABRT}, "SIGSYS"},
+      {"tgkill of the parent", SYS_tgkill, {getpid(), getpid(), SIGABRT}, "SIGSYS"},
+      {"a dynamic clock", SYS_clock_gettime, {-6, 0}, "SIGSYS"},
+      {"a call of the x32 kind", 0x40000000 | SYS_getpid, {}, "SIGSYS"},
+  };
+  for (const Try& tried : tries) {
+    const std::string outcome = confinedCall(tried.number, tried.arguments);
+    if (std::string_view(tried.what).starts_with("futex wake")) {
+      EXPECT_NE(outcome, "SIGSYS") << tried;
+    } else {
+      EXPECT_EQ(outcome, tried.outcome) << tried;
+    }
+  }
+  for (const int other : {FUTEX_FD, FUTEX_REQUEUE, FUTEX_CMP_REQUEUE, FUTEX_WAKE_OP, FUTEX_LOCK_PI,
+                          FUTEX_UNLOCK_PI, FUTEX_TRYLOCK_PI, FUTEX_WAKE_BITSET,
+                          FUTEX_WAIT_REQUEUE_PI, FUTEX_CMP_REQUEUE_PI, FUTEX_LOCK_PI2, 64}) {
+    EXPECT_EQ(confinedCall(SYS_futex, {time, other, 1, time}), "SIGSYS") << "futex " << other;
+  }
+  for (int signal = 1; signal < 65; ++signal) {
+    const std::string outcome = confinedOutcomeOf(
+        [&] { return syscall(SYS_tgkill, getpid(), gettid(), static_cast<long>(signal)); });
+    EXPECT_EQ(outcome, signal == SIGABRT ? "SIGABRT" : "SIGSYS") << "tgkill with " << signal;
+  }
+}
+
+#ifdef __x86_64__
+TEST_F(ConfinementTest, CallsByTheOldGateAreFiltered) {
+  const auto getpidByTheOldGate = [] {
+    long result = 20;
+    asm volatile("int $0x80" : "+a"(result) : : "memory");
+    return result;
+  };
+  if (outcomeOf(getpidByTheOldGate) == "SIGSEGV") GTEST_SKIP() << "this kernel has no such gate";
+  EXPECT_EQ(confinedOutcomeOf(getpidByTheOldGate), "SIGSYS");
+}
+#endif
+
+TEST_F(ConfinementTest, ThreadsStartedBeforeAreConfined) {
+  EXPECT_EQ(outcomeOf([] {
+              std::atomic<int> stage = 0;
+              std::thread earlier([&] {
+                stage = 1;
+                stage.notify_one();
+                stage.wait(1);
+                syscall(SYS_getppid);
+              });
+              stage.wait(0);
+              confine();
+              stage = 2;
+              stage.notify_one();
+              earlier.join();
+              return 0L;
+            }),
+            "SIGSYS");
+}
+
+TEST_F(ConfinementTest, WhatThreadsOfAServerDoSurvives) {
+  const auto busy = [] {
+    prepareMemory();
+    std::mutex mutex;
+    std::condition_variable changed;
+    int turn = -1;
+    std::atomic<int> running = 0;
+    std::vector<std::thread> threads;
+    for (int i = 0; i < 4; ++i) {
+      threads.emplace_back([&, i] {
+        ++running;
+        std::unique_lock lock(mutex);
+        for (int round = 0; round < 50; ++round) {
+          changed.wait(lock, [&] { return turn == round * 4 + i; });
+          ++turn;
+          changed.notify_all();
+          lock.unlock();
+          std::vector<std::string> memory;
+          try {
+            for (std::size_t size = 100; size < 2 << 20; size *= 2) memory.emplace_back(size, 'x');
+            if (i % 2 == 0) static_cast<void>(memory.at(1000));
+            static_cast<void>(new char[std::size_t{1} << 40]);
+          } catch (const std::out_of_range&) {
+          } catch (const std::bad_alloc&) {
+          }
+          lock.lock();
+        }
+      });
+    }
+    while (running < 4) std::this_thread::yield();
+    confine();
+    {
+      const std::lock_guard lock(mutex);
+      turn = 0;
+      changed.notify_all();
+    }
+    for (std::thread& thread : threads) thread.join();
+    return turn == 200 ? 0L : -1L;
+  };
+  EXPECT_EQ(outcomeOf(busy), "returned");
+}
+
+TEST_F(ConfinementTest, AbortingIsToldFromAForbiddenCall) {
+  const auto quiet = [] { dup2(open("/dev/null", O_WRONLY), STDERR_FILENO); };
+  const auto outcome = [&](const std::function<void()>& end) {
+    return outcomeOf([&] {
+      quiet();
+      confine();
+      end();
+      return 0L;
+    });
+  };
+  EXPECT_EQ(outcome([] { std::abort(); }), "SIGABRT");
+  EXPECT_EQ(outcome([] { std::terminate(); }), "SIGABRT");
+}
+
+TEST_F(ConfinementTest, DescriptorsThatWereOpenAreClosed) {
+  int ends[2];
+  ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, ends), 0);
+  const pid_t child = fork();
+  if (child == 0) {
+    confine();
+    syscall(SYS_read, STDIN_FILENO, nullptr, 0);
+    for (;;) sched_yield();
+  }
+  close(ends[1]);
+  char byte = 0;
+  EXPECT_EQ(read(ends[0], &byte, 1), 0) << "the child still holds the other end";
+  close(ends[0]);
+  kill(child, SIGKILL);
+  waitpid(child, nullptr, 0);
+}
+
+}  // namespace
+}  // namespace ironmoat::confinement

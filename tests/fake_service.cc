@@ -1,0 +1,183 @@
+// A service that does what each message tells it, for tests of the client: it answers, refuses,
+// dies, hangs, lies. A message is a verb and a number; the record that answers it has the number as
+// its `command`. How it starts depends on the name that it is run by.
+
+#include <signal.h>
+#include <sys/prctl.h>
+#include <unistd.h>
+
+#include <charconv>
+#include <chrono>
+#include <cstdint>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <random>
+#include <string>
+#include <string_view>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "frames/confinement_bits.h"
+#include "frames/frame.h"
+#include "frames/frame_assembler.h"
+#include "frames/record_codec.h"
+#include "ironmoat/command_response.h"
+
+namespace {
+
+using namespace ironmoat;
+using namespace std::chrono_literals;
+
+void write(std::string_view bytes) {
+  while (!bytes.empty()) {
+    const ssize_t count = ::write(STDOUT_FILENO, bytes.data(), bytes.size());
+    if (count <= 0) std::_Exit(2);
+    bytes.remove_prefix(static_cast<std::size_t>(count));
+  }
+}
+
+void write(BlockBuilder& frames) { write({frames.bytes(), frames.size()}); }
+
+[[noreturn]] void hang() {
+  for (;;) ::pause();
+}
+
+void answer(std::uint64_t id, Int number, std::size_t tokenBytes = 0) {
+  VeskCommandResponseArguments arguments;
+  arguments.command = number;
+  if (tokenBytes != 0) arguments.token = Data(std::string(tokenBytes, 't'));
+  BlockBuilder out;
+  const std::size_t start = frames::beginReply(out, id, frames::Status::record);
+  frames::encodeRecord(VeskCommandResponse::with(std::move(arguments)), out);
+  frames::endReply(out, start);
+  write(out);
+}
+
+/// Descriptors, environment and signal state that a service should not have been given.
+Int inheritedThings() {
+  Int things = 0;
+  for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
+    const bool itself = std::filesystem::read_symlink(entry).string().starts_with("/proc/");
+    if (std::stoi(entry.path().filename()) > 2 && !itself) ++things;
+  }
+  if (environ != nullptr && *environ != nullptr) ++things;
+  std::ifstream status("/proc/self/status");
+  for (std::string line; std::getline(status, line);) {
+    if (!line.starts_with("SigBlk:") && !line.starts_with("SigIgn:")) continue;
+    constexpr unsigned long long kOfLibc = 0x180000000;  // 32 and 33, which it sets up by itself
+    if ((std::stoull(line.substr(8), nullptr, 16) & ~kOfLibc) != 0) ++things;
+  }
+  return things;
+}
+
+std::vector<std::pair<std::uint64_t, Int>> held;
+
+void serve(const frames::Request& request) {
+  static bool takenOver = false;
+  if (takenOver) std::_Exit(66);
+
+  const std::string_view text = request.message.view();
+  const std::size_t space = text.find(' ');
+  const std::string_view verb = text.substr(0, space);
+  Int number = 0;
+  if (space != std::string_view::npos) {
+    std::from_chars(text.data() + space + 1, text.data() + text.size(), number);
+  }
+  const std::uint64_t id = request.id;
+  BlockBuilder out;
+  if (verb == "echo") {
+    answer(id, number);
+  } else if (verb == "refuse") {
+    const DecodingError error(DecodingError::Kind::typeMismatch, "a[1].b", "expected data");
+    frames::appendRefusal(out, id, error);
+  } else if (verb == "notServed") {
+    frames::appendSentence(out, id, frames::Status::notServed, "nobody unpacks this");
+  } else if (verb == "large") {  // a reply of so many bytes
+    answer(id, number, static_cast<std::size_t>(number));
+  } else if (verb == "slow") {  // so many milliseconds
+    std::this_thread::sleep_for(std::chrono::milliseconds(number));
+    answer(id, number);
+  } else if (verb == "last") {  // answered after what came with it, the last one first
+    held.emplace_back(id, number);
+  } else if (verb == "inherited") {
+    answer(id, inheritedThings());
+  } else if (verb == "signal") {
+    ::raise(static_cast<int>(number));
+  } else if (verb == "exit") {
+    std::_Exit(static_cast<int>(number));
+  } else if (verb == "takeOver") {  // the next request will be the one to suffer
+    takenOver = true;
+    answer(id, number);
+  } else if (verb == "ignore") {  // this one only, as when one of several threads hangs
+  } else if (verb == "hang") {
+    hang();
+  } else if (verb == "close") {
+    ::close(STDIN_FILENO);
+    ::close(STDOUT_FILENO);
+    hang();
+  } else if (verb == "nextId") {  // asked for soon, perhaps, but not yet
+    answer(id + 1, number);
+  } else if (verb == "twice") {
+    answer(id, number);
+    answer(id, number);
+  } else if (verb == "absurdLength") {
+    write("\xff\xff\xff\xff....");
+  } else if (verb == "badRecord") {
+    const std::size_t start = frames::beginReply(out, id, frames::Status::record);
+    out.append("\xff\xff\xff\xff\xff\xff\xff\xff");
+    frames::endReply(out, start);
+  } else if (verb == "drip") {  // a reply of megabytes, a byte at a time
+    write(std::string_view("\0\0\x40\0", 4));
+    for (;;) {
+      write(".");
+      std::this_thread::sleep_for(1ms);
+    }
+  } else if (verb == "garble") {  // a good reply with a few bytes changed
+    frames::appendRefusal(out, id, {DecodingError::Kind::malformed, "a.b", "broken", 7});
+    const std::size_t start = frames::beginReply(out, id, frames::Status::record);
+    VeskCommandResponseArguments arguments;
+    arguments.applicationId = String("application");
+    frames::encodeRecord(VeskCommandResponse::with(std::move(arguments)), out);
+    frames::endReply(out, start);
+    std::mt19937 random(static_cast<unsigned>(number));
+    const std::size_t first = number % 2 == 0 ? 0 : start;  // garble the refusal, or the record
+    const std::size_t size = (number % 2 == 0 ? start : out.size()) - first;
+    for (int i = 0; i < 2; ++i) out.bytes()[first + random() % size] = static_cast<char>(random());
+    write({out.bytes() + first, size});
+    std::_Exit(0);
+  } else if (verb == "unasked") {  // bytes when nothing is owed
+    answer(id, number);
+    write(std::string_view("\x20\0\0\0", 4));
+    hang();
+  }
+  if (out.size() != 0) write(out);
+}
+
+}  // namespace
+
+int main(int, char** arguments) {
+  ::prctl(PR_SET_PDEATHSIG, SIGKILL);
+  const std::string name = std::filesystem::path(arguments[0]).filename();
+  if (name == "silent") hang();
+  if (name == "leaves") return 5;
+  if (name == "fails_to_confine") return 64;
+  frames::Hello hello = frames::Hello::ours();
+  if (name != "unconfined") hello.confinement = frames::kRequiredConfinement;
+  if (name == "other_limits") hello.recordBytes /= 2;
+  BlockBuilder greeting;
+  frames::appendHello(greeting, hello);
+  if (name == "garbled") greeting.bytes()[4] ^= 1;
+  write(greeting);
+
+  frames::FrameAssembler assembler(frames::kMaxRequestBody, Sharing::oneThread);
+  for (;;) {
+    const auto room = assembler.room();
+    const ssize_t count = ::read(STDIN_FILENO, room.data(), room.size());
+    if (count <= 0) return 0;
+    assembler.commit(static_cast<std::size_t>(count));
+    while (const auto body = assembler.next()) serve(frames::parseRequest(*body));
+    for (; !held.empty(); held.pop_back()) answer(held.back().first, held.back().second);
+  }
+}

@@ -1,0 +1,67 @@
+"""Messages at the limits and just past them: (what, message, what comes of it). An outcome of None
+is the model's."""
+
+
+def chain(keys, payloads, tip):
+    """Payloads, each in a list of the next; `keys` are those of the lists in turn."""
+    message = {"c": payloads} | tip
+    for number in range(payloads - 1, 0, -1):
+        message = {"c": number, keys[number % len(keys)]: [message]}
+    return message
+
+
+def lists(depth):
+    value = []
+    for _ in range(depth - 1):
+        value = [value]
+    return value
+
+
+def refused(path):
+    return {"error": {"kind": "limitExceeded", "path": path}}
+
+
+def nesting(limit):
+    """The containers inside one another are `limit`, or one more. A payload within a payload takes
+    two, so that those of a chain end at an odd number."""
+    assert limit % 2 == 0
+    payloads = limit // 2
+    for keys in (["dtl"], ["mml"], ["dtl", "mml", "mml"]):
+        for tip in ({"mml": []}, {"h": {"aS": "x"}}, {"Dc": {"c": 1}}, {"dal": ["x"]}, {"?": {}}):
+            yield f"{tip} at the limit", chain(keys, payloads, tip), None
+        for tip in ({"mml": [{"c": 1}]}, {"qal": [{}]}, {"h": {"?": []}}, {"?": [[]]}):
+            yield f"{tip} past the limit", chain(keys, payloads, tip), refused("")
+    yield "unknown lists at the limit", {"c": 1, "?": lists(limit - 1)}, None
+    yield "unknown lists past the limit", {"c": 1, "?": lists(limit)}, refused("")
+
+
+def lists_of_records(tables):
+    """Lists that take all the memory that there is for records, and one record more."""
+    size = {record["name"]: record["bytes"] for record in tables["wireRecords"]}
+    limit = tables["limits"]["recordBytes"]
+    tiny = {"c": 1}
+    most = limit // size["VeskCorvelProtocolPayload"]
+    yield "one list", {"c": 1, "dtl": [tiny] * most}, None
+    yield "one list", {"c": 1, "dtl": [tiny] * (most + 1)}, refused("dtl")
+    yield "two lists", {"c": 1, "mml": [tiny] * (most - 1), "dtl": [tiny]}, None
+    yield "two lists", {"c": 1, "mml": [tiny] * most, "dtl": [tiny]}, refused("mml")
+    within = {"c": 2, "mml": [tiny] * (most // 2 - 1)}
+    yield "lists in a list", {"c": 1, "mml": [within] * 2}, None
+    within = {"c": 2, "mml": [tiny] * (most // 2)}
+    yield "lists in a list", {"c": 1, "mml": [within] * 2}, refused("mml[1].mml")
+    most = limit // size["VeskHoplineSelfAllocToken"]
+    yield "a list of small records", {"c": 1, "qsatv": [{}] * most}, None
+    yield "a list of small records", {"c": 1, "qsatv": [{}] * (most + 1)}, refused("qsatv")
+
+
+def large_values():
+    yield "many texts", {"c": 1, "dul": [f"{number:x}" for number in range(70_000)]}, None
+    yield "long text", {"c": 1, "ua": "ä😀" * 200_000, "i": "x" * 3_000_000}, None
+    yield "many bytes", {"c": 1, "P": bytes(range(256)) * 30_000}, None
+    yield "many unknown keys", dict.fromkeys(map(str, range(70_000)), 1) | {"c": 1}, None
+
+
+def messages(tables):
+    yield from nesting(tables["limits"]["nestedContainers"])
+    yield from lists_of_records(tables)
+    yield from large_values()

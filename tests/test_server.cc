@@ -1,0 +1,64 @@
+// A confined server whose one unpacker does what each message says, a verb and perhaps a number:
+// `hold N` takes N MiB for a moment, `crash` and `stall` do so, `forbidden` makes a
+// system call that is; everything else is answered with the message as the token. The number comes
+// back as the command.
+
+#include <unistd.h>
+
+#include <charconv>
+#include <chrono>
+#include <cstdlib>
+#include <memory>
+#include <string_view>
+#include <utility>
+
+#include "host/server.h"
+#include "ironmoat/command_response.h"
+
+namespace {
+
+using namespace ironmoat;
+
+void hold(std::size_t mebibytes) {
+  const auto held = std::make_unique_for_overwrite<volatile char[]>(mebibytes << 20);
+  held[0] = 1;
+  const auto end = std::chrono::steady_clock::now() + std::chrono::milliseconds(2);
+  while (std::chrono::steady_clock::now() < end) {
+  }
+}
+
+struct ObedientUnpacker {
+  using MessageSchemaType = VeskCommandResponse;
+
+  [[nodiscard]] VeskCommandResponse unpack(const Data& message) const {
+    VeskCommandResponseArguments arguments;
+    const std::string_view text = message.view();
+    const std::string_view verb = text.substr(0, text.find(' '));
+    if (verb.size() < text.size()) {
+      const char* const number = text.data() + verb.size() + 1;
+      std::from_chars(number, text.data() + text.size(), arguments.command);
+    }
+    if (verb == "hold") {
+      hold(static_cast<std::size_t>(arguments.command));
+    } else if (verb == "crash") {
+      std::abort();
+    } else if (verb == "stall") {
+      for (volatile bool forever = true; forever;) {
+      }
+    } else if (verb == "forbidden") {
+      static_cast<void>(::getppid());
+    } else {
+      arguments.token = message;
+    }
+    return VeskCommandResponse::with(std::move(arguments));
+  }
+};
+
+}  // namespace
+
+int main() {
+  IronmoatServer server;
+  server.registerUnpacker<VeskCommandResponse>(ObedientUnpacker());
+  server.run();
+  return 0;
+}
