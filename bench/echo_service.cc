@@ -1,6 +1,7 @@
 // What the service would be if unpacking were free: as confined, reads requests through the same
 // assembler and answers each with the reply that a typical message gets.
 
+#include <sys/uio.h>
 #include <unistd.h>
 
 #include <csignal>
@@ -22,7 +23,8 @@ using namespace ironmoat;
 
 bool writeAll(std::string_view bytes) {
   while (!bytes.empty()) {
-    const ssize_t count = ::write(STDOUT_FILENO, bytes.data(), bytes.size());
+    const iovec piece = {const_cast<char*>(bytes.data()), bytes.size()};
+    const ssize_t count = ::writev(STDOUT_FILENO, &piece, 1);  // what confinement allows
     if (count <= 0) return false;
     bytes.remove_prefix(static_cast<std::size_t>(count));
   }

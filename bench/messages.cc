@@ -131,8 +131,4 @@ Data inOneThreadBlock(std::string_view bytes) {
   return Data(detail::Slice::copyOf(bytes, Sharing::oneThread));
 }
 
-Data messageOf(const VeskCorvelProtocolPayload& record, plist::Form form) {
-  return inOneThreadBlock(plist::PropertyListEncoder(form).encode(record).view());
-}
-
 }  // namespace ironmoat::bench

@@ -28,7 +28,10 @@ VeskCorvelProtocolPayload typicalPayload(unsigned number);
 Data inOneThreadBlock(std::string_view bytes);
 
 /// The record as a message, ready to be unpacked.
-Data messageOf(const VeskCorvelProtocolPayload& record, plist::Form form);
+template <class R>
+Data messageOf(const R& record, plist::Form form) {
+  return inOneThreadBlock(plist::PropertyListEncoder(form).encode(record).view());
+}
 
 constexpr std::string_view nameOf(plist::Form form) {
   return form == plist::Form::binary ? "binary" : "xml";

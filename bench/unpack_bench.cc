@@ -8,6 +8,7 @@
 #include <string>
 #include <vector>
 
+#include "ironmoat/errors.h"
 #include "messages.h"
 #include "protobuf_peer.h"
 #include "unpackers/corvel_payload_unpacker.h"
@@ -25,6 +26,26 @@ void add(std::string_view message, std::string_view what, Function once, std::si
   });
 }
 
+/// The record with a last field of the wrong kind: all the work is done by then.
+struct WrongAtLast {
+  const VeskCorvelProtocolPayload& record;
+  void encode(plist::Encoder& encoder) const {
+    record.encode(encoder);
+    encoder.builder().string(VeskCorvelProtocolPayload::CodingKeys::of<
+                             &VeskCorvelProtocolPayload::allowGDR>()
+                                 .stringValue());
+    encoder.builder().string("wrong");
+  }
+};
+
+bool isRefused(const Data& message) {
+  try {
+    return VeskCorvelPayloadUnpacker().unpack(message).command == 0;
+  } catch (const DecodingError&) {
+    return true;
+  }
+}
+
 void addForm(const Sample& sample, plist::Form form) {
   const Data message = messageOf(sample.record, form);
   const std::string prefix = std::string(nameOf(form)) + "/";
@@ -36,6 +57,8 @@ void addForm(const Sample& sample, plist::Form form) {
         return VeskCorvelPayloadUnpacker().unpack(inOneThreadBlock(bytes)).command;
       },
       size);
+  const Data wrong = messageOf(WrongAtLast{sample.record}, form);
+  add(sample.name, prefix + "refused", [wrong] { return isRefused(wrong); }, wrong.size());
   add(sample.name, prefix + "memcpy",
       [bytes = std::string(message.view()), to = std::vector<char>(size)]() mutable {
         std::memcpy(to.data(), bytes.data(), bytes.size());

@@ -268,7 +268,7 @@ class CommandLine(InFolder):
         self.assertEqual((result.returncode, result.stderr), (0, b""))
         for word in (b"--type", b"--format", b"--service", b"unreadable", b"Exit status"):
             self.assertIn(word, result.stdout)
-        self.assertTrue(all(len(line) <= 84 for line in result.stdout.splitlines()))
+        self.assertTrue(all(len(line) <= 80 for line in result.stdout.splitlines()))
         result = unpack("--version")
         self.assertEqual((result.returncode, result.stderr), (0, b""))
         self.assertRegex(result.stdout, rb"\Avesk-unpack \d+\.\d+\.\d+\n\Z")

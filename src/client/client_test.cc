@@ -34,9 +34,13 @@ Client::Options fake(std::chrono::milliseconds deadline = 20s) {
   return options(FAKE_SERVICE, deadline);
 }
 
+std::filesystem::path ownFolder() {
+  return std::filesystem::path(testing::TempDir()) / ("client_test." + std::to_string(::getpid()));
+}
+
 /// The fake service under another name, which decides how it starts.
 std::string fakeCalled(const std::string& name) {
-  const auto folder = std::filesystem::path(testing::TempDir()) / std::to_string(::getpid());
+  const auto folder = ownFolder();
   std::filesystem::create_directories(folder);
   std::filesystem::remove(folder / name);
   std::filesystem::create_symlink(FAKE_SERVICE, folder / name);

@@ -105,19 +105,20 @@ Options parseOptions(std::span<const char* const> arguments) {
 std::string_view helpText() noexcept {
   return R"(Usage: vesk-unpack [OPTION...] [FILE...]
 
-Has each FILE, one property-list message (binary or XML), unpacked by the service
-VeskIronmoatService in a process of its own, and prints the record, or why the
-message was refused. Reads standard input when there is no FILE or FILE is -.
+Has each FILE, one property-list message (binary or XML), unpacked by the
+service VeskIronmoatService in a process of its own, and prints the record, or
+why the message was refused. Without FILE, or for -, reads standard input.
 
   --type TYPE        what the messages are: payload (default), command-response,
                      web-tunnel-response
   --format FORMAT    text (default), for people: records on standard output,
                      refusals on standard error, long values cut; or
                      json, for programs: one line for each FILE, in order,
-                       {"file": F, "record": {...}} or
-                       {"file": F, "error": {"kind": K, "path": P, "message": M}}
-  --service PROGRAM  the service to use instead of the one that came with this tool
-  --self-test        show what confines the service, and what comes of forbidden acts
+                     {"file": F, "record": {...}} or
+                     {"file": F, "error": {"kind": K, "path": P, "message": M}}
+  --service PROGRAM  use this service, not the one that came with this tool
+  --self-test        show what confines the service, and what comes of what is
+                     forbidden to it
   --help, -h         print this
   --version          print the version
 
@@ -125,9 +126,9 @@ Kinds of error: malformed, limitExceeded, typeMismatch, outOfRange, keyNotFound
 (the message was refused), crashed, timedOut (the service failed over it),
 unavailable (no service could be had), unreadable (FILE could not be read).
 
-Exit status: 0 all unpacked; 1 some message refused, or the service failed over it,
-or it is not confined as it has to be;
-2 wrong usage, a FILE that could not be read, no service, output not writable.
+Exit status: 0 all unpacked; 1 some message refused, or the service failed over
+it, or it is not confined as it has to be; 2 wrong usage, a FILE that could not
+be read, no service, output not writable.
 )";
 }
 

@@ -47,13 +47,4 @@ inline constexpr std::uint8_t kFalse = 0x08;
 inline constexpr std::uint8_t kTrue = 0x09;
 inline constexpr std::uint8_t kLengthFollows = 0x0F;
 
-/// `size` bytes (1 to 8) as an unsigned number.
-constexpr std::uint64_t bigEndian(const unsigned char* bytes, std::size_t size) noexcept {
-  if (size == 1) return bytes[0];
-  if (size == 2) return static_cast<std::uint64_t>(bytes[0]) << 8 | bytes[1];
-  std::uint64_t value = 0;
-  for (std::size_t i = 0; i < size; ++i) value = value << 8 | bytes[i];
-  return value;
-}
-
 }  // namespace ironmoat::plist::binary

@@ -14,7 +14,6 @@
 
 namespace ironmoat::plist {
 
-using binary::bigEndian;
 using binary::Marker;
 
 /// Three passes, each linear in the message: every object of the table becomes a node; keys are
@@ -50,6 +49,15 @@ class BinaryReader {
   }
 
  private:
+  /// `size` bytes (1 to 8) as an unsigned number, by one load of 8: from any place below the
+  /// trailer that stays inside the message, since the trailer's 32 bytes follow.
+  static std::uint64_t bigEndian(const unsigned char* bytes, std::size_t size) {
+    static_assert(binary::kTrailerSize >= 8);
+    std::uint64_t word;
+    std::memcpy(&word, bytes, sizeof word);
+    return __builtin_bswap64(word) >> (64 - 8 * size);
+  }
+
   static constexpr std::uint16_t kTooDeep = limits::nestedContainers + 1;
   static constexpr std::uint16_t kOpen = std::numeric_limits<std::uint16_t>::max();
 
@@ -70,7 +78,7 @@ class BinaryReader {
     }
     const std::uint64_t count = bigEndian(bytes_ + trailer + 8, 8);
     const std::uint64_t root = bigEndian(bytes_ + trailer + 16, 8);
-    const std::uint64_t table = bigEndian(bytes_ + trailer + 24, 8);
+    const std::uint64_t table = bigEndian(bytes_ + trailer + 24, 8);  // the message's last bytes
     if (table <= binary::kHeader.size() || table >= trailer) {
       throw malformed("offset table out of bounds", trailer + 24);
     }
@@ -275,7 +283,12 @@ class BinaryReader {
     std::uint64_t lowest = objectCount_;
     std::uint64_t highest = 0;
     for (std::size_t i = 0; i < count; ++i) {
-      const std::uint64_t reference = bigEndian(from + i * size, size);
+      std::uint64_t reference;
+      if constexpr (std::is_same_v<Size, std::integral_constant<std::size_t, 1>>) {
+        reference = from[i];
+      } else {
+        reference = bigEndian(from + i * size, size);
+      }
       children[i] = static_cast<NodeIndex>(reference);
       lowest = std::min(lowest, reference);
       highest = std::max(highest, reference);

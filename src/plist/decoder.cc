@@ -4,47 +4,6 @@
 
 namespace ironmoat::plist {
 
-namespace {
-
-std::int64_t integer(const Decoder& decoder) {
-  const Node& node = decoder.node();
-  if (node.kind == Kind::unsignedInteger) decoder.failOutOfRange();
-  return static_cast<std::int64_t>(decoder.expect(Kind::integer).payload);
-}
-
-detail::Slice slice(const Decoder& decoder, Kind kind) {
-  const Node& node = decoder.expect(kind);
-  decoder.chargeDelivered(node.count);
-  return decoder.document().slice(node);
-}
-
-}  // namespace
-
-template <>
-Int decodeScalar<Int>(const Decoder& decoder) {
-  return integer(decoder);
-}
-
-template <>
-Int64 decodeScalar<Int64>(const Decoder& decoder) {
-  return integer(decoder);
-}
-
-template <>
-Bool decodeScalar<Bool>(const Decoder& decoder) {
-  return decoder.expect(Kind::boolean).payload != 0;
-}
-
-template <>
-String decodeScalar<String>(const Decoder& decoder) {
-  return String(slice(decoder, Kind::string));
-}
-
-template <>
-Data decodeScalar<Data>(const Decoder& decoder) {
-  return Data(slice(decoder, Kind::data));
-}
-
 std::string Decoder::path() const {
   std::vector<const Decoder*> way;
   for (const Decoder* at = this; at->parent_ != nullptr; at = at->parent_) way.push_back(at);

@@ -99,23 +99,24 @@ class Decoder {
   NodeIndex node_;
 };
 
-/// The current value as a field of type T.
-template <class T>
-T decodeScalar(const Decoder& decoder);
-template <>
-Int decodeScalar<Int>(const Decoder& decoder);
-template <>
-Int64 decodeScalar<Int64>(const Decoder& decoder);
-template <>
-Bool decodeScalar<Bool>(const Decoder& decoder);
-template <>
-String decodeScalar<String>(const Decoder& decoder);
-template <>
-Data decodeScalar<Data>(const Decoder& decoder);
-
 template <class T>
 concept Scalar = std::same_as<T, Int> || std::same_as<T, Int64> || std::same_as<T, Bool> ||
     std::same_as<T, String> || std::same_as<T, Data>;
+
+/// The current value as a field of type T.
+template <Scalar T>
+T decodeScalar(const Decoder& decoder) {
+  if constexpr (std::same_as<T, Bool>) {
+    return decoder.expect(Kind::boolean).payload != 0;
+  } else if constexpr (std::same_as<T, String> || std::same_as<T, Data>) {
+    const Node& node = decoder.expect(std::same_as<T, String> ? Kind::string : Kind::data);
+    decoder.chargeDelivered(node.count);
+    return T(decoder.document().slice(node));
+  } else {
+    if (decoder.node().kind == Kind::unsignedInteger) decoder.failOutOfRange();
+    return static_cast<T>(decoder.expect(Kind::integer).payload);
+  }
+}
 
 /// The same into a value that is there already. Records bring an overload of their own.
 template <Scalar T>

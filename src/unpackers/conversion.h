@@ -57,18 +57,19 @@ using FieldNamed = decltype(pick<fieldIndex<R>(Name::name)>(
                               typename FieldsOf<R>::Type>*>(nullptr)));
 
 /// What argument `Argument` is made of: the converted part of its name, else the wire field of its
-/// name, which must be of exactly its type.
+/// name, which must be of exactly its type. A reference, so that the argument is made from it in
+/// place (by way of a temporary each of 150 would cost two copies).
 template <class Argument, class Wire, class Converted>
-typename Argument::Type argumentOf(const Wire& wire, Converted& converted) {
+decltype(auto) argumentOf(const Wire& wire, Converted& converted) {
   using Part = FieldNamed<Converted, Argument>;
   if constexpr (!std::is_void_v<Part>) {
-    return std::move(Part::in(converted));
+    return std::move(Part::in(converted));  // an rvalue reference
   } else {
     using Same = FieldNamed<Wire, Argument>;
     static_assert(!std::is_void_v<Same>, "no wire field has this argument's name");
     static_assert(std::is_same_v<typename Same::Type, typename Argument::Type>,
                   "the wire field of this argument's name is of another type");
-    return Same::in(wire);
+    return (Same::in(wire));
   }
 }
 
