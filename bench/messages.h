@@ -33,6 +33,18 @@ Data messageOf(const R& record, plist::Form form) {
   return inOneThreadBlock(plist::PropertyListEncoder(form).encode(record).view());
 }
 
+/// The record with a last field of the wrong kind: all the work is done by then.
+struct WrongAtLast {
+  const VeskCorvelProtocolPayload& record;
+  void encode(plist::Encoder& encoder) const {
+    record.encode(encoder);
+    encoder.builder().string(VeskCorvelProtocolPayload::CodingKeys::of<
+                             &VeskCorvelProtocolPayload::allowGDR>()
+                                 .stringValue());
+    encoder.builder().string("wrong");
+  }
+};
+
 constexpr std::string_view nameOf(plist::Form form) {
   return form == plist::Form::binary ? "binary" : "xml";
 }

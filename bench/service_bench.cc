@@ -13,6 +13,7 @@
 #include <string>
 
 #include "ironmoat/client.h"
+#include "ironmoat/errors.h"
 #include "ironmoat/user_payload.h"
 #include "messages.h"
 #include "unpackers/corvel_payload_unpacker.h"
@@ -43,6 +44,20 @@ void roundTrip(benchmark::State& state, const char* program) {
   Client client(options(program));
   const Data message = typicalMessage();
   for (auto _ : state) benchmark::DoNotOptimize(client.unpack<DrelUserPayload>(message).command);
+}
+
+void refused(benchmark::State& state, const char* program) {
+  Client client(options(program));
+  const VeskCorvelProtocolPayload record = typicalPayload(0);
+  const Data message(messageOf(WrongAtLast{record}, plist::Form::binary).view());
+  for (auto _ : state) {
+    try {
+      benchmark::DoNotOptimize(client.unpack<DrelUserPayload>(message).command);
+    } catch (const DecodingError&) {
+      continue;
+    }
+    throw std::logic_error("accepted what is wrong");
+  }
 }
 
 /// Always `kInFlight` requests under way for each thread.
@@ -94,6 +109,7 @@ void startToFirstReply(benchmark::State& state, const char* program) {
 BENCHMARK(inProcess)->UseRealTime();
 BENCHMARK_CAPTURE(roundTrip, echo, ECHO_SERVICE)->UseRealTime();
 BENCHMARK_CAPTURE(roundTrip, service, SERVICE)->UseRealTime();
+BENCHMARK_CAPTURE(refused, service, SERVICE)->Name("roundTrip/refused")->UseRealTime();
 BENCHMARK_CAPTURE(pipelined, echo, ECHO_SERVICE)->UseRealTime();
 BENCHMARK_CAPTURE(pipelined, service, SERVICE)->UseRealTime();
 BENCHMARK_CAPTURE(pipelined, service, SERVICE)->Threads(2)->UseRealTime();

@@ -26,18 +26,6 @@ void add(std::string_view message, std::string_view what, Function once, std::si
   });
 }
 
-/// The record with a last field of the wrong kind: all the work is done by then.
-struct WrongAtLast {
-  const VeskCorvelProtocolPayload& record;
-  void encode(plist::Encoder& encoder) const {
-    record.encode(encoder);
-    encoder.builder().string(VeskCorvelProtocolPayload::CodingKeys::of<
-                             &VeskCorvelProtocolPayload::allowGDR>()
-                                 .stringValue());
-    encoder.builder().string("wrong");
-  }
-};
-
 bool isRefused(const Data& message) {
   try {
     return VeskCorvelPayloadUnpacker().unpack(message).command == 0;

@@ -84,6 +84,7 @@ class ClientTest : public testing::Test {
   static void SetUpTestSuite() {
     std::thread([] {}).join();
   }
+  static void TearDownTestSuite() { std::filesystem::remove_all(ownFolder()); }
   ~ClientTest() override {
     EXPECT_EQ(entries("/proc/self/fd"), descriptors_);
     EXPECT_EQ(entries("/proc/self/task"), threads_);

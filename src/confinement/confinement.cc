@@ -21,19 +21,19 @@ namespace ironmoat::confinement {
 using frames::Confinement;
 
 namespace {
+
 constexpr std::size_t kStack = std::size_t{8} << 20;  // of a thread
-}
 
 // The worst messages known (64 MiB of records, 64 MiB of data and 16 MiB of what is skipped) take
 // the process to 256 MiB, with its 64 MiB of stacks; so four of them fit at once, more take turns,
 // and a message that is tried alone has room for all that its limits allow, in buffers that double
 // as they grow, beside seven that wait.
-static_assert(2 * (limits::messageBytes + limits::recordBytes + limits::deliveredBytes +
-                   limits::replyBytes) +
-                  7 * 2 * limits::messageBytes + 8 * kStack + (std::size_t{64} << 20) <=
-              kAddressSpace);
-
-namespace {
+constexpr std::size_t kOneMessage =
+    2 * (limits::messageBytes + limits::recordBytes + limits::deliveredBytes + limits::replyBytes);
+constexpr std::size_t kThreads = 8;
+constexpr std::size_t kWaiting = (kThreads - 1) * 2 * limits::messageBytes;
+constexpr std::size_t kRest = std::size_t{64} << 20;  // programs, free memory in pieces
+static_assert(kOneMessage + kWaiting + kThreads * kStack + kRest <= kAddressSpace);
 
 // Linux 6.3; <sys/prctl.h> may be older.
 constexpr int kSetDenyWriteExecute = 65;

@@ -30,19 +30,19 @@ void IronmoatServer::add(std::string_view outputType, Handler handler) {
   registrations_.push_back({outputType, std::move(handler)});
 }
 
-void IronmoatServer::answer(const Data& body, BlockBuilder& reply) const {
-  const std::uint64_t id = frames::requestId(body).value_or(0);
+void IronmoatServer::answer(const Data& request, BlockBuilder& reply) const {
+  const std::uint64_t id = frames::requestId(request).value_or(0);
   const std::size_t start = reply.size();
   try {
-    const frames::Request request = frames::parseRequest(body);
+    const frames::Request parsed = frames::parseRequest(request);
     const auto found = std::find_if(
         registrations_.begin(), registrations_.end(),
-        [&](const Registration& known) { return known.outputType == request.outputType; });
+        [&](const Registration& known) { return known.outputType == parsed.outputType; });
     if (found == registrations_.end()) {
       return frames::appendSentence(reply, id, Status::notServed, "no unpacker for this type");
     }
     const std::size_t frame = frames::beginReply(reply, id, Status::record);
-    found->handler(request.message, reply);
+    found->handler(parsed.message, reply);
     return frames::endReply(reply, frame);
   } catch (const std::bad_alloc&) {
     reply.truncate(start);
@@ -59,12 +59,12 @@ void IronmoatServer::answer(const Data& body, BlockBuilder& reply) const {
   }
 }
 
-void IronmoatServer::serve(const Data& body, BlockBuilder& reply) const {
+void IronmoatServer::serve(const Data& request, BlockBuilder& reply) const {
   try {
-    answer(body, reply);
+    answer(request, reply);
   } catch (const std::bad_alloc&) {
     frames::appendRefusal(
-        reply, frames::requestId(body).value_or(0),
+        reply, frames::requestId(request).value_or(0),
         {DecodingError::Kind::limitExceeded, "", "the message takes more memory than there is"});
   }
 }
@@ -85,8 +85,8 @@ std::uint32_t confineOrExit() {
 
 void IronmoatServer::run() {
   // A peer that stops reading is an end, not a crash; so is output that is a file.
-  std::signal(SIGPIPE, SIG_IGN);
-  std::signal(SIGXFSZ, SIG_IGN);
+  static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
+  static_cast<void>(std::signal(SIGXFSZ, SIG_IGN));
   confinement::prepareMemory();
   host::ReplySink sink(STDOUT_FILENO);
   host::RequestSource source(STDIN_FILENO);

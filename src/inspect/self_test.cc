@@ -73,8 +73,8 @@ constexpr ForbiddenAct kForbiddenActs[] = {
      }},
     {"make code writable", kKilled,
      [] {
-       auto* const code = reinterpret_cast<char*>(reinterpret_cast<std::uintptr_t>(&::getpid));
-       auto* const page = code - reinterpret_cast<std::uintptr_t>(code) % 4096;
+       auto* const code = reinterpret_cast<char*>(&::getpid);
+       char* const page = code - reinterpret_cast<std::uintptr_t>(code) % 4096;
        return long{::mprotect(page, 4096, PROT_READ | PROT_WRITE)};
      }},
     {"raise a limit", kKilled,

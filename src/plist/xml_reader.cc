@@ -84,6 +84,8 @@ class XmlReader {
 };
 
 void XmlReader::beginRoot() {
+  constexpr std::string_view kUsual = "<plist version=\"1.0\">";
+  if (in_.rest().starts_with(kUsual)) return in_.advance(kUsual.size());
   if (!in_.take("<plist")) in_.refuse("no plist element");
   if (in_.skipSpace() && in_.take("version")) {
     in_.takeAttributeValue();

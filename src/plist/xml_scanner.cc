@@ -62,6 +62,10 @@ void XmlScanner::skipProlog() {
 }
 
 void XmlScanner::declaration() {
+  // As nearly every writer puts it, in one step (a tenth of the time that the smallest message
+  // takes).
+  constexpr std::string_view kUsual = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>";
+  if (!source_.isUtf16() && rest().starts_with(kUsual)) return advance(kUsual.size());
   if (!looksAt("<?xml") || (rest().size() > 5 && !isXmlSpace(at_[5]))) return;
   advance(5);
   requireSpace();

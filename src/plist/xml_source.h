@@ -15,6 +15,8 @@ class XmlSource {
   /// Throws DecodingError for bytes that are no such text. Keeps a reference to `message`.
   explicit XmlSource(const Data& message);
 
+  /// The message is UTF-16; its text here is UTF-8 all the same.
+  [[nodiscard]] bool isUtf16() const noexcept { return utf16_; }
   /// Without the byte-order mark.
   [[nodiscard]] std::string_view text() const noexcept { return text_; }
   /// Where the text lies; none when the message is empty.
