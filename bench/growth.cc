@@ -58,11 +58,12 @@ void report(std::string_view kind, std::string_view name, plist::Form form, cons
   restartPeak();
   measured(message);
   const HeapCount after = heapCount();
-  std::printf("{\"kind\": \"%.*s\", \"name\": \"%.*s\", \"form\": \"%s\", \"bytes\": %zu, "
-              "\"allocations\": %zu, \"peak\": %zu",
-              static_cast<int>(kind.size()), kind.data(), static_cast<int>(name.size()),
-              name.data(), nameOf(form).data(), message.size(),
-              after.allocations - before.allocations, after.peak - before.bytes);
+  std::printf(
+      "{\"kind\": \"%.*s\", \"name\": \"%.*s\", \"form\": \"%s\", \"bytes\": %zu, "
+      "\"allocations\": %zu, \"peak\": %zu",
+      static_cast<int>(kind.size()), kind.data(), static_cast<int>(name.size()), name.data(),
+      nameOf(form).data(), message.size(), after.allocations - before.allocations,
+      after.peak - before.bytes);
   if (timed) std::printf(", \"nanoseconds\": %.0f", leastTime(message));
   std::printf("}\n");
 }

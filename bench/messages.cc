@@ -38,7 +38,8 @@ VeskCorvelProtocolPayload unicodePayload() {
   record.senderId = String("отправитель：佐藤さくら@例え.テスト");
   record.destinationId = String("получатель：יעל כהן@דוגמה.בדיקה");
   record.encryptionType = String("пара-公開鍵");
-  record.payload = Data(std::string_view("Привет! 今日はとても良い天気ですね。 שלום עולם 😀 Καλημέρα"));
+  record.payload =
+      Data(std::string_view("Привет! 今日はとても良い天気ですね。 שלום עולם 😀 Καλημέρα"));
   return record;
 }
 
@@ -47,7 +48,8 @@ class Filler {
  public:
   template <class R>
   void fill(R& record) {
-    using Fields = typename std::remove_const_t<decltype(records::Table<R>::rows)>::template Fields<R>;
+    using Fields =
+        typename std::remove_const_t<decltype(records::Table<R>::rows)>::template Fields<R>;
     Fields::forEach([&](auto field) { value(field.in(record)); });
   }
 
@@ -88,8 +90,8 @@ std::vector<Sample> makeSamples() {
   fanout.dstIdTokenList = std::move(nested);
   VeskCorvelProtocolPayload blob = typicalPayload(0);
   blob.payload = data(std::size_t{1} << 20, 0);
-  return {{"min", min},       {"typical", typicalPayload(0)}, {"full", full},
-          {"fanout", fanout}, {"blob", blob},                 {"unicode", unicodePayload()}};
+  return {{"min", min},   {"typical", typicalPayload(0)}, {"full", full}, {"fanout", fanout},
+          {"blob", blob}, {"unicode", unicodePayload()}};
 }
 
 }  // namespace

@@ -38,9 +38,9 @@ struct WrongAtLast {
   const VeskCorvelProtocolPayload& record;
   void encode(plist::Encoder& encoder) const {
     record.encode(encoder);
-    encoder.builder().string(VeskCorvelProtocolPayload::CodingKeys::of<
-                             &VeskCorvelProtocolPayload::allowGDR>()
-                                 .stringValue());
+    encoder.builder().string(
+        VeskCorvelProtocolPayload::CodingKeys::of<&VeskCorvelProtocolPayload::allowGDR>()
+            .stringValue());
     encoder.builder().string("wrong");
   }
 };

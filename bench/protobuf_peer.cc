@@ -24,7 +24,8 @@ class Copier {
  public:
   template <class R>
   static void copy(const R& record, Message& into) {
-    using Fields = typename std::remove_const_t<decltype(records::Table<R>::rows)>::template Fields<R>;
+    using Fields =
+        typename std::remove_const_t<decltype(records::Table<R>::rows)>::template Fields<R>;
     int place = 0;
     Fields::forEach([&](auto field) {
       const FieldDescriptor* to = into.GetDescriptor()->FindFieldByNumber(++place);

@@ -29,9 +29,7 @@ Client::Options options(const char* program) {
   return options;
 }
 
-Data typicalMessage() {
-  return Data(messageOf(typicalPayload(0), plist::Form::binary).view());
-}
+Data typicalMessage() { return Data(messageOf(typicalPayload(0), plist::Form::binary).view()); }
 
 void inProcess(benchmark::State& state) {
   const Data message = messageOf(typicalPayload(0), plist::Form::binary);

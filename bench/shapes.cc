@@ -156,15 +156,17 @@ const std::vector<Shape>& shapes() {
       {"many keys", 8, [](auto form, auto count) { return manyEntries(form, count, knownKey); }},
       {"unknown keys", 26,
        [](auto form, auto count) {
-         return manyEntries(form, count, [](auto i) { return std::string("unknown").append(std::to_string(i)); });
+         return manyEntries(
+             form, count, [](auto i) { return std::string("unknown").append(std::to_string(i)); });
        }},
       {"text", 260, [](auto form, auto count) { return messageOf(texts(count, prose), form); }},
       {"UTF-16", 500, utf16},
       {"entities", 500,
        [](auto form, auto count) -> std::optional<Data> {
          if (form == plist::Form::binary) return std::nullopt;
-         return messageOf(texts(count, [](auto i) { return std::string(100, '&').append(std::to_string(i)); }),
-                          form);
+         return messageOf(
+             texts(count, [](auto i) { return std::string(100, '&').append(std::to_string(i)); }),
+             form);
        }},
       {"shared", 165, shared},
       {"tiny records", 20, tiny},

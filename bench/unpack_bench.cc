@@ -38,16 +38,20 @@ void addForm(const Sample& sample, plist::Form form) {
   const Data message = messageOf(sample.record, form);
   const std::string prefix = std::string(nameOf(form)) + "/";
   const std::size_t size = message.size();
-  add(sample.name, prefix + "unpack",
+  add(
+      sample.name, prefix + "unpack",
       [message] { return VeskCorvelPayloadUnpacker().unpack(message).command; }, size);
-  add(sample.name, prefix + "copy_and_unpack",
+  add(
+      sample.name, prefix + "copy_and_unpack",
       [bytes = std::string(message.view())] {
         return VeskCorvelPayloadUnpacker().unpack(inOneThreadBlock(bytes)).command;
       },
       size);
   const Data wrong = messageOf(WrongAtLast{sample.record}, form);
-  add(sample.name, prefix + "refused", [wrong] { return isRefused(wrong); }, wrong.size());
-  add(sample.name, prefix + "memcpy",
+  add(
+      sample.name, prefix + "refused", [wrong] { return isRefused(wrong); }, wrong.size());
+  add(
+      sample.name, prefix + "memcpy",
       [bytes = std::string(message.view()), to = std::vector<char>(size)]() mutable {
         std::memcpy(to.data(), bytes.data(), bytes.size());
         benchmark::ClobberMemory();
@@ -56,17 +60,22 @@ void addForm(const Sample& sample, plist::Form form) {
       size);
   if (form != plist::Form::xml) return;
   const std::string text(message.view());
-  add(sample.name, "expat", [text] { return expatEvents(text); }, size);
-  add(sample.name, "pugixml", [text] { return pugixmlDom(text); }, size);
+  add(
+      sample.name, "expat", [text] { return expatEvents(text); }, size);
+  add(
+      sample.name, "pugixml", [text] { return pugixmlDom(text); }, size);
 }
 
 void addSample(const Sample& sample) {
   addForm(sample, plist::Form::binary);
   addForm(sample, plist::Form::xml);
   const std::string bytes = protobufOf(sample.record);
-  add(sample.name, "protobuf", [bytes] { return parseProtobuf(bytes); }, bytes.size());
-  add(sample.name, "protobuf_arena", [bytes] { return parseProtobufInArena(bytes); }, bytes.size());
-  add(sample.name, "protobuf_warm_arena", [bytes] { return parseProtobufInWarmArena(bytes); },
+  add(
+      sample.name, "protobuf", [bytes] { return parseProtobuf(bytes); }, bytes.size());
+  add(
+      sample.name, "protobuf_arena", [bytes] { return parseProtobufInArena(bytes); }, bytes.size());
+  add(
+      sample.name, "protobuf_warm_arena", [bytes] { return parseProtobufInWarmArena(bytes); },
       bytes.size());
 }
 

@@ -12,7 +12,8 @@ std::size_t expatEvents(std::string_view xml) {
   std::size_t events = 0;
   XML_SetUserData(parser, &events);
   XML_SetElementHandler(
-      parser, [](void* count, const XML_Char*, const XML_Char**) { ++*static_cast<std::size_t*>(count); },
+      parser,
+      [](void* count, const XML_Char*, const XML_Char**) { ++*static_cast<std::size_t*>(count); },
       [](void* count, const XML_Char*) { ++*static_cast<std::size_t*>(count); });
   XML_SetCharacterDataHandler(parser, [](void* count, const XML_Char*, int length) {
     *static_cast<std::size_t*>(count) += static_cast<std::size_t>(length != 0);

@@ -12,6 +12,8 @@ add_library(ironmoat_headers INTERFACE)
 target_include_directories(ironmoat_headers INTERFACE
   $<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}/include> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)
 
+target_compile_features(ironmoat_headers INTERFACE cxx_std_20)
+
 # Makes src/<room> includable as "<room>/..." by whoever links `target`.
 function(ironmoat_expose_room target scope room)
   file(MAKE_DIRECTORY ${IRONMOAT_ROOMS_DIR}/${room})

@@ -97,15 +97,14 @@ class String {
   String() noexcept = default;
   /// Copies the text. Throws std::invalid_argument when it is not valid UTF-8.
   String(std::string_view text);  // NOLINT(google-explicit-constructor)
-  String(const char* text)
-      : String(std::string_view(text)) {}  // NOLINT(google-explicit-constructor)
+  // NOLINTNEXTLINE(google-explicit-constructor)
+  String(const char* text) : String(std::string_view(text)) {}
   /// Internal: the caller has checked that the slice is valid UTF-8.
   explicit String(detail::Slice validText) noexcept : slice_(std::move(validText)) {}
 
   [[nodiscard]] std::string_view view() const noexcept { return slice_.view(); }
-  operator std::string_view() const noexcept {
-    return view();
-  }  // NOLINT(google-explicit-constructor)
+  // NOLINTNEXTLINE(google-explicit-constructor)
+  operator std::string_view() const noexcept { return view(); }
   /// Bytes of UTF-8, not characters.
   [[nodiscard]] std::size_t size() const noexcept { return slice_.length(); }
   [[nodiscard]] bool empty() const noexcept { return size() == 0; }

@@ -1,7 +1,7 @@
 #pragma once
 
 #include <pthread.h>
-#include <signal.h>
+#include <csignal>
 
 #include <thread>
 #include <utility>

@@ -7,7 +7,6 @@
 #include <sys/syscall.h>
 #include <sys/wait.h>
 
-#include <bit>
 #include <cerrno>
 #include <csignal>
 #include <cstdint>
@@ -76,10 +75,8 @@ int pidfdOfChild(pid_t pid) noexcept {
 
 std::string exitWord(int status) {
   std::string word = "exited with status " + std::to_string(status);
-  // A service that cannot be confined says so by 64 + the number of the bit.
-  for (const auto& [part, name] : frames::kConfinementNames) {
-    if (status != 64 + std::countr_zero(static_cast<std::uint32_t>(part))) continue;
-    word += " (this part of its confinement cannot be had: " + std::string(name) + ")";
+  if (const auto* const lack = frames::lackToldBy(status)) {
+    word += " (this part of its confinement cannot be had: " + std::string(lack->name) + ")";
   }
   return word;
 }

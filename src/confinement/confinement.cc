@@ -24,16 +24,15 @@ namespace {
 
 constexpr std::size_t kStack = std::size_t{8} << 20;  // of a thread
 
-// The worst messages known (64 MiB of records, 64 MiB of data and 16 MiB of what is skipped) take
-// the process to 256 MiB, with its 64 MiB of stacks; so four of them fit at once, more take turns,
-// and a message that is tried alone has room for all that its limits allow, in buffers that double
-// as they grow, beside seven that wait.
+// Measured with two threads, the worst messages known (64 MiB of records, 64 MiB of data, the rest
+// of 16 MiB to be skipped) take the process to 256 MiB, two at once to 520; so about four fit, and
+// more take turns. A message that is tried alone has room for all that its limits allow, in buffers
+// that double as they grow, beside those that wait.
 constexpr std::size_t kOneMessage =
     2 * (limits::messageBytes + limits::recordBytes + limits::deliveredBytes + limits::replyBytes);
-constexpr std::size_t kThreads = 8;
-constexpr std::size_t kWaiting = (kThreads - 1) * 2 * limits::messageBytes;
+constexpr std::size_t kWaiting = (std::size_t{kMostThreads} - 1) * 2 * limits::messageBytes;
 constexpr std::size_t kRest = std::size_t{64} << 20;  // programs, free memory in pieces
-static_assert(kOneMessage + kWaiting + kThreads * kStack + kRest <= kAddressSpace);
+static_assert(kOneMessage + kWaiting + kMostThreads * kStack + kRest <= kAddressSpace);
 
 // Linux 6.3; <sys/prctl.h> may be older.
 constexpr int kSetDenyWriteExecute = 65;

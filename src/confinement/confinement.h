@@ -12,6 +12,8 @@ namespace ironmoat::confinement {
 
 /// Bytes of address space for the whole process, whatever number of messages it is working on.
 inline constexpr std::size_t kAddressSpace = std::size_t{1} << 30;
+/// Threads at work on messages that this is reckoned for.
+inline constexpr unsigned kMostThreads = 8;
 
 /// A part of the confinement that cannot be had here; `code()` says why.
 class CannotConfine : public std::system_error {

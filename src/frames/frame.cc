@@ -11,7 +11,7 @@ namespace ironmoat::frames {
 namespace {
 
 constexpr std::string_view kMagic = "IRONMOAT";
-constexpr std::size_t kHelloBody = kMagic.size() + 2 + 4 + 4 * 8 + 4;
+constexpr std::size_t kHelloBody = kMagic.size() + 2 + 4 + 8 + 8 + 8 + 8 + 4;
 constexpr std::size_t kMaxName = 255;
 constexpr std::size_t kReplyHead = 8 + 1;
 constexpr std::size_t kRefusalHead = 1 + 8 + 2;

@@ -136,18 +136,20 @@ void IronmoatServer::run() {
   // This thread serves nothing: its stack would have to grow, which is fatal at the limit of the
   // address space. Those of the others are there already.
   constexpr unsigned kFewest = 2;
-  constexpr unsigned kMost = 8;
-  const unsigned threads = std::clamp(std::thread::hardware_concurrency(), kFewest, kMost);
+  const unsigned threads =
+      std::clamp(std::thread::hardware_concurrency(), kFewest, confinement::kMostThreads);
   std::latch started(threads);
   std::latch confined(1);
   std::vector<std::jthread> workers;
-  for (unsigned i = 0; i < threads; ++i) {
+  // Without its threads there is no service, and unwinding would wait for those that wait for us.
+  const auto start = [&]() noexcept {
     workers.emplace_back([&] {
       started.count_down();
       confined.wait();
       serveAll();
     });
-  }
+  };
+  for (unsigned i = 0; i < threads; ++i) start();
   started.wait();
 
   frames::Hello hello = frames::Hello::ours();

@@ -36,11 +36,14 @@ struct records::Table<Example> {
   static constexpr KeyTable rows{
       row<&R::command>("c"),
 #ifdef CASE_swapped_rows
-      row<&R::second>("b"), row<&R::first>("a"),
+      row<&R::second>("b"),
+      row<&R::first>("a"),
 #elif defined(CASE_duplicate_key)
-      row<&R::first>("a"),  row<&R::second>("a"),
+      row<&R::first>("a"),
+      row<&R::second>("a"),
 #else
-      row<&R::first>("a"),  row<&R::second>("b"),
+      row<&R::first>("a"),
+      row<&R::second>("b"),
 #endif
 #ifdef CASE_surplus_row
       row<&R::second>("d"),

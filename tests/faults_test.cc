@@ -1,0 +1,201 @@
+// A client and a confined service through everything that can happen to the service. By default in
+// seconds; `faults_test --full` takes the sizes and prints the figures of doc/faults.md.
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/prctl.h>
+
+#include <cerrno>
+#include <iterator>
+#include <map>
+#include <random>
+#include <string_view>
+
+#include "support/fault_load.h"
+
+namespace ironmoat::testing {
+namespace {
+
+/// Each test leaves descriptors, threads and children as they were.
+class FaultsTest : public ::testing::Test {
+ public:
+  static void SetUpTestSuite() {
+    std::thread([] {}).join();  // sanitizers start a thread of their own with the first
+  }
+  ~FaultsTest() override {
+    EXPECT_EQ(entries("/proc/self/fd"), descriptors_);
+    EXPECT_EQ(entries("/proc/self/task"), threads_);
+    EXPECT_EQ(::waitpid(-1, nullptr, WNOHANG), -1) << "a child was left";
+  }
+
+ private:
+  static auto entries(const char* folder) {
+    const auto all = std::filesystem::directory_iterator(folder);
+    return std::distance(begin(all), end(all));
+  }
+
+  std::ptrdiff_t descriptors_ = entries("/proc/self/fd");
+  std::ptrdiff_t threads_ = entries("/proc/self/task");
+};
+
+Clock::duration timeOfFirstReply() {
+  Client client(optionsFor(SERVICE));
+  const auto start = Clock::now();
+  EXPECT_EQ(client.unpack<VeskCommandResponse>(message(1)).command, 1);
+  return Clock::now() - start;
+}
+
+TEST_F(FaultsTest, KilledAtRandomTimesUnderLoad) {
+  const auto spell = 4 * timeOfFirstReply();
+  Client client(optionsFor(SERVICE));
+  Load load(client, 4);
+  Killer kill;
+  std::mt19937 random(1);
+  const int most = sized(200, 10'000);
+  for (int kills = 0; kills < most;) {
+    std::this_thread::sleep_for(spell * (random() % 1000) / 1000);
+    if (kill()) ++kills;
+  }
+  const Tally& tally = load.stop();
+  std::printf("%d kills: %d right, %d crashed, %d unavailable, %d wrong\n", most,
+              tally.right.load(), tally.crashed.load(), tally.unavailable.load(),
+              tally.wrong.load());
+  EXPECT_EQ(tally.wrong, 0);
+  EXPECT_GT(tally.right, most);
+  EXPECT_LE(tally.crashed, most) << "at most one for each death";
+}
+
+/// From the kill to the reply to the first request that was submitted after it.
+TEST_F(FaultsTest, ComesBackAtOnce) {
+  for (const bool underLoad : {false, true}) {
+    Client client(optionsFor(SERVICE));
+    Load load(client, underLoad ? 4 : 0);
+    Killer kill;
+    Times times;
+    for (int i = 0; i < sized(20, 1000); ++i) {
+      EXPECT_EQ(client.unpack<VeskCommandResponse>(message(2)).command, 2);
+      std::this_thread::sleep_for(1ms);
+      if (!kill()) continue;
+      times.measure([&] { EXPECT_EQ(client.unpack<VeskCommandResponse>(message(3)).command, 3); });
+    }
+    EXPECT_EQ(load.stop().wrong, 0);
+    times.print(underLoad ? "kill to next reply, four busy threads" : "kill to next reply, idle");
+  }
+}
+
+TEST_F(FaultsTest, ClientsGoWithRequestsInFlight) {
+  std::mt19937 random(1);
+  Tally tally;
+  Times times;
+  for (int round = 0; round < sized(50, 1000); ++round) {
+    std::vector<Pending> pending;
+    auto client = std::make_unique<Client>(optionsFor(SERVICE));
+    for (int i = 0; i < 300; ++i) {
+      pending.push_back(client->submit<VeskCommandResponse>(message(i)));
+    }
+    std::this_thread::sleep_for(std::chrono::microseconds(random() % 6000));
+    if (round % 3 == 0) Killer()();
+    times.measure([&] { client.reset(); });
+    for (int i = 0; i < 300; ++i) {
+      EXPECT_EQ(pending[i].wait_for(0s), std::future_status::ready);
+      tally.count(i, pending[i]);
+    }
+  }
+  times.print("destruction with up to 300 in flight");
+  EXPECT_EQ(tally.wrong, 0);
+  EXPECT_GT(tally.right, 0);
+  EXPECT_GT(tally.unavailable, 0);
+}
+
+TEST_F(FaultsTest, OtherThreadsForkChildrenThatLiveOn) {
+  std::vector<pid_t> children;
+  {
+    Client client(optionsFor(SERVICE));
+    Load load(client, 8);
+    Killer kill;
+    for (int i = 0; i < sized(50, 500); ++i) {
+      std::this_thread::sleep_for(3ms);
+      if (i % 3 == 0) kill();
+      const pid_t child = ::fork();
+      ASSERT_GE(child, 0);
+      if (child == 0) {  // with copies of whatever descriptors there were
+        ::prctl(PR_SET_PDEATHSIG, SIGKILL);
+        for (;;) ::pause();
+      }
+      children.push_back(child);
+    }
+    EXPECT_EQ(load.stop().wrong, 0);
+  }
+  for (const pid_t child : children) {
+    EXPECT_EQ(::waitpid(child, nullptr, WNOHANG), 0) << "lives";
+    ::kill(child, SIGKILL);
+    EXPECT_EQ(::waitpid(child, nullptr, 0), child);
+  }
+}
+
+/// For the test server: what to do, and what is to come of it.
+struct Poison {
+  std::string verb;
+  std::string outcome;
+};
+
+std::string outcomeOf(Pending& pending) {
+  try {
+    const VeskCommandResponse record = pending.get();
+    return std::string(record.token ? record.token->view() : "no token");
+  } catch (const ServiceError& error) {
+    return std::string(nameOf(error.kind())) + ": " + error.what();
+  } catch (const DecodingError& error) {
+    return std::string(nameOf(error.kind()));
+  }
+}
+
+TEST_F(FaultsTest, PoisonFailsAloneAmongAThousand) {
+  constexpr auto kDeadline = frames::kSanitizedBuild ? 2000ms : 500ms;
+  const Poison crash = {"crash", "crashed: the service was killed by SIGABRT over this message"};
+  const Poison stall = {"stall", "timedOut: no reply within " + std::to_string(kDeadline.count())};
+  const Poison forbidden = {
+      "forbidden", "crashed: the service was killed by SIGSYS (a system call that its confinement"};
+  const Poison large = {"hold 2000", "limitExceeded"};  // fails too, but harms nobody
+  const std::vector<Poison> rounds[] = {
+      {crash, crash, stall}, {stall, crash, stall}, {crash, forbidden, forbidden, large}};
+  Client client(optionsFor(TEST_SERVER, kDeadline));
+  std::mt19937 random(1);
+  constexpr int kRequests = 1000;
+  int failed = 0;
+  const int count = sized(3, 100);
+  for (int round = 0; round < count; ++round) {
+    const auto& poisons = rounds[round % (frames::kSanitizedBuild ? 2 : 3)];
+    std::map<int, Poison> at;
+    for (const Poison& poison : poisons) {
+      while (!at.try_emplace(static_cast<int>(random() % kRequests), poison).second) {
+      }
+    }
+    std::vector<Pending> all;
+    for (int i = 0; i < kRequests; ++i) {
+      const auto poison = at.find(i);
+      const std::string text =
+          poison != at.end() ? poison->second.verb : "tell " + std::to_string(i);
+      all.push_back(client.submit<VeskCommandResponse>(Data(text)));
+    }
+    for (int i = 0; i < kRequests; ++i) {
+      const auto poison = at.find(i);
+      const std::string expected =
+          poison != at.end() ? poison->second.outcome : "tell " + std::to_string(i);
+      const std::string outcome = outcomeOf(all[i]);
+      EXPECT_EQ(poison != at.end() ? outcome.substr(0, expected.size()) : outcome, expected) << i;
+      if (outcome.find(": ") != std::string::npos) ++failed;
+    }
+  }
+  std::printf("%d times a thousand with three poisoned: %d failed\n", count, failed);
+  EXPECT_EQ(failed, 3 * count);
+}
+
+}  // namespace
+}  // namespace ironmoat::testing
+
+int main(int count, char** arguments) {
+  ::testing::InitGoogleTest(&count, arguments);
+  ironmoat::testing::fullSize = count > 1 && std::string_view(arguments[1]) == "--full";
+  return RUN_ALL_TESTS();
+}
