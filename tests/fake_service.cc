@@ -128,6 +128,18 @@ void serve(const frames::Request& request) {
     const std::size_t start = frames::beginReply(out, id, frames::Status::record);
     out.append("\xff\xff\xff\xff\xff\xff\xff\xff");
     frames::endReply(out, start);
+  } else if (verb == "badStatus") {
+    frames::endReply(out, frames::beginReply(out, id, static_cast<frames::Status>(4)));
+  } else if (verb == "badText") {
+    const std::size_t start = frames::beginReply(out, id, frames::Status::notServed);
+    out.append("\xff");
+    frames::endReply(out, start);
+  } else if (verb == "greetAgain") {
+    frames::appendHello(out, frames::Hello::ours());
+  } else if (verb == "flood") {  // the longest reply that may be announced, and no end after it
+    const std::string plenty(std::size_t{1} << 20, '\xaa');
+    write(std::string_view("\x09\0\0\x09", 4));
+    for (;;) write(plenty);
   } else if (verb == "drip") {  // a reply of megabytes, a byte at a time
     write(std::string_view("\0\0\x40\0", 4));
     for (;;) {

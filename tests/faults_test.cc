@@ -2,11 +2,9 @@
 // seconds; `faults_test --full` takes the sizes and prints the figures of doc/faults.md.
 
 #include <fcntl.h>
-#include <gtest/gtest.h>
 #include <sys/prctl.h>
 
 #include <cerrno>
-#include <iterator>
 #include <map>
 #include <random>
 #include <string_view>
@@ -15,28 +13,6 @@
 
 namespace ironmoat::testing {
 namespace {
-
-/// Each test leaves descriptors, threads and children as they were.
-class FaultsTest : public ::testing::Test {
- public:
-  static void SetUpTestSuite() {
-    std::thread([] {}).join();  // sanitizers start a thread of their own with the first
-  }
-  ~FaultsTest() override {
-    EXPECT_EQ(entries("/proc/self/fd"), descriptors_);
-    EXPECT_EQ(entries("/proc/self/task"), threads_);
-    EXPECT_EQ(::waitpid(-1, nullptr, WNOHANG), -1) << "a child was left";
-  }
-
- private:
-  static auto entries(const char* folder) {
-    const auto all = std::filesystem::directory_iterator(folder);
-    return std::distance(begin(all), end(all));
-  }
-
-  std::ptrdiff_t descriptors_ = entries("/proc/self/fd");
-  std::ptrdiff_t threads_ = entries("/proc/self/task");
-};
 
 Clock::duration timeOfFirstReply() {
   Client client(optionsFor(SERVICE));

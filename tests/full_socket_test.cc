@@ -1,6 +1,5 @@
 // Both directions of the connection full, and times through it. Part of faults_test.
 
-#include <gtest/gtest.h>
 #include <poll.h>
 #include <sys/socket.h>
 
@@ -20,7 +19,7 @@ constexpr int kRequests = 64;
 /// What the test server answers with itself as the token and `number` as the command.
 std::string large(int number) {
   std::string text = "tell " + std::to_string(number) + ' ';
-  text.resize(static_cast<std::size_t>(sized(1, 16)) << 20, 'x');
+  text.resize(static_cast<std::size_t>(sized(2, 16)) << 20, 'x');
   return text;
 }
 void expectEcho(const VeskCommandResponse& record, int number) {
@@ -38,7 +37,7 @@ std::size_t peakMemory(pid_t pid) {
 }
 constexpr std::size_t kMostMemory = frames::kSanitizedBuild ? 4096 : 256;  // MiB
 
-TEST(FullSocketTest, AClientWhoseReadersAreSlow) {
+TEST_F(FaultsTest, BothDirectionsFullAndSlowReaders) {
   Client::Options options = optionsFor(TEST_SERVER, 60s);
   options.maxBytesInFlight = kRequests * (large(0).size() + 512);
   Client client(options);
@@ -59,7 +58,7 @@ TEST(FullSocketTest, AClientWhoseReadersAreSlow) {
 
 /// Writes first, until nothing more is taken; then reads a little at a time. The server neither
 /// grows nor gives up.
-TEST(FullSocketTest, APeerThatWritesAndHardlyReads) {
+TEST_F(FaultsTest, APeerThatHardlyReads) {
   const auto server = client::ServiceProcess::start(TEST_SERVER);
   const pid_t pid = [] {
     std::ifstream children("/proc/self/task/" + std::to_string(::getpid()) + "/children");
@@ -117,7 +116,7 @@ TEST(FullSocketTest, APeerThatWritesAndHardlyReads) {
 }
 
 /// The test server's unpacker is a bare echo, behind the same client, frames, host and confinement.
-TEST(TimesTest, RoundTripsAndFirstReplies) {
+TEST_F(FaultsTest, RoundTripsAndFirstReplies) {
   const struct {
     const char* name;
     const char* program;

@@ -148,6 +148,10 @@ TEST_F(ClientTest, TheCulpritFailsAndItsNeighboursDoNot) {
       {"nextId", "sent a broken frame: a reply to no request over this message"},
       {"absurdLength", "sent a broken frame: "},
       {"badRecord", "sent a broken record: "},
+      {"badStatus", "sent a broken frame: "},
+      {"badText", "sent a broken frame: "},
+      {"greetAgain", "sent a broken frame: "},
+      {"flood", "sent a broken frame: the reply has an unknown status over this message"},
   };
   for (const auto& row : rows) {
     Client client(fake());

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -12,6 +13,7 @@
 #include <filesystem>
 #include <fstream>
 #include <future>
+#include <iterator>
 #include <mutex>
 #include <string>
 #include <thread>
@@ -29,11 +31,33 @@ using namespace std::chrono_literals;
 using Clock = std::chrono::steady_clock;
 using Pending = std::future<VeskCommandResponse>;
 
-/// `--full` was given: sizes by hand instead of seconds in CI.
+/// `--full` was given: minutes by hand instead of seconds in CI.
 inline bool fullSize = false;
 inline int sized(int usual, int full) {
   return fullSize ? full : frames::kSanitizedBuild ? std::max(usual / 5, 2) : usual;
 }
+
+/// Each test leaves descriptors, threads and children as they were.
+class FaultsTest : public ::testing::Test {
+ public:
+  static void SetUpTestSuite() {
+    std::thread([] {}).join();  // sanitizers start a thread of their own with the first
+  }
+  ~FaultsTest() override {
+    EXPECT_EQ(entries("/proc/self/fd"), descriptors_);
+    EXPECT_EQ(entries("/proc/self/task"), threads_);
+    EXPECT_EQ(::waitpid(-1, nullptr, WNOHANG), -1) << "a child was left";
+  }
+
+ private:
+  static std::ptrdiff_t entries(const char* folder) {
+    const auto all = std::filesystem::directory_iterator(folder);
+    return std::distance(begin(all), end(all));
+  }
+
+  std::ptrdiff_t descriptors_ = entries("/proc/self/fd");
+  std::ptrdiff_t threads_ = entries("/proc/self/task");
+};
 
 inline Client::Options optionsFor(const char* program, std::chrono::milliseconds deadline = 20s) {
   Client::Options options;
