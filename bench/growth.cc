@@ -5,7 +5,6 @@
 // Every unpacking to be counted goes through `measured`, once, in the order of the lines: under
 // callgrind with --toggle-collect and --dump-after on it, instructions come out in the same order.
 
-#include <malloc.h>
 #include <time.h>
 
 #include <algorithm>
@@ -13,6 +12,7 @@
 #include <cstdlib>
 #include <string_view>
 
+#include "confinement/confinement.h"
 #include "heap_count.h"
 #include "messages.h"
 #include "shapes.h"
@@ -92,8 +92,7 @@ void run(std::size_t smallest, std::size_t largest, bool timed) {
 
 int main(int argc, char** argv) {
   if (argc < 3) return EXIT_FAILURE;
-  mallopt(M_MMAP_THRESHOLD, 256 << 20);  // as unpack_bench does
-  mallopt(M_TRIM_THRESHOLD, 256 << 20);
+  ironmoat::confinement::prepareMemory();  // as the service does
   const auto number = [](const char* text) { return std::strtoull(text, nullptr, 10); };
   ironmoat::bench::run(number(argv[1]), number(argv[2]),
                        argc > 3 && std::string_view(argv[3]) == "time");

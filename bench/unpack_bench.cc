@@ -2,12 +2,12 @@
 // process and one run: scripts/bench runs it and makes the table.
 
 #include <benchmark/benchmark.h>
-#include <malloc.h>
 
 #include <cstring>
 #include <string>
 #include <vector>
 
+#include "confinement/confinement.h"
 #include "ironmoat/errors.h"
 #include "messages.h"
 #include "protobuf_peer.h"
@@ -83,10 +83,8 @@ void addSample(const Sample& sample) {
 }  // namespace ironmoat::bench
 
 int main(int argc, char** argv) {
-  // For everyone alike what the service sets for itself: large blocks are kept, not given back to
-  // the kernel after each message.
-  mallopt(M_MMAP_THRESHOLD, 256 << 20);
-  mallopt(M_TRIM_THRESHOLD, 256 << 20);
+  // For everyone alike: large blocks are kept, not given back to the kernel after each message.
+  ironmoat::confinement::prepareMemory();
   for (const auto& sample : ironmoat::bench::samples()) ironmoat::bench::addSample(sample);
   benchmark::Initialize(&argc, argv);
   benchmark::RunSpecifiedBenchmarks();

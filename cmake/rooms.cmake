@@ -9,8 +9,7 @@
 set(IRONMOAT_ROOMS_DIR ${CMAKE_BINARY_DIR}/rooms)
 
 add_library(ironmoat_headers INTERFACE)
-target_include_directories(ironmoat_headers INTERFACE
-  $<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}/include> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)
+target_include_directories(ironmoat_headers INTERFACE ${PROJECT_SOURCE_DIR}/include)
 
 target_compile_features(ironmoat_headers INTERFACE cxx_std_20)
 
@@ -34,6 +33,9 @@ endfunction()
 
 # A GoogleTest program, each of whose cases is a CTest test.
 function(ironmoat_test name)
+  if(NOT IRONMOAT_TESTS)
+    return()
+  endif()
   cmake_parse_arguments(TEST "" "" "SOURCES;LINKS;LIBRARIES" ${ARGN})
   add_executable(${name} ${TEST_SOURCES})
   set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/tests)

@@ -31,7 +31,8 @@ class Connection;
 class Client {
  public:
   struct Options {
-    /// The service's executable; empty: where the library was installed with it.
+    /// Path of the service's executable, started with an empty environment; empty: where the
+    /// library was configured to be installed.
     std::string program;
     /// How long the service may work on one message, from 1 ms to a day. A request that is past it
     /// is tried once more, alone, before it fails with `timedOut`; waiting for other requests does
@@ -50,8 +51,9 @@ class Client {
   /// descriptor behind.
   ~Client();
 
-  /// Waits for the record. Throws DecodingError when the message is refused, ServiceError when no
-  /// answer could be had.
+  /// Waits for the record: R is VeskCommandResponse, VeskCommandWebTunnelResponse or
+  /// DrelUserPayload. Throws DecodingError when the message is refused, ServiceError when no answer
+  /// could be had, std::bad_alloc. A missing service is only noticed here.
   template <MessageSchema R>
   R unpack(const Data& message) {
     return start<R>(message, true).get();

@@ -1,7 +1,6 @@
 #pragma once
 
 #include <string_view>
-#include <utility>
 
 #include "ironmoat/output_record.h"
 
@@ -29,22 +28,12 @@ struct VeskCommandResponseArguments {
                 &R::token, &R::internalBuild, &R::loggingProfile, &R::applicationId,
                 &R::requestType, &R::veskSessionId, &R::sharedSession, &R::protocolVersion>;
 };
-/// Throws what the host refuses.
 void admit(const VeskCommandResponseArguments& arguments);
-static_assert(VeskCommandResponseArguments::Fields::check());
 
 /// The response to a command. Its fields are read as `response.command`, `response.token`, ...
-struct VeskCommandResponse : VeskCommandResponseArguments {
-  using Arguments = VeskCommandResponseArguments;
+struct VeskCommandResponse : OutputRecord<VeskCommandResponse, VeskCommandResponseArguments> {
+  using OutputRecord::OutputRecord;
   static constexpr std::string_view schemaName = "VeskCommandResponse";
-
-  [[nodiscard]] static VeskCommandResponse with(Arguments arguments) {
-    return VeskCommandResponse([&] { return Arguments(std::move(arguments)); });
-  }
-  template <MakerOf<Arguments> Make>
-  explicit VeskCommandResponse(Make&& make) : Arguments(make()) {
-    admit(*this);
-  }
 };
 
 }  // namespace ironmoat

@@ -1,8 +1,5 @@
 #pragma once
 
-#include <string_view>
-#include <utility>
-
 #include "ironmoat/output_record.h"
 
 namespace ironmoat {
@@ -22,21 +19,12 @@ struct DrelUserPayloadHttpHeadersArguments {
       FieldList<R, &R::adhocServiceOverride, &R::responseIdentifierString,
                 &R::strictTransportSecurity, &R::traceId, &R::splunkHint, &R::asHttpHeader>;
 };
-/// Throws what the host refuses.
 void admit(const DrelUserPayloadHttpHeadersArguments& arguments);
-static_assert(DrelUserPayloadHttpHeadersArguments::Fields::check());
 
 /// HTTP header values, each opaque text.
-struct DrelUserPayloadHttpHeaders : DrelUserPayloadHttpHeadersArguments {
-  using Arguments = DrelUserPayloadHttpHeadersArguments;
-
-  [[nodiscard]] static DrelUserPayloadHttpHeaders with(Arguments arguments) {
-    return DrelUserPayloadHttpHeaders([&] { return Arguments(std::move(arguments)); });
-  }
-  template <MakerOf<Arguments> Make>
-  explicit DrelUserPayloadHttpHeaders(Make&& make) : Arguments(make()) {
-    admit(*this);
-  }
+struct DrelUserPayloadHttpHeaders
+    : OutputRecord<DrelUserPayloadHttpHeaders, DrelUserPayloadHttpHeadersArguments> {
+  using OutputRecord::OutputRecord;
 };
 
 }  // namespace ironmoat

@@ -19,10 +19,4 @@ concept MessageSchema = requires(typename R::Arguments arguments) {
 }
 &&std::is_base_of_v<typename R::Arguments, R>;
 
-/// The label of an initialiser's argument: the first is labelled `with`, every other one has its
-/// field's name.
-constexpr std::string_view argumentLabel(std::size_t position, std::string_view fieldName) {
-  return position == 0 ? "with" : fieldName;
-}
-
 }  // namespace ironmoat

@@ -43,7 +43,8 @@ class OptionalStorage<T, true> {
 }  // namespace detail
 
 /// A value or its absence. Absent differs from zero, false, empty text, empty bytes and the empty
-/// list. Works as std::optional does; `*` and `->` need a value to be present.
+/// list. Read as a std::optional is: test it, then `*` or `->`, which need a value to be present.
+/// Mind Optional<Bool>: `if (field)` asks whether there is one, `field.value_or(false)` what it is.
 template <class T>
 class Optional {
  public:
@@ -61,7 +62,7 @@ class Optional {
   [[nodiscard]] T* operator->() noexcept { return &storage_.value(); }
   [[nodiscard]] const T* operator->() const noexcept { return &storage_.value(); }
 
-  /// The value; throws std::bad_optional_access when absent.
+  /// Throws std::bad_optional_access when absent.
   [[nodiscard]] const T& value() const {
     if (!has_value()) throw std::bad_optional_access();
     return **this;

@@ -1,7 +1,6 @@
 #pragma once
 
 #include <string_view>
-#include <utility>
 
 #include "ironmoat/http_headers.h"
 #include "ironmoat/output_record.h"
@@ -202,23 +201,13 @@ struct DrelUserPayloadArguments {
       &R::relayServerType, &R::pluginAllocations, &R::hoplineErrorCode, &R::originalCommand,
       &R::isBulkedPayload, &R::wantsAppAck, &R::errorDomain, &R::expectsPeerResponse, &R::allowGDR>;
 };
-/// Throws what the host refuses.
 void admit(const DrelUserPayloadArguments& arguments);
 
 /// A message payload, with the payloads and relay records nested in it. Its six lists of records
 /// are always there and may be empty; every other field but `command` may be absent.
-struct DrelUserPayload : DrelUserPayloadArguments {
-  using Arguments = DrelUserPayloadArguments;
+struct DrelUserPayload : OutputRecord<DrelUserPayload, DrelUserPayloadArguments> {
+  using OutputRecord::OutputRecord;
   static constexpr std::string_view schemaName = "DrelUserPayload";
-
-  [[nodiscard]] static DrelUserPayload with(Arguments arguments) {
-    return DrelUserPayload([&] { return Arguments(std::move(arguments)); });
-  }
-  template <MakerOf<Arguments> Make>
-  explicit DrelUserPayload(Make&& make) : Arguments(make()) {
-    admit(*this);
-  }
 };
-static_assert(DrelUserPayloadArguments::Fields::check());
 
 }  // namespace ironmoat

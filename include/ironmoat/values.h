@@ -91,7 +91,7 @@ class Slice {
 ///
 /// A String taken from a record is a slice of that record's whole message: keeping one keeps the
 /// message's memory. `detached()` gives a copy that keeps nothing else. Copies may be used from
-/// several threads at once.
+/// several threads at once. One that was moved from is empty. Print and compare by `view()`.
 class String {
  public:
   String() noexcept = default;
@@ -124,6 +124,7 @@ class Data {
   /// Copies the bytes.
   explicit Data(std::span<const std::uint8_t> bytes);
   explicit Data(std::string_view bytes) : slice_(detail::Slice::copyOf(bytes)) {}
+  /// Internal.
   explicit Data(detail::Slice slice) noexcept : slice_(std::move(slice)) {}
 
   [[nodiscard]] std::span<const std::uint8_t> bytes() const noexcept {
@@ -133,6 +134,7 @@ class Data {
   [[nodiscard]] std::size_t size() const noexcept { return slice_.length(); }
   [[nodiscard]] bool empty() const noexcept { return size() == 0; }
   [[nodiscard]] Data detached() const { return Data(detail::Slice::copyOf(view())); }
+  /// Internal.
   [[nodiscard]] const detail::Slice& slice() const noexcept { return slice_; }
 
   friend bool operator==(const Data& a, const Data& b) noexcept { return a.view() == b.view(); }

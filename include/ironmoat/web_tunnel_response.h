@@ -1,7 +1,6 @@
 #pragma once
 
 #include <string_view>
-#include <utility>
 
 #include "ironmoat/http_headers.h"
 #include "ironmoat/output_record.h"
@@ -30,22 +29,13 @@ struct VeskCommandWebTunnelResponseArguments {
                 &R::epochTimeNanos, &R::httpUrl, &R::httpHeaders, &R::httpBody, &R::httpBodyUrl,
                 &R::httpBodyKey, &R::httpResponseStatus, &R::httpErrorMsg>;
 };
-/// Throws what the host refuses.
 void admit(const VeskCommandWebTunnelResponseArguments& arguments);
-static_assert(VeskCommandWebTunnelResponseArguments::Fields::check());
 
 /// The response to a web-tunnel command: an HTTP exchange beside the fields of a response.
-struct VeskCommandWebTunnelResponse : VeskCommandWebTunnelResponseArguments {
-  using Arguments = VeskCommandWebTunnelResponseArguments;
+struct VeskCommandWebTunnelResponse
+    : OutputRecord<VeskCommandWebTunnelResponse, VeskCommandWebTunnelResponseArguments> {
+  using OutputRecord::OutputRecord;
   static constexpr std::string_view schemaName = "VeskCommandWebTunnelResponse";
-
-  [[nodiscard]] static VeskCommandWebTunnelResponse with(Arguments arguments) {
-    return VeskCommandWebTunnelResponse([&] { return Arguments(std::move(arguments)); });
-  }
-  template <MakerOf<Arguments> Make>
-  explicit VeskCommandWebTunnelResponse(Make&& make) : Arguments(make()) {
-    admit(*this);
-  }
 };
 
 }  // namespace ironmoat

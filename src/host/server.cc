@@ -56,6 +56,9 @@ void IronmoatServer::answer(const Data& request, BlockBuilder& reply) const {
   } catch (const std::exception& error) {
     reply.truncate(start);
     frames::appendSentence(reply, id, Status::failed, error.what());
+  } catch (...) {
+    reply.truncate(start);
+    frames::appendSentence(reply, id, Status::failed, "the host refused the record");
   }
 }
 

@@ -6,7 +6,7 @@
 #include <string>
 
 #include "inspect/options.h"
-#include "inspect/self_test.h"
+#include "inspect/confinement_report.h"
 #include "inspect/service_program.h"
 #include "inspect/terminal.h"
 #include "inspect/unpack_files.h"

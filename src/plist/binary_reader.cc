@@ -393,8 +393,8 @@ class BinaryReader {
   const std::size_t size_;
   const std::size_t base_;  // of the message in its block
   Document& document_;
-  ScratchArray<Node, 96>& nodes_;
-  ScratchArray<NodeIndex, 160>& children_;
+  Document::Nodes& nodes_;
+  Document::Children& children_;
   BlockBuilder side_;
 
   std::size_t offsetSize_ = 0;

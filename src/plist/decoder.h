@@ -66,7 +66,7 @@ class Decoder {
     return node;
   }
   void chargeRecords(std::size_t count, std::size_t size) const {
-    charge(budget_.recordBytes, count * size, "lists of records take more than the limit of ",
+    charge(budget_.recordBytes, count * size, "lists take more memory than the limit of ",
            limits::recordBytes, " bytes");
   }
   void chargeDelivered(std::size_t bytes) const {

@@ -84,8 +84,12 @@ class Document {
   friend class BinaryReader;
   friend class DocumentBuilder;
 
-  ScratchArray<Node, 96> nodes_;
-  ScratchArray<NodeIndex, 160> children_;
+  // Room for an ordinary message of some 40 fields without an allocation.
+  using Nodes = ScratchArray<Node, 96>;
+  using Children = ScratchArray<NodeIndex, 160>;
+
+  Nodes nodes_;
+  Children children_;
   NodeIndex root_ = 0;
   BlockRef source_;
   BlockRef side_;

@@ -1,9 +1,5 @@
 #include "plist/document_builder.h"
 
-#include <algorithm>
-#include <cstring>
-
-#include "ironmoat/errors.h"
 #include "ironmoat/limits.h"
 #include "plist/refusal.h"
 
@@ -13,7 +9,7 @@ void DocumentBuilder::begin(Kind kind) {
   if (open_.size() == limits::nestedContainers) throw tooDeep();
   const auto index = static_cast<NodeIndex>(document_.nodes_.size());
   add({kind, false, 0, 0, 0});
-  open_.push({index, static_cast<std::uint32_t>(pending_.size()), 0});
+  open_.push({index, static_cast<std::uint32_t>(pending_.size())});
 }
 
 void DocumentBuilder::end() {
@@ -21,7 +17,6 @@ void DocumentBuilder::end() {
   open_.shrinkTo(open_.size() - 1);
   const std::size_t children = pending_.size() - closed.firstPending;
   Node& node = document_.nodes_[closed.node];
-  node.height = static_cast<std::uint16_t>(closed.height + 1);
   node.payload = document_.children_.size();
   NodeIndex* place = document_.children_.extend(children);
   if (node.kind == Kind::dictionary) {
@@ -36,7 +31,6 @@ void DocumentBuilder::end() {
     for (std::size_t i = 0; i < children; ++i) place[i] = pending_[closed.firstPending + i];
   }
   pending_.shrinkTo(closed.firstPending);
-  if (!open_.empty()) open_.back().height = std::max(open_.back().height, node.height);
 }
 
 }  // namespace ironmoat::plist

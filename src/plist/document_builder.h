@@ -3,6 +3,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <string_view>
+#include <utility>
 
 #include "plist/document.h"
 
@@ -64,7 +65,6 @@ class DocumentBuilder {
   struct Open {
     NodeIndex node;
     std::uint32_t firstPending;
-    std::uint16_t height;  // of the highest child so far
   };
 
   void begin(Kind kind);

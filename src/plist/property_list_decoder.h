@@ -7,7 +7,8 @@
 
 namespace ironmoat::plist {
 
-/// Bytes of either form to a record `R`, by `R::decode(Decoder&)`. Holds nothing between calls.
+/// Bytes of either form to a record `R`, by `R::decode(const Decoder&)`. Holds nothing between
+/// calls.
 class PropertyListDecoder {
  public:
   /// Throws DecodingError, and whatever R's decoding throws, unchanged. The record keeps a

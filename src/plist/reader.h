@@ -13,7 +13,7 @@ namespace ironmoat::plist {
 /// is then useless. Time is linear in the size of the message.
 void read(const Data& message, Document& document);
 
-/// One form each, for those who know it.
+/// One form each, for tests. Requires at most limits::messageBytes.
 void readBinary(const Data& message, Document& document);
 void readXml(const Data& message, Document& document);
 

@@ -231,7 +231,7 @@ TEST(KeyedRecordTest, SharedValuesArePaidForEachTime) {
   BinaryDraft over = tiny;
   over.array(references(most + 1, 5)).dictionary({1}, {3});
   EXPECT_EQ(refusalOf([&] { decode(over.data()); }),
-            "limitExceeded l: lists of records take more than the limit of 67108864 bytes");
+            "limitExceeded l: lists take more memory than the limit of 67108864 bytes");
 
   // One megabyte of data, used 65 times: bytes delivered.
   BinaryDraft shared = tiny;

@@ -2,17 +2,15 @@
 
 namespace ironmoat {
 
-/// The process's preferences, of which this service has none: there is nothing to read, and once
-/// read-only mode is on nothing can ever be written.
+/// The process's preferences. This platform has no store of them, so that what the two switches ask
+/// for holds already: nothing in the process writes preferences, and it depends on no service that
+/// would.
 class PreferencesStore {
  public:
-  /// The process accesses its preferences itself, without a preferences service.
+  /// The process accesses its preferences itself.
   static void enableDirectMode(bool enabled);
   /// No write is accepted.
   static void enableReadOnlyMode(bool enabled);
-
-  [[nodiscard]] static bool isDirect();
-  [[nodiscard]] static bool isReadOnly();
 };
 
 }  // namespace ironmoat

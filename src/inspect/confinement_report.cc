@@ -1,4 +1,4 @@
-#include "inspect/self_test.h"
+#include "inspect/confinement_report.h"
 
 #include <fcntl.h>
 #include <poll.h>
