@@ -13,7 +13,6 @@
 
 #include "ironmoat/command_response.h"
 #include "ironmoat/limits.h"
-#include "ironmoat/message_schema.h"
 #include "ironmoat/user_payload.h"
 #include "ironmoat/web_tunnel_response.h"
 #include "records/command_response.h"
@@ -88,6 +87,12 @@ void printWireRecord(Lines& records) {
     std::cout << ", \"key\": " << std::quoted(rows.keys[place++]) << '}';
   });
   std::cout << "]}";
+}
+
+/// The label of an initialiser's argument: the first is labelled `with`, every other one has its
+/// field's name.
+std::string_view argumentLabel(std::size_t position, std::string_view fieldName) {
+  return position == 0 ? "with" : fieldName;
 }
 
 template <class R>

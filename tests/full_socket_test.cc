@@ -82,6 +82,7 @@ TEST_F(FaultsTest, APeerThatHardlyReads) {
     if (count > 0) left.remove_prefix(static_cast<std::size_t>(count));
   };
   while (!left.empty() && ready(POLLOUT, 500ms)) write();
+  const std::size_t unread = requests.size() - left.size();
   EXPECT_FALSE(left.empty()) << "took in all there was, with its replies unread";
 
   bool greeted = false;
@@ -110,8 +111,8 @@ TEST_F(FaultsTest, APeerThatHardlyReads) {
   EXPECT_TRUE(greeted);
   EXPECT_EQ(replies, std::vector<int>(kRequests, 1));
   const std::size_t peak = peakMemory(pid);
-  std::printf("written before any reply was read: %zu MiB; service at most %zu MiB\n",
-              (requests.size() - left.size()) >> 20, peak);
+  std::printf("written before any reply was read: %zu MiB; service at most %zu MiB\n", unread >> 20,
+              peak);
   EXPECT_LT(peak, kMostMemory);
 }
 

@@ -1,188 +1,38 @@
 """vesk-unpack as a process, with the real service: what it prints and how it exits.
 
-    unpack_test.py TOOL [unittest arguments]
+    unpack_test.py TOOL DUMP_TABLES [unittest arguments]
 """
 
-import base64
+import contextlib
 import json
 import os
 import plistlib
 import pty
 import random
 import re
-import struct
 import subprocess
 import sys
 import tempfile
 import threading
-import time
 import unittest
 
-TOOL = None
-MESSAGE_BYTES = 16 << 20
+from message_generator import Generator, binary, xml
+from message_model import RECORDS, Model, shown
 
-# Fields of a command response in the order in which they are decoded: wire key, label, type.
-FIELDS = [
-    ("c", "command", int), ("i", "messageId", int), ("U", "messageUUID", bytes),
-    ("s", "responseStatus", int), ("fR", "failReason", int), ("t", "token", bytes),
-    ("x-internal", "internalBuild", bool), ("x-logging", "loggingProfile", bool),
-    ("qai", "applicationId", str), ("qat", "requestType", int), ("qvesk", "veskSessionId", bytes),
-    ("qrss", "sharedSession", bool), ("qv", "protocolVersion", int),
-]
-KEYS = [key for key, _, _ in FIELDS]
-TYPES = {key: kind for key, _, kind in FIELDS}
+TOOL = DUMP_TABLES = None
+MESSAGE_BYTES = 16 << 20
 
 
 def unpack(*arguments, **options):
-    options.setdefault("stdin", subprocess.DEVNULL if "input" not in options else None)
-    if "input" in options:
-        del options["stdin"]
-    options.setdefault("stdout", subprocess.PIPE)
-    options.setdefault("stderr", subprocess.PIPE)
-    command = [TOOL, "--type", "command-response", *arguments]
-    return subprocess.run(command, timeout=250, **options)
+    if "input" not in options:
+        options["stdin"] = subprocess.DEVNULL
+    pipes = {"stdout": subprocess.PIPE, "stderr": subprocess.PIPE}
+    return subprocess.run([TOOL, "--type", "command-response", *arguments], timeout=250,
+                          **pipes | options)
 
 
 def lines_of(result):
     return [json.loads(line) for line in result.stdout.decode().split("\n")[:-1]]
-
-
-def binary(value):
-    return plistlib.dumps(value, fmt=plistlib.FMT_BINARY, sort_keys=False)
-
-
-def xml(value):
-    return plistlib.dumps(value, fmt=plistlib.FMT_XML, sort_keys=False)
-
-
-class Messages:
-    """Random command responses, and ways to break them, from one seed."""
-
-    def __init__(self, seed):
-        self.random = random.Random(seed)
-
-    def value(self, kind):
-        r = self.random
-        if kind is bool:
-            return r.random() < 0.5
-        if kind is int:
-            return r.choice([0, -1, 7, 255, 65536, -2**31, 2**53 + 1, 2**63 - 1, -2**63,
-                             r.getrandbits(r.randrange(1, 63))])
-        if kind is bytes:
-            return r.randbytes(r.choice([0, 1, 15, 16, 16, 32, 300]))
-        return r.choice(["", "plain", "grüße 漢字 😀", "<&>\"'\\ \n\t", "\u2028\u0085\u00a0", "x" * 500])
-
-    def wrong_value(self, kind):
-        choices = {int: 7, bool: True, bytes: b"7", str: "7", float: 7.0, list: [7], dict: {"c": 7}}
-        return choices[self.random.choice([other for other in choices if other is not kind])]
-
-    def good(self):
-        keys = [key for key in KEYS[1:] if self.random.random() < 0.6] + ["c"]
-        self.random.shuffle(keys)
-        message = {}
-        for key in keys:
-            if self.random.random() < 0.1:
-                message[self.random.choice(["C", "cc", "unknown", "ü"])] = self.wrong_value(None)
-            message[key] = self.value(TYPES[key])
-        return message
-
-    def encoded(self, message):
-        return self.random.choice([binary, xml])(message)
-
-    # Each way to break a message gives bytes, the kind of error, and its path.
-
-    def without_command(self):
-        message = self.good()
-        del message["c"]
-        return self.encoded(message), "keyNotFound", "c"
-
-    def wrong_fields(self):
-        message = self.good()
-        wrong = self.random.sample(KEYS, self.random.randrange(1, 4))
-        kinds = {}
-        for key in wrong:
-            if TYPES[key] is int and self.random.random() < 0.4:
-                message[key], kinds[key] = self.random.randrange(2**63, 2**64), "outOfRange"
-            else:
-                message[key], kinds[key] = self.wrong_value(TYPES[key]), "typeMismatch"
-        entries = list(message.items())
-        self.random.shuffle(entries)
-        first = min(wrong, key=KEYS.index)
-        return self.encoded(dict(entries)), kinds[first], first
-
-    def no_dictionary(self):
-        return self.encoded(self.wrong_value(dict)), "typeMismatch", ""
-
-    def cut_short(self):
-        message = self.encoded(self.good()).rstrip()
-        return message[:self.random.randrange(len(message))], "malformed", ""
-
-    def noise(self):
-        start = self.random.choice([b"", b"bplist00", b"<plist>", b"<?xml"])
-        return start + self.random.randbytes(self.random.randrange(200)), "malformed", ""
-
-    def broken_xml(self):
-        good = xml(self.good())
-        change = self.random.choice([
-            (b"<dict>", b"<dict><key>k</key>"),                     # no value
-            (b"</dict>", b"<key>k</key><string>&nbsp;</string></dict>"),
-            (b"</dict>", b"<key>k</key><null/></dict>"),
-            (b"</dict>", b"<key>k</key><data>A=A=</data></dict>"),
-            (b"</dict>", b"<key>k</key><integer>1 2</integer></dict>"),
-            (b"</dict>", b"<string>no key</string><string/></dict>"),
-            (b"</plist>", b"<dict/></plist>"),                      # a second root
-            (b"</plist>", b"</plist><plist/>"),
-            (b"<dict>", b"text<dict>"),
-            (b'encoding="UTF-8"', b'encoding="KOI8-R"'),
-            (b"<plist", b'<!DOCTYPE plist [<!ENTITY a "b">]><plist'),
-        ])
-        if change[1].startswith(b"<!DOCTYPE"):
-            good = re.sub(rb"<!DOCTYPE[^>]*>", b"", good)
-        return good.replace(*change, 1), "malformed", ""
-
-    def broken_binary(self):
-        message = bytearray(binary(self.good() | {"list": [1]}))
-        offset_size, reference_size, count, top, table = struct.unpack(">6xBBQQQ", message[-32:])
-        assert offset_size <= 2 and reference_size == 1
-        offsets = [int.from_bytes(message[table + i * offset_size:][:offset_size], "big")
-                   for i in range(count)]
-        how = self.random.randrange(5)
-        if how == 0:  # an object outside of the message
-            message[table:table + offset_size] = b"\xff" * offset_size
-        elif how == 1:  # a reference to an object that is not there
-            message[offsets[top] + 2] = 0xff
-        elif how == 2:  # a list that holds itself
-            holder = next(i for i in range(count) if message[offsets[i]] == 0xa1)
-            message[offsets[holder] + 1] = holder
-        elif how == 3:  # more objects than there can be
-            message[-24:-16] = struct.pack(">Q", 2**63)
-        else:  # a kind of object that does not exist
-            message[offsets[self.random.randrange(count)]] = 0x70
-        return bytes(message), "malformed", ""
-
-    def too_deep(self):
-        nested = "end"
-        for _ in range(600):
-            nested = [nested]
-        return self.encoded(self.good() | {"unknown": nested}), "limitExceeded", ""
-
-    def bad(self):
-        ways = [self.without_command, self.wrong_fields, self.wrong_fields, self.no_dictionary,
-                self.cut_short, self.noise, self.broken_xml, self.broken_binary]
-        if self.random.random() < 0.01:
-            return self.too_deep()
-        return self.random.choice(ways)()
-
-
-def expected_record(message_bytes):
-    """What the tool should print of a good message, from an independent reader."""
-    message = plistlib.loads(message_bytes)
-    record = {}
-    for key, label, kind in FIELDS:
-        if key in message:
-            value = message[key]
-            record[label] = base64.b64encode(value).decode() if kind is bytes else value
-    return record
 
 
 class InFolder(unittest.TestCase):
@@ -199,27 +49,35 @@ class InFolder(unittest.TestCase):
 
 
 class Batch(InFolder):
-    def test_ten_thousand_messages_half_of_them_broken(self):
-        messages = Messages(seed=20)
-        expected = []
-        for i in range(10_000):
-            if messages.random.random() < 0.5:
-                content = messages.encoded(messages.good())
-                outcome = {"record": expected_record(content)}
+    def messages(self, count):
+        """(bytes, outcome); half of them are broken, of those half no property lists."""
+        r = random.Random(20)
+        model = Model(DUMP_TABLES)
+        malformed = {"error": {"kind": "malformed", "path": ""}}
+        for number in range(count):
+            faults = 0.3 if number % 4 == 1 else 0
+            message = Generator(model.fields, r, True, False, faults).message(
+                RECORDS["command-response"][0])
+            content = r.choice([binary, xml])(message)
+            if number % 8 == 3:
+                yield content[:r.randrange(len(content.rstrip()))], malformed
+            elif number % 8 == 7:
+                yield r.choice([b"", b"bplist00", b"<?xml"]) + r.randbytes(200), malformed
             else:
-                content, kind, path = messages.bad()
-                outcome = {"error": {"kind": kind, "path": path}}
-            expected.append({"file": self.write(str(i), content), **outcome})
-        result = unpack("--format", "json", *(line["file"] for line in expected))
-        self.assertEqual(result.stderr, b"")
-        self.assertEqual(result.returncode, 1)
-        lines = lines_of(result)
-        self.assertEqual(len(lines), len(expected))
-        for line, wanted in zip(lines, expected):
-            if "error" in line:
-                self.assertTrue(line["error"].pop("message"))
-            # As text: the order of members counts, and true is not 1.
-            self.assertEqual(json.dumps(line), json.dumps(wanted))
+                yield content, model.outcome("command-response", plistlib.loads(content))
+
+    def test_ten_thousand_messages_half_of_them_broken(self):
+        outcomes = [(self.write(str(number), content), outcome)
+                    for number, (content, outcome) in enumerate(self.messages(2500))]
+        expected = random.Random(21).choices(outcomes, k=10_000)
+        result = unpack("--format", "json", *(name for name, _ in expected))
+        self.assertEqual((result.returncode, result.stderr), (1, b""))
+        self.assertEqual([line["file"] for line in lines_of(result)],
+                         [name for name, _ in expected])
+        for line, (name, outcome) in zip(lines_of(result), expected):
+            self.assertEqual(json.dumps(shown(line)), json.dumps(outcome), name)
+        broken = sum("error" in outcome for _, outcome in expected)
+        self.assertTrue(4000 < broken < 6000, broken)
 
 
 class CommandLine(InFolder):
@@ -248,8 +106,7 @@ class CommandLine(InFolder):
                              (status, output, b""))
 
     def test_standard_input(self):
-        with open("good", "rb") as file:
-            content = file.read()
+        content = binary({"c": 5})
         for arguments in ([], ["-"]):
             result = unpack("--format=json", *arguments, input=content)
             self.assertEqual(result.returncode, 0)
@@ -284,19 +141,14 @@ class CommandLine(InFolder):
         self.assertIn(b"/nonexistent/service", result.stderr)
 
     def test_too_long_messages_are_not_read_whole(self):
-        with open("huge", "wb") as file:
-            file.truncate(5 << 30)
-        with open("longest", "wb") as file:  # allowed, but no property list
-            file.truncate(MESSAGE_BYTES)
-        huge, endless, longest = lines_of(
-            unpack("--format=json", "huge", "/dev/zero", "longest"))
-        self.assertEqual(huge["error"], {
-            "kind": "limitExceeded", "path": "",
-            "message": f"message of {5 << 30} bytes, more than {MESSAGE_BYTES}"})
-        self.assertEqual(endless["error"], {
-            "kind": "limitExceeded", "path": "",
-            "message": f"message of more than {MESSAGE_BYTES} bytes"})
-        self.assertEqual(longest["error"]["kind"], "malformed")
+        for name, size in (("huge", 5 << 30), ("longest", MESSAGE_BYTES)):
+            os.truncate(self.write(name, b""), size)
+        lines = lines_of(unpack("--format=json", "huge", "/dev/zero", "longest"))
+        errors = [(line["error"]["kind"], line["error"]["message"]) for line in lines]
+        self.assertEqual(errors[:2], [
+            ("limitExceeded", f"message of {5 << 30} bytes, more than {MESSAGE_BYTES}"),
+            ("limitExceeded", f"message of more than {MESSAGE_BYTES} bytes")])
+        self.assertEqual(errors[2][0], "malformed")  # allowed, but no property list
 
     def test_file_names_that_are_no_text(self):
         name = self.write(b'n\xff\n"\xc3\xa9\x1b', binary({"c": 1}))
@@ -334,10 +186,10 @@ class Text(InFolder):
         self.write("\x1b[31mbad\n", xml({"c": "no"}))
         result = unpack("\x1b[31mgood\n", "\x1b[31mbad\n", "\x1b[31mmissing\n",
                         stderr=subprocess.STDOUT)
-        shown = result.stdout.decode()
-        self.assertNotRegex(shown, "[\x00-\x09\x0b-\x1f\x7f-\x9f\u202e]")
-        self.assertEqual(len(shown.splitlines()), 5)
-        self.assertLess(max(map(len, shown.splitlines())), 600)
+        output = result.stdout.decode()
+        self.assertNotRegex(output, "[\x00-\x09\x0b-\x1f\x7f-\x9f\u202e]")
+        self.assertEqual(len(output.splitlines()), 5)
+        self.assertLess(max(map(len, output.splitlines())), 600)
 
     def on_terminal(self, *arguments, **environment):
         """Standard output and standard error as a terminal gets them."""
@@ -347,17 +199,12 @@ class Text(InFolder):
                                        stderr=slave, stdin=subprocess.DEVNULL,
                                        env={"TERM": "xterm", **environment})
             os.close(slave)
-            shown = b""
-            while True:
-                try:
-                    part = terminal.read(65536)
-                except OSError:  # how Linux says that nobody writes any more
-                    break
-                if not part:
-                    break
-                shown += part
+            output = b""
+            with contextlib.suppress(OSError):  # how Linux says that nobody writes any more
+                while part := terminal.read(65536):
+                    output += part
             process.wait(timeout=60)
-        return shown.decode()
+        return output.decode()
 
     def test_colours_on_a_terminal_only(self):
         self.write("good", xml({"c": 5}))
@@ -369,21 +216,15 @@ class Text(InFolder):
     def test_progress_shows_and_goes_away(self):
         self.write("good", xml({"c": 5}))
         os.mkfifo("slow")
-
-        def feed():
-            time.sleep(0.5)
-            self.write("slow", xml({"c": 5}))
-
-        feeder = threading.Thread(target=feed)
+        feeder = threading.Timer(0.5, self.write, ("slow", xml({"c": 5})))
         feeder.start()
-        shown = self.on_terminal("slow", "good")
+        output = self.on_terminal("slow", "good")
         feeder.join()
-        self.assertIn("1 of 2 messages", shown)
-        on_screen = "\n".join(re.sub(".*\r\x1b\\[K", "", line) for line in shown.split("\r\n"))
+        self.assertIn("1 of 2 messages", output)
+        on_screen = "\n".join(re.sub(".*\r\x1b\\[K", "", line) for line in output.split("\r\n"))
         self.assertNotIn("of 2 messages", on_screen)
 
 
 if __name__ == "__main__":
-    sys.setrecursionlimit(10_000)  # for messages that are nested too deeply
-    TOOL = os.path.abspath(sys.argv.pop(1))
-    unittest.main()
+    TOOL, DUMP_TABLES = map(os.path.abspath, sys.argv[1:3])
+    unittest.main(argv=sys.argv[:1] + sys.argv[3:])

@@ -1,28 +1,19 @@
 """Property lists in XML as other writers may spell them: comments, CDATA, references, hexadecimal
-integers, white space, repeated keys, other encodings. What is written stands for the same value
-(but for a UID, which has no XML form and becomes a date)."""
+integers, white space, repeated keys, other encodings. What is written stands for the same value."""
 
 import base64
-import datetime
-import plistlib
 
-DATE = datetime.datetime(2001, 1, 1)
 REFERENCES = {"<": "&lt;", "&": "&amp;", ">": "&gt;", '"': "&quot;", "'": "&apos;"}
-
-
-def without_uids(value):
-    if isinstance(value, plistlib.UID):
-        return DATE
-    if isinstance(value, list):
-        return [without_uids(element) for element in value]
-    if isinstance(value, dict):
-        return {key: without_uids(element) for key, element in value.items()}
-    return value
+ENCODINGS = [("utf-8", "", ""), ("utf-8", "", "UTF-8"), ("utf-8", "\uFEFF", "utf-8"),
+             ("utf-16-le", "\uFEFF", "UTF-16"), ("utf-16-be", "\uFEFF", "utf-16"),
+             ("utf-16-be", "\uFEFF", ""), ("ascii", "", "US-ASCII")]
+DOCTYPES = ["", '<!DOCTYPE plist SYSTEM "plist.dtd">', "<!DOCTYPE plist >"]
 
 
 class Speller:
     def __init__(self, random):
         self.random = random
+        self.choice = random.choice
         self.oddity = random.choice([0.02, 0.1, 0.5])  # how much is written in an unusual way
 
     def odd(self):
@@ -30,90 +21,64 @@ class Speller:
 
     def spell(self, value):
         """The message as bytes."""
-        r = self.random
-        encoding, mark, declared = r.choice([
-            ("utf-8", "", ""), ("utf-8", "", "UTF-8"), ("utf-8", "\uFEFF", "utf-8"),
-            ("utf-16-le", "\uFEFF", "UTF-16"), ("utf-16-be", "\uFEFF", "utf-16"),
-            ("utf-16-be", "\uFEFF", ""), ("ascii", "", "US-ASCII")])
+        encoding, mark, declared = self.choice(ENCODINGS)
         self.only_ascii = encoding == "ascii"
         head = ""
-        if declared or r.random() < 0.5:
-            quote = r.choice("\"'")
+        if declared or self.random.random() < 0.5:
+            quote = self.choice("\"'")
             head = f"<?xml version={quote}1.0{quote}"
             if declared:
                 head += f" encoding = {quote}{declared}{quote}"
-            head += r.choice(["", " standalone='yes'"]) + " ?>"
-        head += self.space()
-        head += r.choice(["", "<!DOCTYPE plist SYSTEM \"plist.dtd\">", "<!DOCTYPE plist >"])
-        head += self.space() + r.choice(["<plist>", '<plist version="1.0">', "<plist\n>"])
-        self.parts = [mark, head, self.space()]
-        self.value(value)
-        self.parts += [self.space(), r.choice(["</plist>", "</plist >"]), self.space()]
-        return "".join(self.parts).encode(encoding)
+            head += self.choice(["", " standalone='yes'"]) + " ?>"
+        parts = [mark, head, self.space(), self.choice(DOCTYPES), self.space(),
+                 self.choice(["<plist>", '<plist version="1.0">', "<plist\n>"]), self.space(),
+                 self.value(value), self.space(), self.choice(["</plist>", "</plist >"]),
+                 self.space()]
+        return "".join(parts).encode(encoding)
 
     def space(self):
-        if not self.odd():
-            return self.random.choice(["", "", "\n"])
-        return self.random.choice([" \t\r\n", "<!-- <key>c</key> -->", "\r<?note >?>\n", "<!---->"])
+        return self.choice([" \t\r\n", "<!-- <key>c</key> -->", "\r<?note >?>\n", "<!---->"]
+                           if self.odd() else ["", "", "\n"])
 
     def value(self, value):
         if isinstance(value, dict):
-            self.container("dict", value, self.entries)
-        elif isinstance(value, list):
-            self.container("array", value, self.elements)
-        elif isinstance(value, bool):
-            name = "true" if value else "false"
-            self.parts.append(f"<{name}></{name} >" if self.odd() else f"<{name}/>")
-        elif isinstance(value, int):
-            self.scalar("integer", self.integer(value))
-        elif isinstance(value, float):
-            self.scalar("real", self.padded(repr(value)))
-        elif isinstance(value, str):
-            self.scalar("string", self.text(value))
-        elif isinstance(value, bytes):
-            self.scalar("data", self.base64(value))
-        else:
-            date = DATE if isinstance(value, plistlib.UID) else value
-            self.scalar("date", f"{date.year:04}" + date.strftime("-%m-%dT%H:%M:%SZ"))
+            return self.element("dict", self.apart(map(self.entry, value.items())))
+        if isinstance(value, list):
+            return self.element("array", self.apart(map(self.value, value)))
+        if isinstance(value, bool):
+            return self.element("true" if value else "false", "")
+        if isinstance(value, int):
+            return self.element("integer", self.integer(value))
+        if isinstance(value, float):
+            return self.element("real", self.choice([" ", "\t\r\n"]) + repr(value) + " "
+                                if self.odd() else repr(value))
+        if isinstance(value, str):
+            return self.element("string", self.text(value))
+        if isinstance(value, bytes):
+            return self.element("data", self.base64(value))
+        return self.element("date", value.isoformat() + "Z")
 
-    def container(self, name, value, content):
-        if not value and self.random.random() < 0.5:
-            self.parts.append(f"<{name}/>")
-            return
-        self.parts += [f"<{name}>", self.space()]
-        content(value)
-        self.parts.append(f"</{name} >" if self.odd() else f"</{name}>")
+    def element(self, name, content):
+        blank = " " if self.odd() else ""
+        if not content and self.choice([True, False]):
+            return f"<{name}{blank}/>"
+        return f"<{name}>{content}</{name}{blank}>"
 
-    def entries(self, value):
-        for key, element in value.items():
-            if self.random.random() < 0.01:  # the last of several counts
-                self.entry(key, self.random.choice([5, "5", b"5", 5.0, DATE, [], {"c": {}}]))
-            self.entry(key, element)
+    def apart(self, parts):
+        return "".join(part + self.space() for part in ["", *parts])
 
-    def entry(self, key, element):
-        self.scalar("key", self.text(key))
-        self.parts.append(self.space())
-        self.value(element)
-        self.parts.append(self.space())
-
-    def elements(self, value):
-        for element in value:
-            self.value(element)
-            self.parts.append(self.space())
-
-    def scalar(self, name, content):
-        if not content and self.random.random() < 0.5:
-            self.parts.append(f"<{name} />")
-        else:
-            self.parts += [f"<{name}>", content, f"</{name}>"]
-
-    def padded(self, text):
-        return self.random.choice([" ", "\n", "\t\r\n"]) + text + " " if self.odd() else text
+    def entry(self, entry):
+        key, value = entry
+        written = self.element("key", self.text(key)) + self.space() + self.value(value)
+        if self.random.random() < 0.01:  # the last of several counts
+            other = self.choice([5, "5", b"5", 5.0, True, [], {"c": {}}])
+            return self.apart([self.entry((key, other)), written])
+        return written
 
     def integer(self, value):
         if value >= 0 and self.odd():
-            value = self.random.choice([f"0x{value:x}", f"0X{value:016X}", f"+{value}",
-                                        f"000{value}", f" {value}\n", f"\r\n\t{value} "])
+            return self.choice([f"0x{value:x}", f"0X{value:016X}", f"+{value}", f"000{value}",
+                                f" {value}\n", f"\r\n\t{value} "])
         return self.text(str(value))
 
     def base64(self, value):
@@ -122,7 +87,7 @@ class Speller:
             return text
         width = self.random.randrange(1, 80)
         lines = [text[at:at + width] for at in range(0, len(text), width)]
-        return self.random.choice(["\n\t", " ", "\r\n"]).join(["", *lines, ""])
+        return self.choice(["\n\t", " ", "\r\n"]).join(["", *lines, ""])
 
     def text(self, text):
         if not self.odd():
@@ -133,7 +98,7 @@ class Speller:
             pieces.append(self.piece(text[:size]))
             text = text[size:]
             if self.odd():
-                pieces.append(self.random.choice(["<!-- & ]]> -->", "<?p &?>", "<![CDATA[]]>"]))
+                pieces.append(self.choice(["<!-- & ]]> -->", "<?p &?>", "<![CDATA[]]>"]))
         return "".join(pieces)
 
     def plain(self, character):
@@ -145,12 +110,12 @@ class Speller:
         how = self.random.randrange(4)
         if how == 0 and "\r" not in text and "]]>" not in text and \
                 (text.isascii() or not self.only_ascii):
-            return "<![CDATA[" + text.replace("\n", self.line_end()) + "]]>"
+            return "<![CDATA[" + self.line_ends(text) + "]]>"
         if how == 1:
             return "".join(f"&#x{ord(c):x};" if self.odd() else self.plain(c) for c in text)
         if how == 2:
             return "".join(REFERENCES.get(c) or f"&#{ord(c):07};" for c in text)
-        return "".join(map(self.plain, text)).replace("\n", self.line_end())
+        return self.line_ends("".join(map(self.plain, text)))
 
-    def line_end(self):
-        return self.random.choice(["\n", "\r\n", "\r"])
+    def line_ends(self, text):
+        return text.replace("\n", self.choice(["\n", "\r\n", "\r"]))

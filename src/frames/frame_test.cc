@@ -14,6 +14,7 @@ namespace ironmoat::frames {
 namespace {
 
 using namespace std::string_literals;
+using testing::tightMessage;
 using Kind = DecodingError::Kind;
 
 std::string number(std::uint64_t value, std::size_t bytes) {
@@ -21,7 +22,6 @@ std::string number(std::uint64_t value, std::size_t bytes) {
   for (std::size_t i = 0; i < bytes; ++i) text.push_back(static_cast<char>(value >> (8 * i)));
   return text;
 }
-
 std::string frame(const std::string& body) { return number(body.size(), 4) + body; }
 
 /// The bytes that `append` appends.
@@ -32,38 +32,43 @@ std::string written(Append append) {
   return std::string(out.bytes(), out.size());
 }
 
-std::string bodyOf(const std::string& frame) { return frame.substr(kLengthBytes); }
+/// The error that a reply carries of `error`.
+DecodingError carried(const DecodingError& error) {
+  const auto reply = written([&](auto& out) { appendRefusal(out, 1, error); });
+  return parseRefusal(parseReply(tightMessage(reply.substr(kLengthBytes))).body);
+}
 
-const Hello kHello{1, 5, 0x0102030405060708, 2, 3, 4, 512};
-const std::string kHelloFrame = frame("IRONMOAT\x01\0\x05\0\0\0\x08\x07\x06\x05\x04\x03\x02\x01"s +
-                                      number(2, 8) + number(3, 8) + number(4, 8) + number(512, 4));
-const std::string kRequestFrame = frame("\x2A\0\0\0\0\0\0\x80\x05Type1<msg>"s);
-const DecodingError kError(Kind::typeMismatch, "mml[1].U", "expected data", 0x1234);
-const std::string kRefusalFrame =
-    frame("\x07\0\0\0\0\0\0\0\x01\x02\x34\x12\0\0\0\0\0\0\x08\0mml[1].Uexpected data"s);
+const std::string kHelloBody = "IRONMOAT\1\0\5\0\0\0\x08\x07\x06\x05\x04\x03\x02\x01"s +
+                               number(2, 8) + number(3, 8) + number(4, 8) + number(512, 4);
+const std::string kRequestBody = "\x2A\0\0\0\0\0\0\x80\x05Type1<msg>"s;
+const std::string kRefusalBody = "\x07\0\0\0\0\0\0\0\1\2\x34\x12\0\0\0\0\0\0\x08\0mml[1].Uwhy"s;
 
 TEST(FrameTest, FramesAreLaidOutAsDescribed) {
-  EXPECT_EQ(written([](auto& out) { appendHello(out, kHello); }), kHelloFrame);
-  EXPECT_EQ(parseHello(Data(bodyOf(kHelloFrame))), kHello);
+  const Hello hello{1, 5, 0x0102030405060708, 2, 3, 4, 512};
+  EXPECT_EQ(written([&](auto& out) { appendHello(out, hello); }), frame(kHelloBody));
+  EXPECT_EQ(parseHello(tightMessage(kHelloBody)), hello);
 
   const std::uint64_t id = 0x800000000000002A;
-  EXPECT_EQ(written([&](auto& out) { appendRequest(out, id, "Type1", "<msg>"); }), kRequestFrame);
-  const Data requestBody(bodyOf(kRequestFrame));
-  const Request request = parseRequest(requestBody);
+  EXPECT_EQ(written([&](auto& out) { appendRequest(out, id, "Type1", "<msg>"); }),
+            frame(kRequestBody));
+  const Data body = tightMessage(kRequestBody);
+  const Request request = parseRequest(body);
   EXPECT_EQ(request.id, id);
   EXPECT_EQ(request.outputType, "Type1");
   EXPECT_EQ(request.message.view(), "<msg>");
-  EXPECT_EQ(request.message.slice().block(), requestBody.slice().block());
+  EXPECT_EQ(request.message.slice().block(), body.slice().block());
 
-  EXPECT_EQ(written([](auto& out) { appendRefusal(out, 7, kError); }), kRefusalFrame);
-  const Reply reply = parseReply(Data(bodyOf(kRefusalFrame)));
+  const DecodingError refusal(Kind::typeMismatch, "mml[1].U", "why", 0x1234);
+  EXPECT_EQ(written([&](auto& out) { appendRefusal(out, 7, refusal); }), frame(kRefusalBody));
+  const Reply reply = parseReply(tightMessage(kRefusalBody));
   EXPECT_EQ(reply.id, 7U);
   EXPECT_EQ(reply.status, Status::refused);
   const DecodingError error = parseRefusal(reply.body);
-  EXPECT_EQ(error.kind(), kError.kind());
-  EXPECT_EQ(error.path(), kError.path());
-  EXPECT_EQ(error.offset(), kError.offset());
-  EXPECT_STREQ(error.what(), kError.what());
+  EXPECT_EQ(error.kind(), refusal.kind());
+  EXPECT_EQ(error.path(), refusal.path());
+  EXPECT_EQ(error.offset(), refusal.offset());
+  EXPECT_STREQ(error.what(), refusal.what());
+  EXPECT_FALSE(carried(DecodingError(Kind::keyNotFound, "", "")).offset().has_value());
 
   EXPECT_EQ(written([](auto& out) { appendSentence(out, 1, Status::failed, "why"); }),
             frame(number(1, 8) + "\3why"));
@@ -76,89 +81,74 @@ TEST(FrameTest, FramesAreLaidOutAsDescribed) {
             "before" + frame(number(2, 8) + "\0fields"s));
 }
 
-TEST(FrameTest, ARefusalWithoutOffsetHasNone) {
-  BlockBuilder out;
-  appendRefusal(out, 1, DecodingError(Kind::keyNotFound, "", ""));
-  const std::string body(out.bytes() + kLengthBytes, out.size() - kLengthBytes);
-  const DecodingError error = parseRefusal(parseReply(Data(body)).body);
-  EXPECT_FALSE(error.offset().has_value());
-  EXPECT_EQ(error.kind(), Kind::keyNotFound);
-}
-
 TEST(FrameTest, BrokenBodiesAreRefused) {
-  const auto hello = [](const std::string& body) { (void)parseHello(testing::tightMessage(body)); };
-  const auto request = [](const std::string& body) {
-    (void)parseRequest(testing::tightMessage(body));
+  const auto hello = [](const Data& body) { (void)parseHello(body); };
+  const auto request = [](const Data& body) { (void)parseRequest(body); };
+  const auto reply = [](const Data& body) { (void)parseReply(body); };
+  const auto refusal = [](const Data& body) { (void)parseRefusal(body); };
+  const auto sentence = [](const Data& body) { (void)parseSentence(body); };
+  const std::string refused = kRefusalBody.substr(9);
+  const struct {
+    void (*parse)(const Data&);
+    std::string body;
+    std::size_t accepted;  // of the beginnings of the body, itself included
+  } rows[] = {
+      {hello, kHelloBody, 1},
+      {hello, kHelloBody + "x", 1},
+      {hello, "IRONMOAX" + kHelloBody.substr(8), 0},
+      {hello, "IRONMOAT\2\0"s + kHelloBody.substr(10), 0},
+      {request, kRequestBody, 1 + 5},
+      {request, number(1, 8) + "\0rest"s, 0},
+      {request, number(1, 8) + "\xFFshort", 0},
+      {reply, kRefusalBody, 1 + refused.size()},
+      {reply, number(1, 8) + "\4", 0},
+      {refusal, refused, 1 + 3},
+      {refusal, "\5" + refused.substr(1), 0},
+      {refusal, "\0"s + number(0, 8) + "\1\0\xC3\xA9"s, 0},
+      {refusal, "\0"s + number(0, 8) + "\0\0\xC3"s, 1},
+      {sentence, "zero\0byte"s, 1 + 4},
   };
-  const auto reply = [](const std::string& body) { (void)parseReply(testing::tightMessage(body)); };
-  const auto refusal = [](const std::string& body) {
-    (void)parseRefusal(testing::tightMessage(body));
-  };
-  const auto sentence = [](const std::string& body) {
-    (void)parseSentence(testing::tightMessage(body));
-  };
-
-  // Every byte up to here has to be there; what follows may have any length.
-  const std::string goodHello = bodyOf(kHelloFrame);
-  const std::string goodRequest = bodyOf(kRequestFrame);
-  const std::string goodRefusal = bodyOf(kRefusalFrame).substr(9);
-  for (std::size_t i = 0; i < goodHello.size(); ++i) {
-    EXPECT_THROW(hello(goodHello.substr(0, i)), FrameError) << i;
+  for (const auto& row : rows) {
+    std::size_t accepted = 0;
+    for (std::size_t length = 0; length <= row.body.size(); ++length) {
+      try {
+        row.parse(tightMessage(row.body.substr(0, length)));
+        ++accepted;
+      } catch (const FrameError&) {
+      }
+    }
+    EXPECT_EQ(accepted, row.accepted) << ::testing::PrintToString(row.body);
   }
+  EXPECT_NO_THROW(sentence(Data(std::string(65535, 'x'))));
+  EXPECT_THROW(sentence(Data(std::string(65536, 'x'))), FrameError);
   for (std::size_t i = 0; i < 8 + 1 + 5; ++i) {
-    EXPECT_THROW(request(goodRequest.substr(0, i)), FrameError) << i;
-    EXPECT_EQ(requestId(testing::tightMessage(goodRequest.substr(0, i))).has_value(), i >= 8) << i;
+    EXPECT_EQ(requestId(tightMessage(kRequestBody.substr(0, i))).has_value(), i >= 8) << i;
   }
-  for (std::size_t i = 0; i < 9; ++i) {
-    EXPECT_THROW(reply(bodyOf(kRefusalFrame).substr(0, i)), FrameError) << i;
-  }
-  for (std::size_t i = 0; i < 1 + 8 + 2 + 8; ++i) {
-    EXPECT_THROW(refusal(goodRefusal.substr(0, i)), FrameError) << i;
-  }
-
-  EXPECT_THROW(hello(goodHello + "x"), FrameError);
-  EXPECT_THROW(hello("IRONMOAX" + goodHello.substr(8)), FrameError);
-  EXPECT_THROW(hello("IRONMOAT\2\0"s + goodHello.substr(10)), FrameError);
-  EXPECT_THROW(request(number(1, 8) + "\0rest"s), FrameError);
-  EXPECT_THROW(request(number(1, 8) + "\xFFshort"), FrameError);
-  EXPECT_THROW(reply(number(1, 8) + "\4"), FrameError);
-  EXPECT_THROW(refusal("\5" + goodRefusal.substr(1)), FrameError);
-  EXPECT_THROW(refusal("\0"s + number(0, 8) + "\xFF\xFFpath"), FrameError);
-  EXPECT_THROW(refusal("\0"s + number(0, 8) + "\1\0\xC3\xA9"s), FrameError);
-  EXPECT_THROW(refusal("\0"s + number(0, 8) + "\0\0\xC3"s), FrameError);
-  EXPECT_THROW(sentence("\xED\xA0\x80"), FrameError);
-  EXPECT_THROW(sentence("zero\0byte"s), FrameError);
-  EXPECT_NO_THROW(sentence(std::string(65535, 'x')));
-  EXPECT_THROW(sentence(std::string(65536, 'x')), FrameError);
 }
 
 TEST(FrameTest, WritersOnlyWriteWhatCanBeRead) {
   const std::string path(65534, 'p');
-  BlockBuilder out;
-  appendRefusal(out, 1, DecodingError(Kind::malformed, path + "\xC3\xA9", "a\xFF z"));
-  const std::string body(out.bytes() + kLengthBytes, out.size() - kLengthBytes);
-  const DecodingError error = parseRefusal(parseReply(Data(body)).body);
+  const DecodingError error = carried(DecodingError(Kind::malformed, path + "\xC3\xA9", "a\xFF z"));
   EXPECT_EQ(error.path(), path);
   EXPECT_STREQ(error.what(), "a");
 
-  const std::size_t size = out.size();
+  BlockBuilder out;
   EXPECT_THROW(appendRequestHead(out, 1, "", 0), FrameError);
   EXPECT_THROW(appendRequestHead(out, 1, std::string(256, 'n'), 0), FrameError);
   EXPECT_THROW(appendRequestHead(out, 1, "n", kMaxRequestBody), FrameError);
-  EXPECT_NO_THROW(appendRequestHead(out, 1, std::string(255, 'n'), limits::messageBytes));
-  out.truncate(size);
+  EXPECT_EQ(out.size(), 0U);
+  appendRequestHead(out, 1, std::string(255, 'n'), limits::messageBytes);
   const std::size_t start = beginReply(out, 1, Status::record);
   out.extend(limits::replyBytes);
   EXPECT_NO_THROW(endReply(out, start));
   out.push('x');
   EXPECT_THROW(endReply(out, start), FrameError);
-  EXPECT_EQ(out.size(), size);
+  EXPECT_EQ(out.size(), start);
 }
 
 /// Feeds `stream` in pieces of at most `piece` bytes and takes out every body as soon as it can be.
-std::vector<std::string> assembled(FrameAssembler& assembler, std::string_view stream,
-                                   std::size_t piece) {
-  std::vector<std::string> bodies;
+std::vector<Data> assembled(FrameAssembler& assembler, std::string_view stream, std::size_t piece) {
+  std::vector<Data> bodies;
   while (!stream.empty()) {
     const std::span<char> room = assembler.room();
     const std::size_t count = std::min({piece, room.size(), stream.size()});
@@ -166,47 +156,38 @@ std::vector<std::string> assembled(FrameAssembler& assembler, std::string_view s
     stream.copy(room.data(), count);
     stream.remove_prefix(count);
     assembler.commit(count);
-    while (const auto body = assembler.next()) bodies.emplace_back(body->view());
+    while (const auto body = assembler.next()) bodies.push_back(*body);
   }
   return bodies;
 }
 
-TEST(FrameAssemblerTest, BodiesDoNotDependOnHowTheyArrive) {
-  std::vector<std::string> bodies;
+TEST(FrameAssemblerTest, BodiesDoNotDependOnHowTheyArriveAndOutliveTheAssembler) {
+  std::vector<Data> expected;
   std::string stream;
   // Around the buffer's size, and runs of small frames before and behind large ones.
   for (const std::size_t size :
        {0, 1, 5, 65531, 65532, 65533, 3, 65536, 200000, 0, 0, 7, 40000, 40000, 100, 1000000, 1}) {
-    bodies.emplace_back(size, static_cast<char>('a' + bodies.size()));
-    stream += frame(bodies.back());
+    const std::string body(size, static_cast<char>('a' + expected.size()));
+    expected.emplace_back(body);
+    stream += frame(body);
   }
   for (const std::size_t piece : {1, 2, 3, 7, 1000, 65535, 65536, 4000000}) {
-    FrameAssembler assembler(1000000, Sharing::oneThread);
-    EXPECT_EQ(assembled(assembler, stream, piece), bodies) << piece;
-    EXPECT_FALSE(assembler.midFrame());
+    std::vector<Data> bodies;
+    {
+      FrameAssembler assembler(1000000, Sharing::oneThread);
+      bodies = assembled(assembler, stream, piece);
+      EXPECT_FALSE(assembler.midFrame());
+      EXPECT_TRUE(assembled(assembler, "\3"s, 1).empty());
+      EXPECT_TRUE(assembler.midFrame());
+    }
+    EXPECT_TRUE(bodies == expected) << piece;
+    EXPECT_NE(bodies[1].slice().block(), bodies[2].slice().block());
   }
-}
-
-TEST(FrameAssemblerTest, BodiesOutliveTheAssembler) {
-  std::vector<Data> bodies;
-  {
-    FrameAssembler assembler(100, Sharing::anyThread);
-    const std::string stream = frame("one") + frame("two") + "\3"s;
-    stream.copy(assembler.room().data(), stream.size());
-    assembler.commit(stream.size());
-    while (const auto body = assembler.next()) bodies.push_back(*body);
-    EXPECT_TRUE(assembler.midFrame());
-  }
-  ASSERT_EQ(bodies.size(), 2U);
-  EXPECT_EQ(bodies[0].view(), "one");
-  EXPECT_EQ(bodies[1].view(), "two");
-  EXPECT_NE(bodies[0].slice().block(), bodies[1].slice().block());
 }
 
 TEST(FrameAssemblerTest, MemoryFollowsWhatCameNotWhatWasAnnounced) {
   FrameAssembler assembler(UINT32_MAX, Sharing::anyThread);
   EXPECT_TRUE(assembled(assembler, "\xFF\xFF\xFF\xFF+++"s, 7).empty());
-  EXPECT_TRUE(assembler.midFrame());
   std::size_t came = 3;
   for (int i = 0; i < 8; ++i) {
     const std::size_t room = assembler.room().size();
@@ -219,8 +200,7 @@ TEST(FrameAssemblerTest, MemoryFollowsWhatCameNotWhatWasAnnounced) {
 
 TEST(FrameAssemblerTest, AnnouncingTooMuchEndsTheConnection) {
   FrameAssembler assembler(10, Sharing::anyThread);
-  EXPECT_EQ(assembled(assembler, frame("0123456789"), 100).size(), 1U);
-  EXPECT_TRUE(assembled(assembler, "\x0B\0\0"s, 100).empty());
+  EXPECT_EQ(assembled(assembler, frame("0123456789") + "\x0B\0\0"s, 100).size(), 1U);
   EXPECT_THROW(assembled(assembler, "\0"s, 100), FrameError);
   EXPECT_THROW((void)assembler.next(), FrameError);
 }

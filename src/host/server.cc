@@ -9,6 +9,7 @@
 #include <latch>
 #include <new>
 #include <shared_mutex>
+#include <system_error>
 #include <thread>
 
 #include "confinement/confinement.h"
@@ -132,6 +133,8 @@ void IronmoatServer::run() {
       BlockBuilder frame(Sharing::oneThread);
       frames::appendSentence(frame, 0, Status::notServed, error.what());
       sink.send(frame.finish());
+    } catch (const std::bad_alloc&) {
+      // Not even room for an error: an end in order, and the peer may start another service.
     }
     source.close();
   };

@@ -82,10 +82,14 @@ class BinaryReader {
     if (table <= binary::kHeader.size() || table >= trailer) {
       throw malformed("offset table out of bounds", trailer + 24);
     }
-    // The table fills the room up to the trailer exactly. Dividing keeps the product from wrapping,
-    // and with it every object of the table has its bytes: the count is proven.
+    // The table fills the room up to the trailer exactly. Dividing keeps the product from wrapping.
     if (count != (trailer - table) / offsetSize_ || (trailer - table) % offsetSize_ != 0) {
       throw malformed("offset table does not fit the object count", trailer + 8);
+    }
+    // Each object takes a byte of a room in which they may not overlap: bounds what is allocated
+    // for them by the bytes that are there.
+    if (count > table - binary::kHeader.size()) {
+      throw malformed("more objects than bytes for them", trailer + 8);
     }
     if (root >= count) throw malformed("top object is not in the table", trailer + 16);
     objectsEnd_ = static_cast<std::size_t>(table);

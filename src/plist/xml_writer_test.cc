@@ -1,11 +1,11 @@
 #include <gtest/gtest.h>
 
 #include <cstdint>
+#include <functional>
 #include <limits>
 #include <stdexcept>
 #include <string>
 
-#include "ironmoat/limits.h"
 #include "plist/document_builder.h"
 #include "plist/reader.h"
 #include "plist/writer.h"
@@ -14,8 +14,9 @@
 namespace ironmoat::plist {
 namespace {
 
-template <class Fill>
-std::string written(Fill fill) {
+using Fill = std::function<void(DocumentBuilder&)>;
+
+std::string written(const Fill& fill) {
   Document document;
   DocumentBuilder builder(document, {}, Sharing::anyThread);
   fill(builder);
@@ -69,34 +70,24 @@ TEST(XmlWriterTest, WritesOneElementALine) {
 )");
 }
 
-TEST(XmlWriterTest, GoesAsDeepAsADocumentCan) {
-  written([](DocumentBuilder& builder) {
-    for (std::uint32_t i = 0; i < limits::nestedContainers; ++i) builder.beginArray();
-    for (std::uint32_t i = 0; i < limits::nestedContainers; ++i) builder.end();
-  });
-}
-
 TEST(XmlWriterTest, RefusesWhatTheFormOrARecordCannotHold) {
-  for (const std::string_view text :
-       {std::string_view("a\0b", 3), std::string_view("\x1F"), std::string_view("\xEF\xBF\xBE"),
-        std::string_view("\xEF\xBF\xBF")}) {
-    EXPECT_THROW(written([&](DocumentBuilder& builder) { builder.string(text); }),
-                 std::invalid_argument);
-    EXPECT_THROW(written([&](DocumentBuilder& builder) {
-                   builder.beginDictionary();
-                   builder.string(text);
-                   builder.boolean(true);
-                   builder.end();
-                 }),
-                 std::invalid_argument);
+  const auto inKey = [](DocumentBuilder& builder) {
+    builder.beginDictionary();
+    builder.string("\x1F");
+    builder.boolean(true);
+    builder.end();
+  };
+  for (const Fill& fill : {
+           Fill([](auto& builder) {
+             builder.string({"a\0b", 3});
+           }),
+           Fill([](auto& builder) { builder.string("\xEF\xBF\xBF"); }),
+           Fill(inKey),
+           Fill([](auto& builder) { builder.opaque(Kind::real); }),
+           Fill([](auto& builder) { builder.unsignedInteger(~std::uint64_t{0}); }),
+       }) {
+    EXPECT_THROW(written(fill), std::invalid_argument);
   }
-  for (const Kind kind : {Kind::real, Kind::date, Kind::uid}) {
-    EXPECT_THROW(written([&](DocumentBuilder& builder) { builder.opaque(kind); }),
-                 std::invalid_argument);
-  }
-  EXPECT_THROW(
-      written([](DocumentBuilder& builder) { builder.unsignedInteger(~std::uint64_t{0}); }),
-      std::invalid_argument);
 }
 
 }  // namespace

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "ironmoat/values.h"
+#include "support/tight_message.h"
 
 namespace ironmoat::testing {
 
@@ -62,7 +63,7 @@ struct BinaryDraft {
     out += bigEndianBytes(tableOffset.value_or(table), 8);
     return out;
   }
-  [[nodiscard]] Data data() const { return Data(std::string_view(text())); }
+  [[nodiscard]] Data data() const { return tightMessage(text()); }
 
   static std::string head(unsigned marker, std::size_t count) {
     if (count < 15) return {static_cast<char>(marker | count)};

@@ -102,7 +102,8 @@ struct Tally {
       const bool killed = what.find("was killed by SIGKILL") != std::string::npos;
       if (killed && error.kind() == ServiceError::Kind::crashed) {
         ++crashed;
-      } else if (killed || what == "the client was destroyed") {
+      } else if (what.ends_with("was killed by SIGKILL before it greeted") ||
+                 what == "the client was destroyed") {
         ++unavailable;
       } else {
         complain(what);

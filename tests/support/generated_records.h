@@ -1,42 +1,51 @@
 #pragma once
 
+#include <concepts>
 #include <cstdint>
 #include <limits>
 #include <random>
 #include <string>
+#include <utility>
 
 #include "ironmoat/values.h"
-#include "records/keyed_record.h"
 
-/// Wire records made and compared by their tables alone.
+/// Records made and compared by their lists of fields alone.
 namespace ironmoat::testing {
 
+/// Where a record's FieldList is: an output record has its own, others say it by specialising this.
 template <class R>
-constexpr bool isKeyedRecord = requires {
-  typename R::CodingKeys;
+struct FieldsOf {};
+template <class R>
+requires requires { typename R::Arguments::Fields; }
+struct FieldsOf<R> {
+  using List = typename R::Arguments::Fields;
 };
-
-/// `visit(Field<Member>{})` for every row of R's table.
-template <class R, class Visitor>
-void forEachField(Visitor&& visit) {
-  std::remove_const_t<decltype(records::Table<R>::rows)>::template Fields<R>::forEach(visit);
-}
+template <class T>
+concept Record = requires {
+  typename FieldsOf<T>::List;
+};
 
 class RecordGenerator {
  public:
   /// `presence` of 0 makes every optional field absent, of 1 present.
   RecordGenerator(std::uint64_t seed, double presence) : random_(seed), present_(presence) {}
 
-  template <class R>
-  requires isKeyedRecord<R> R make(int depth) {
-    R record{};
-    forEachField<R>([&](auto field) { fill(field.in(record), depth); });
-    return record;
+  /// Lists inside one another end after `depth` of them.
+  template <Record R>
+  R make(int depth) {
+    const auto filled = [&](auto parts) {
+      FieldsOf<R>::List::forEach([&](auto field) { fill(field.in(parts), depth); });
+      return parts;
+    };
+    if constexpr (requires { typename R::Arguments; }) {
+      return R::with(filled(typename R::Arguments{}));
+    } else {
+      return filled(R{});
+    }
   }
 
  private:
-  void fill(Int& value, int) { value = integer(); }
-  void fill(Int64& value, int) { value = integer(); }
+  void fill(std::integral auto& value, int) { value = integer(); }
   void fill(Bool& value, int) { value = below(2) == 1; }
   void fill(String& value, int) {
     static constexpr const char* kPieces[] = {
@@ -50,75 +59,58 @@ class RecordGenerator {
     for (auto left = below(20); left > 0; --left) bytes += static_cast<char>(random_());
     value = Data(std::string_view(bytes));
   }
-  template <class R>
-  requires isKeyedRecord<R>
-  void fill(R& record, int depth) { record = make<R>(depth); }
   template <class T>
   void fill(List<T>& list, int depth) {
-    const auto count = depth > 0 ? below(4) : 0;
-    for (std::uint64_t i = 0; i < count; ++i) fill(list.emplace_back(), depth - 1);
+    for (auto left = depth > 0 ? below(4) : 0; left > 0; --left) list.push_back(some<T>(depth - 1));
   }
   template <class T>
   void fill(Optional<T>& value, int depth) {
-    if (!present_(random_)) return;
-    value = T{};
-    fill(*value, depth);
+    if (present_(random_)) value = some<T>(depth);
+  }
+  template <class T>
+  T some(int depth) {
+    if constexpr (Record<T>) {
+      return make<T>(depth);
+    } else {
+      T value{};
+      fill(value, depth);
+      return value;
+    }
   }
 
   std::uint64_t below(std::uint64_t bound) { return random_() % bound; }
+  /// The least, the most, or up to any number of bits, of either sign.
   std::int64_t integer() {
-    static constexpr std::int64_t kEdges[] = {0,
-                                              1,
-                                              -1,
-                                              127,
-                                              128,
-                                              255,
-                                              256,
-                                              65535,
-                                              65536,
-                                              -128,
-                                              1L << 31,
-                                              1L << 32,
-                                              (1L << 32) - 1,
-                                              std::numeric_limits<std::int64_t>::min(),
-                                              std::numeric_limits<std::int64_t>::max()};
-    const auto pick = below(std::size(kEdges) + 2);
-    return pick < std::size(kEdges) ? kEdges[pick] : static_cast<std::int64_t>(random_());
+    using Limits = std::numeric_limits<std::int64_t>;
+    const auto pick = below(66);
+    if (pick > 63) return pick == 64 ? Limits::min() : Limits::max();
+    return static_cast<std::int64_t>(random_()) >> pick;
   }
 
   std::mt19937_64 random_;
   std::bernoulli_distribution present_;
 };
 
-/// The name of the first field in which two records differ, or nothing.
+/// The way to the first field in which two records differ, or nothing.
 template <class T>
 std::string difference(const T& a, const T& b) {
-  return a == b ? "" : "value";
-}
-template <class R>
-requires isKeyedRecord<R> std::string difference(const R& a, const R& b);
-template <class T>
-std::string difference(const List<T>& a, const List<T>& b) {
-  if (a.size() != b.size()) return "length";
-  for (std::size_t i = 0; i < a.size(); ++i) {
-    if (const std::string inside = difference(a[i], b[i]); !inside.empty()) return inside;
+  std::string found;
+  if constexpr (Record<T>) {
+    FieldsOf<T>::List::forEach([&](auto field) {
+      if (!found.empty()) return;
+      found = difference(field.in(a), field.in(b));
+      if (!found.empty()) found = std::string(field.name) + " " + found;
+    });
+  } else if constexpr (requires { a.has_value(); }) {
+    if (a.has_value() != b.has_value()) return "presence";
+    if (a) found = difference(*a, *b);
+  } else if constexpr (requires { a.front(); }) {
+    if (a.size() != b.size()) return "length";
+    for (std::size_t i = 0; found.empty() && i < a.size(); ++i) found = difference(a[i], b[i]);
+  } else if (!(a == b)) {
+    found = "value";
   }
-  return "";
-}
-template <class T>
-std::string difference(const Optional<T>& a, const Optional<T>& b) {
-  if (a.has_value() != b.has_value()) return "presence";
-  return a ? difference(*a, *b) : "";
-}
-template <class R>
-requires isKeyedRecord<R> std::string difference(const R& a, const R& b) {
-  std::string first;
-  forEachField<R>([&](auto field) {
-    if (!first.empty()) return;
-    const std::string inside = difference(field.in(a), field.in(b));
-    if (!inside.empty()) first = std::string(field.name) + ": " + inside;
-  });
-  return first;
+  return found;
 }
 
 }  // namespace ironmoat::testing

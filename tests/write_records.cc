@@ -1,0 +1,79 @@
+// Writes generated records of the three kinds of message in both forms, for other readers:
+//
+//     write_records FOLDER
+//
+// A file is KIND-NUMBER.FORM. Two large payloads make a binary form's offsets and references wide.
+
+#include <cstdint>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <iostream>
+#include <iterator>
+#include <string>
+#include <string_view>
+#include <type_traits>
+#include <utility>
+
+#include "plist/encoder.h"
+#include "records/command_response.h"
+#include "records/message_payload.h"
+#include "records/web_tunnel.h"
+#include "support/generated_records.h"
+
+namespace ironmoat {
+
+template <class R>
+requires requires { typename R::CodingKeys; }
+struct testing::FieldsOf<R> {
+  using List = typename std::remove_const_t<decltype(records::Table<R>::rows)>::template Fields<R>;
+};
+
+namespace {
+
+template <class R>
+void writeRecord(const std::filesystem::path& name, const R& record) {
+  for (const auto form : {plist::Form::binary, plist::Form::xml}) {
+    const Data message = plist::PropertyListEncoder(form).encode(record);
+    std::ofstream file(name.string() + (form == plist::Form::xml ? ".xml" : ".binary"));
+    file.exceptions(std::ios::failbit | std::ios::badbit);
+    file << message.view() << std::flush;
+  }
+}
+
+template <class R>
+void writeKind(const std::filesystem::path& prefix) {
+  constexpr double kPresences[] = {0, 0.1, 0.5, 1};
+  for (std::uint64_t seed = 0; seed < 100; ++seed) {
+    testing::RecordGenerator generator(seed, kPresences[seed % std::size(kPresences)]);
+    writeRecord(prefix.string() + std::to_string(seed), generator.make<R>(2));
+  }
+}
+
+void writeAll(const std::filesystem::path& folder) {
+  writeKind<VeskCorvelProtocolPayload>(folder / "payload-");
+  writeKind<VeskCommandResponseSchema>(folder / "command-response-");
+  writeKind<VeskCommandWebTunnelResponseSchema>(folder / "web-tunnel-response-");
+
+  VeskCorvelProtocolPayload blob;
+  blob.payload = Data(std::string_view(std::string(1 << 20, '\xA5')));
+  writeRecord(folder / "payload-blob", blob);
+
+  VeskCorvelProtocolPayload texts;
+  List<String> urls;
+  for (int i = 0; i < 70'000; ++i) urls.emplace_back(std::string_view(std::to_string(i)));
+  texts.KibbDownloadUrlList = std::move(urls);
+  writeRecord(folder / "payload-texts", texts);
+}
+
+}  // namespace
+}  // namespace ironmoat
+
+int main(int argc, char** argv) {
+  if (argc != 2) {
+    std::cerr << "usage: write_records FOLDER\n";
+    return EXIT_FAILURE;
+  }
+  ironmoat::writeAll(argv[1]);
+  return EXIT_SUCCESS;
+}
