@@ -11,8 +11,9 @@ namespace ironmoat {
 
 /// A message was refused. The same bytes give the same error, always: retrying is useless.
 ///
-/// `what()` is a sentence for people. A service as it should be never repeats the sender's text in it
-/// or in `path()`; one that was taken over may say anything: escape both for a terminal or a log.
+/// `what()` is a sentence for people. A service as it should be never repeats the sender's text in
+/// it or in `path()`; one that was taken over may say anything: escape both for a terminal or a
+/// log.
 class DecodingError : public std::runtime_error {
  public:
   enum class Kind : std::uint8_t {
@@ -46,8 +47,8 @@ class ServiceError : public std::runtime_error {
   enum class Kind : std::uint8_t {
     crashed,      ///< the service died over this request
     timedOut,     ///< no reply within the deadline
-    unavailable,  ///< no service could be started or reached, or this one does not serve the request:
-                  ///< an output type it does not know, or a record that its host refused
+    unavailable,  ///< no service could be started or reached, or this one does not serve the
+                  ///< request: an output type it does not know, or a record that its host refused
   };
 
   ServiceError(Kind kind, const std::string& message) : std::runtime_error(message), kind_(kind) {}

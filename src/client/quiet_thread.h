@@ -1,8 +1,8 @@
 #pragma once
 
 #include <pthread.h>
-#include <csignal>
 
+#include <csignal>
 #include <thread>
 #include <utility>
 

@@ -5,8 +5,8 @@
 #include <span>
 #include <string>
 
-#include "inspect/options.h"
 #include "inspect/confinement_report.h"
+#include "inspect/options.h"
 #include "inspect/service_program.h"
 #include "inspect/terminal.h"
 #include "inspect/unpack_files.h"
