@@ -4,15 +4,12 @@
 #include <pthread.h>
 
 #include <functional>
-#include <string>
-#include <string_view>
 
 #include "frames/record_codec.h"
 #include "ironmoat/limits.h"
 #include "plist/encoder.h"
 #include "plist/property_list_decoder.h"
 #include "records/message_payload.h"
-#include "support/refusal.h"
 #include "unpackers/corvel_payload_unpacker.h"
 
 namespace ironmoat {
@@ -77,25 +74,6 @@ TEST(NestingTest, TheDeepestPayloadFitsInAMegabyteOfStack) {
       EXPECT_EQ(at->command, static_cast<Int>(kLevels));
     }
   });
-}
-
-TEST(NestingTest, OneLevelMoreIsRefusedInBothForms) {
-  const std::string tooDeep =
-      "limitExceeded: more than 512 dictionaries and arrays inside one another";
-  EXPECT_EQ(testing::refusalOf([] {
-              (void)plist::PropertyListEncoder(plist::Form::xml).encode(nested(kLevels + 1));
-            }),
-            tooDeep);
-  // In a value that no field takes, so that only the reader can see it.
-  for (const std::size_t arrays : {limits::nestedContainers - 1, limits::nestedContainers}) {
-    std::string xml = "<plist><dict><key>c</key><integer>1</integer><key>?</key>";
-    for (std::size_t i = 0; i < arrays; ++i) xml += "<array>";
-    for (std::size_t i = 0; i < arrays; ++i) xml += "</array>";
-    xml += "</dict></plist>";
-    const Data message{std::string_view(xml)};
-    EXPECT_EQ(testing::refusalOf([&] { (void)VeskCorvelPayloadUnpacker().unpack(message); }),
-              arrays < limits::nestedContainers ? "accepted" : tooDeep);
-  }
 }
 
 }  // namespace

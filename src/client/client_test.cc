@@ -9,8 +9,6 @@
 #include <atomic>
 #include <cerrno>
 #include <filesystem>
-#include <fstream>
-#include <random>
 #include <string>
 #include <thread>
 #include <vector>
@@ -199,34 +197,6 @@ TEST_F(ClientTest, OnlyTheRequestThatHangsTimesOut) {
   }
 }
 
-TEST_F(ClientTest, PoisonAmongAThousand) {
-  Client client(fake(300ms));
-  std::vector<Pending> all;
-  for (int i = 0; i < 1000; ++i) {
-    const std::string echo = "echo " + std::to_string(i);
-    all.push_back(submit(client, i == 100   ? "signal 9"
-                                 : i == 480 ? "ignore"
-                                 : i == 481 ? "exit 1"
-                                            : echo));
-  }
-  for (int i = 0; i < 1000; ++i) {
-    const std::string got = outcome(all[i]);
-    const std::string kind = i == 480 ? "timedOut" : "crashed";
-    const bool poison = i == 100 || i == 480 || i == 481;
-    EXPECT_EQ(got.substr(0, got.find(':')), poison ? kind : std::to_string(i));
-  }
-}
-
-TEST_F(ClientTest, BothDirectionsFull) {
-  Client::Options all = fake(60s);
-  all.maxBytesInFlight = std::size_t{128} << 20;
-  Client client(all);
-  std::vector<Pending> pending;
-  const std::string filler(std::size_t{8} << 20, ' ');
-  for (int i = 0; i < 12; ++i) pending.push_back(submit(client, "large 8000000" + filler));
-  for (auto& future : pending) EXPECT_EQ(future.get().token.value().size(), 8000000U);
-}
-
 TEST_F(ClientTest, BytesInFlightAreBounded) {
   Client::Options all = fake();
   all.maxBytesInFlight = 10000;
@@ -280,17 +250,6 @@ TEST_F(ClientTest, AServiceThatComesBackIsUsed) {
   for (int i = 0; i < 4; ++i) EXPECT_EQ(outcome(client, "echo 1").substr(0, 11), "unavailable");
   fakeCalled("replaced");
   EXPECT_EQ(outcome(client, "echo 1"), "1");
-}
-
-TEST_F(ClientTest, GoesWithRequestsInFlight) {
-  std::vector<Pending> left;
-  {
-    const Client unused(fake());
-    Client client(fake());
-    left.push_back(submit(client, "hang"));
-    for (int i = 0; i < 100; ++i) left.push_back(submit(client, "echo 1"));
-  }
-  for (auto& pending : left) EXPECT_EQ(outcome(pending), "unavailable: the client was destroyed");
 }
 
 TEST_F(ClientTest, TheServiceInheritsNothing) {
@@ -348,50 +307,6 @@ TEST_F(ClientTest, AForkedChildNeitherUsesNorKeepsTheService) {
   EXPECT_EQ(status, 0);
   ::close(done[0]);
   ::close(done[1]);
-}
-
-void killChildren() {
-  for (const auto& task : std::filesystem::directory_iterator("/proc/self/task")) {
-    std::ifstream file(task.path() / "children");
-    for (pid_t pid = 0; file >> pid;) ::kill(pid, SIGKILL);
-  }
-}
-
-TEST_F(ClientTest, KilledAtRandomTimesUnderLoad) {
-  using Clock = std::chrono::steady_clock;
-  Client client(fake());
-  const auto start = Clock::now();
-  EXPECT_EQ(outcome(client, "echo 1"), "1");
-  const auto spell = 8 * (Clock::now() - start);
-
-  std::atomic<bool> stop = false;
-  std::atomic<int> records = 0;
-  std::atomic<int> killed = 0;
-  std::atomic<int> wrong = 0;
-  std::vector<std::thread> threads;
-  for (int t = 0; t < 4; ++t) {
-    threads.emplace_back([&, t] {
-      for (int i = 0; !stop; ++i) {
-        const std::string number = std::to_string(i * 10 + t);
-        Pending other = submit(client, "echo " + number);
-        for (const auto& got : {outcome(client, "echo " + number), outcome(other)}) {
-          const bool named = got.find("was killed by SIGKILL") != std::string::npos;
-          ++(got == number ? records : named ? killed : wrong);
-        }
-      }
-    });
-  }
-  std::mt19937 random(1);
-  int kills = 0;
-  for (; kills < 200 && Clock::now() - start < 10s; ++kills) {
-    std::this_thread::sleep_for(spell * (random() % 1000) / 1000);
-    killChildren();
-  }
-  stop = true;
-  for (auto& thread : threads) thread.join();
-  EXPECT_EQ(wrong, 0);
-  EXPECT_GT(records, kills);
-  EXPECT_LT(killed, kills);
 }
 
 }  // namespace
