@@ -1,6 +1,7 @@
 #include "inspect/unpack_files.h"
 
 #include <algorithm>
+#include <chrono>
 #include <deque>
 #include <optional>
 #include <string>
@@ -40,13 +41,18 @@ Failure failureOf(const ServiceError& error) {
   return {nameOf(error.kind()), "", error.what(), noService ? cannotWork : someRefused};
 }
 
+/// A person can wait longer than a daemon, and would rather, on a busy machine, than be told
+/// nothing.
+constexpr std::chrono::seconds kPatience{10};
+
 class Run {
  public:
   Run(const Options& options, Terminal& terminal)
       : options_(options),
         terminal_(terminal),
         type_(*recordType(options.type)),
-        client_({.program = options.service.empty() ? serviceProgram() : options.service}) {}
+        client_({.program = options.service.empty() ? serviceProgram() : options.service,
+                 .deadline = kPatience}) {}
 
   ExitStatus unpackAll() {
     for (const std::string& file : options_.files) {
