@@ -35,14 +35,16 @@ namespace {
 using Arguments = std::array<long, 6>;
 
 /// How a child ended that ran `act`: "returned", an error's name as in "ENOENT", or a signal's.
-/// `act` returns what a system call does.
-std::string outcomeOf(const std::function<long()>& act) {
+/// `act` returns what a system call does. What it writes to standard error goes to `words`.
+std::string outcomeOf(const std::function<long()>& act, int words = open("/dev/null", O_WRONLY)) {
   const pid_t child = fork();
   if (child == 0) {
     alarm(10);
+    dup2(words, STDERR_FILENO);
     const long result = act();
     syscall(SYS_exit_group, result < 0 ? errno : 0);
   }
+  close(words);
   int status = 0;
   if (waitpid(child, &status, 0) != child) return "lost";
   if (WIFSIGNALED(status)) return std::string("SIG") + sigabbrev_np(WTERMSIG(status));
@@ -261,17 +263,37 @@ TEST_F(ConfinementTest, WhatThreadsOfAServerDoSurvives) {
 }
 
 TEST_F(ConfinementTest, AbortingIsToldFromAForbiddenCall) {
-  const auto quiet = [] { dup2(open("/dev/null", O_WRONLY), STDERR_FILENO); };
-  const auto outcome = [&](const std::function<void()>& end) {
-    return outcomeOf([&] {
-      quiet();
-      confine();
+  const auto outcome = [](const std::function<void()>& end) {
+    return confinedOutcomeOf([&] {
       end();
       return 0L;
     });
   };
   EXPECT_EQ(outcome([] { std::abort(); }), "SIGABRT");
   EXPECT_EQ(outcome([] { std::terminate(); }), "SIGABRT");
+}
+
+TEST_F(ConfinementTest, TheLastWordNamesAForbiddenCall) {
+  int ends[2];
+  ASSERT_EQ(pipe(ends), 0);
+  const auto act = [] {
+    sigset_t all;
+    sigfillset(&all);
+    pthread_sigmask(SIG_SETMASK, &all, nullptr);  // a thread that ends has done the same
+    confine();
+    return syscall(SYS_socket, 1, 1, 0);
+  };
+  EXPECT_EQ(outcomeOf(act), "SIGSYS") << "all signals blocked";
+  const auto socket = [] {
+    confine();
+    return syscall(SYS_socket, 1, 1, 0);
+  };
+  EXPECT_EQ(outcomeOf(socket, ends[1]), "SIGSYS");
+  char words[100] = {};
+  EXPECT_GT(read(ends[0], words, sizeof words - 1), 0);
+  EXPECT_EQ(words, "forbidden system call " + std::to_string(SYS_socket) + " (socket)\n");
+  close(ends[0]);
+  EXPECT_EQ(outcomeOf(socket, open("/tmp", O_TMPFILE | O_WRONLY, 0600)), "SIGSYS") << "to a file";
 }
 
 TEST_F(ConfinementTest, DescriptorsThatWereOpenAreClosed) {

@@ -2,6 +2,7 @@
 // seconds; `faults_test --full` takes the sizes and prints the figures of doc/faults.md.
 
 #include <sys/prctl.h>
+#include <sys/syscall.h>
 
 #include <map>
 #include <random>
@@ -128,8 +129,9 @@ TEST_F(FaultsTest, PoisonFailsAloneAmongAThousand) {
   constexpr auto kDeadline = frames::kSanitizedBuild ? 2000ms : 1000ms;
   const Poison crash = {"crash", "crashed: the service was killed by SIGABRT over this message"};
   const Poison stall = {"stall", "timedOut: no reply within " + std::to_string(kDeadline.count())};
-  const Poison forbidden = {
-      "forbidden", "crashed: the service was killed by SIGSYS (a system call that its confinement"};
+  const Poison forbidden = {"forbidden",
+                            "crashed: the service was killed by SIGSYS (forbidden system call " +
+                                std::to_string(SYS_getppid) + " (getppid)) over this message"};
   const Poison large = {"hold 2000", "limitExceeded"};  // fails too, but harms nobody
   const std::vector<Poison> rounds[] = {
       {crash, crash, stall}, {stall, crash, stall}, {crash, forbidden, forbidden, large}};

@@ -140,7 +140,7 @@ TEST_F(ClientTest, TheCulpritFailsAndItsNeighboursDoNot) {
     std::string service;
   } rows[] = {
       {"signal 10", "was killed by SIGUSR1 over this message"},
-      {"signal 31", "was killed by SIGSYS (a system call that its confinement forbids) over"},
+      {"words", "was killed by SIGABRT (last words of it) over this message"},
       {"exit 3", "exited with status 3 over this message"},
       {"close", "closed its connection over this message"},
       {"nextId", "sent a broken frame: a reply to no request over this message"},

@@ -20,6 +20,7 @@ namespace ironmoat::client {
 
 namespace {
 
+constexpr std::size_t kMostWords = 400;
 constexpr auto kPidfd = static_cast<idtype_t>(3);  // P_PIDFD, which older <sys/wait.h> lack
 
 [[noreturn]] void throwStartError(const std::string& program, int error) {
@@ -35,7 +36,7 @@ struct SpawnSettings {
   posix_spawnattr_t attributes;
   int error;
 
-  explicit SpawnSettings(int socket) {
+  SpawnSettings(int socket, int words) {
     posix_spawn_file_actions_init(&actions);
     posix_spawnattr_init(&attributes);
     sigset_t all;
@@ -47,9 +48,7 @@ struct SpawnSettings {
     posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF | POSIX_SPAWN_SETSIGMASK);
     error = posix_spawn_file_actions_adddup2(&actions, socket, STDIN_FILENO);
     if (error == 0) error = posix_spawn_file_actions_adddup2(&actions, socket, STDOUT_FILENO);
-    if (error == 0) {
-      error = posix_spawn_file_actions_addopen(&actions, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
-    }
+    if (error == 0) error = posix_spawn_file_actions_adddup2(&actions, words, STDERR_FILENO);
     if (error == 0) error = posix_spawn_file_actions_addclosefrom_np(&actions, STDERR_FILENO + 1);
   }
   SpawnSettings(const SpawnSettings&) = delete;
@@ -90,17 +89,24 @@ ServiceProcess ServiceProcess::start(const std::string& program) {
   }
   FileDescriptor ours(ends[0]);
   FileDescriptor theirs(ends[1]);
+  // The end that is read does not wait; the service's does, so that abort's words come whole.
+  if (::pipe2(ends, O_CLOEXEC) != 0) throwStartError(program, errno);
+  FileDescriptor words(ends[0]);
+  FileDescriptor theirWords(ends[1]);
   // Above the standard three, also in a daemon that has closed its own: otherwise the child's dup2
   // would overwrite what it is about to read.
-  for (FileDescriptor* end : {&ours, &theirs}) {
+  for (FileDescriptor* end : {&ours, &theirs, &words, &theirWords}) {
     if (end->get() > STDERR_FILENO) continue;
     const int moved = ::fcntl(end->get(), F_DUPFD_CLOEXEC, STDERR_FILENO + 1);
     if (moved < 0) throwStartError(program, errno);
     *end = FileDescriptor(moved);
   }
-  if (::fcntl(ours.get(), F_SETFL, O_NONBLOCK) != 0) throwStartError(program, errno);
+  if (::fcntl(ours.get(), F_SETFL, O_NONBLOCK) != 0 ||
+      ::fcntl(words.get(), F_SETFL, O_NONBLOCK) != 0) {
+    throwStartError(program, errno);
+  }
 
-  const SpawnSettings settings(theirs.get());
+  const SpawnSettings settings(theirs.get(), theirWords.get());
   if (settings.error != 0) throwStartError(program, settings.error);
   char* arguments[] = {const_cast<char*>(program.c_str()), nullptr};
   char* environment[] = {nullptr};
@@ -119,11 +125,12 @@ ServiceProcess ServiceProcess::start(const std::string& program) {
     }
     throwStartError(program, reason);
   }
-  return {std::move(ours), FileDescriptor(pidfd)};
+  return {std::move(ours), std::move(words), FileDescriptor(pidfd)};
 }
 
-ServiceProcess::ServiceProcess(FileDescriptor socket, FileDescriptor pidfd) noexcept
-    : socket_(std::move(socket)), pidfd_(std::move(pidfd)) {}
+ServiceProcess::ServiceProcess(FileDescriptor socket, FileDescriptor words,
+                               FileDescriptor pidfd) noexcept
+    : socket_(std::move(socket)), words_(std::move(words)), pidfd_(std::move(pidfd)) {}
 
 ServiceProcess::~ServiceProcess() {
   if (!pidfd_) return;
@@ -158,12 +165,32 @@ std::string ServiceProcess::lastWord(std::chrono::milliseconds grace) {
   if (!byItself) return "closed its connection";
   // The daemon's own wait calls, or its ignoring SIGCHLD, can have taken the status.
   if (result != 0) return "ended, and its status is lost";
-  if (info.si_code == CLD_EXITED) return exitWord(info.si_status);
-  const char* name = ::sigabbrev_np(info.si_status);
-  std::string word = "was killed by ";
-  word += name != nullptr ? std::string("SIG") + name : "signal " + std::to_string(info.si_status);
-  if (info.si_status == SIGSYS) word += " (a system call that its confinement forbids)";
+  std::string word;
+  if (info.si_code == CLD_EXITED) {
+    word = exitWord(info.si_status);
+  } else {
+    const char* name = ::sigabbrev_np(info.si_status);
+    word = "was killed by ";
+    word += name != nullptr ? std::string("SIG").append(name)
+                            : std::string("signal ").append(std::to_string(info.si_status));
+  }
+  if (const std::string words = wordsOnStandardError(); !words.empty()) {
+    word.append(" (").append(words).append(")");
+  }
   return word;
+}
+
+std::string ServiceProcess::wordsOnStandardError() const {
+  char text[kMostWords];
+  const ssize_t size = ::read(words_.get(), text, sizeof text);
+  std::string words;
+  for (ssize_t i = 0; i < size; ++i) {
+    const bool shows = text[i] > ' ' && text[i] <= '~';
+    if (shows) words += text[i];
+    if (!shows && !words.empty() && words.back() != ' ') words += ' ';
+  }
+  if (!words.empty() && words.back() == ' ') words.pop_back();
+  return words;
 }
 
 }  // namespace ironmoat::client

@@ -11,6 +11,8 @@
 #include <ctime>
 #include <initializer_list>
 
+#include "confinement/last_word.h"
+
 namespace ironmoat::confinement {
 
 namespace {
@@ -33,7 +35,8 @@ constexpr Argument has(unsigned index, std::uint64_t mask, std::uint64_t value) 
 
 class Filter {
  public:
-  Filter() noexcept : context_(::seccomp_init(SCMP_ACT_KILL_PROCESS)) {
+  /// Anything that no rule is about raises SIGSYS, before anything of it is done.
+  Filter() noexcept : context_(::seccomp_init(SCMP_ACT_TRAP)) {
     if (context_ == nullptr) {
       error_ = ENOSYS;
       return;
@@ -75,6 +78,7 @@ class Filter {
 }  // namespace
 
 bool filterSystemCalls() noexcept {
+  nameForbiddenCall();  // sigaction itself is forbidden afterwards, so that it stays
   Filter filter;
   // Requests in, replies out, last words. Waiting, when the two were made non-blocking, is done
   // with pselect because poll refuses everything under an open-files limit of 0.

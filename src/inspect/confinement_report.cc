@@ -96,6 +96,7 @@ std::string attempt(Act act) {
   if (child < 0) return "not tried: no child can be started";
   if (child == 0) {
     ::alarm(kTimeToAct);
+    ::dup2(::open("/dev/null", O_WRONLY), STDERR_FILENO);  // the fate says it all
     try {
       confinement::confine();
     } catch (const confinement::CannotConfine&) {

@@ -1,0 +1,15 @@
+# Writes FILE: a line {__NR_x, "x"}, for each system call that the compiler's headers know.
+function(ironmoat_list_system_calls FILE)
+  set(asking ${CMAKE_CURRENT_BINARY_DIR}/system_calls.cc)
+  file(WRITE ${asking} "#include <sys/syscall.h>\n")
+  execute_process(COMMAND ${CMAKE_CXX_COMPILER} -E -dM ${asking}
+    OUTPUT_VARIABLE macros COMMAND_ERROR_IS_FATAL ANY)
+  string(REGEX MATCHALL "#define __NR_[a-z0-9_]+ " macros "${macros}")
+  list(SORT macros)
+  set(lines "")
+  foreach(macro IN LISTS macros)
+    string(REGEX REPLACE "#define __NR_(.*) " "{__NR_\\1, \"\\1\"},\n" line "${macro}")
+    string(APPEND lines "${line}")
+  endforeach()
+  file(CONFIGURE OUTPUT ${FILE} CONTENT "${lines}" @ONLY)
+endfunction()
