@@ -1,14 +1,11 @@
 // Servers as processes, looked at from outside: what they report, what the kernel says of them,
 // what they do where they cannot be confined, and how they share their limit of memory.
 
-#include <fcntl.h>
 #include <grp.h>
 #include <gtest/gtest.h>
-#include <poll.h>
 #include <seccomp.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
-#include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -17,97 +14,19 @@
 #include <csignal>
 #include <filesystem>
 #include <fstream>
-#include <functional>
 #include <map>
 #include <memory>
-#include <optional>
 #include <string>
-#include <string_view>
 #include <thread>
 
 #include "confinement/confinement.h"
-#include "frames/frame.h"
-#include "frames/frame_assembler.h"
-#include "ironmoat/command_response.h"
+#include "support/spoken_to.h"
 
 namespace ironmoat {
 namespace {
 
 using frames::Status;
-
-/// A process that runs `program` with a socket as its standard input and output.
-class Child {
- public:
-  explicit Child(const std::function<void()>& program, int socketFlags = 0) {
-    int ends[2];
-    EXPECT_EQ(socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends), 0);
-    std::fflush(nullptr);
-    pid_ = fork();
-    if (pid_ == 0) {
-      if (socketFlags != 0) fcntl(ends[1], F_SETFL, socketFlags);
-      dup2(ends[1], STDIN_FILENO);
-      dup2(ends[1], STDOUT_FILENO);
-      program();
-      _exit(127);
-    }
-    close(ends[1]);
-    socket_ = ends[0];
-  }
-  Child(const Child&) = delete;
-  Child& operator=(const Child&) = delete;
-  ~Child() {
-    kill(pid_, SIGKILL);
-    static_cast<void>(end());
-    close(socket_);
-  }
-
-  [[nodiscard]] pid_t pid() const { return pid_; }
-
-  void send(std::string_view bytes) {
-    while (!bytes.empty()) {
-      const ssize_t count = ::send(socket_, bytes.data(), bytes.size(), MSG_NOSIGNAL);
-      ASSERT_GT(count, 0);
-      bytes.remove_prefix(static_cast<std::size_t>(count));
-    }
-  }
-  void request(std::uint64_t id, std::string_view message) {
-    BlockBuilder frame;
-    frames::appendRequest(frame, id, VeskCommandResponse::schemaName, message);
-    send({frame.bytes(), frame.size()});
-  }
-  void endInput() const { shutdown(socket_, SHUT_WR); }
-
-  /// The next frame's body; nothing at the end, or after 20 seconds.
-  std::optional<Data> receive() {
-    for (;;) {
-      if (auto body = assembler_.next()) return body;
-      pollfd ready = {socket_, POLLIN, 0};
-      if (poll(&ready, 1, 20'000) <= 0) return std::nullopt;
-      const auto room = assembler_.room();
-      const ssize_t count = read(socket_, room.data(), room.size());
-      if (count <= 0) return std::nullopt;
-      assembler_.commit(static_cast<std::size_t>(count));
-    }
-  }
-  std::uint32_t reportedConfinement() {
-    const auto body = receive();
-    return body ? frames::parseHello(*body).confinement : 0;
-  }
-  /// Waits for the process; what waitpid gives.
-  int end() {
-    if (!status_) {
-      status_ = -1;
-      waitpid(pid_, &*status_, 0);
-    }
-    return *status_;
-  }
-
- private:
-  pid_t pid_ = 0;
-  int socket_ = -1;
-  std::optional<int> status_;
-  frames::FrameAssembler assembler_{frames::kMaxReplyBody, Sharing::anyThread};
-};
+using testing::SpokenTo;
 
 /// By descriptor, for a user who may not search the folder that it is in.
 void run(const char* program) {
@@ -146,12 +65,12 @@ rlim_t limitOf(pid_t pid, __rlimit_resource resource) {
 }
 
 TEST(ConfinedService, ReportsWhatItsBuildRequires) {
-  const std::uint32_t bits = Child(runService).reportedConfinement();
+  const std::uint32_t bits = SpokenTo(runService).reportedConfinement();
   EXPECT_EQ(bits & frames::kRequiredConfinement, frames::kRequiredConfinement);
 }
 
 TEST_F(FullyConfinedService, IsConfinedToTheKernelToo) {
-  Child service(runService);
+  SpokenTo service(runService);
   ASSERT_TRUE(service.receive());
   EXPECT_EQ(limitOf(service.pid(), RLIMIT_CORE), 0U);
   EXPECT_EQ(limitOf(service.pid(), RLIMIT_FSIZE), 0U);
@@ -172,7 +91,7 @@ TEST_F(FullyConfinedService, IsConfinedToTheKernelToo) {
 TEST_F(FullyConfinedService, WorksAsAnOrdinaryUser) {
   if (geteuid() != 0) GTEST_SKIP() << "the other tests show it: this user is an ordinary one";
   constexpr id_t kNobody = 65534;
-  Child service([] {
+  SpokenTo service([] {
     if (setgroups(0, nullptr) == 0 && setgid(kNobody) == 0 && setuid(kNobody) == 0) runService();
   });
   const std::uint32_t bits = service.reportedConfinement();
@@ -201,7 +120,7 @@ TEST_F(FullyConfinedService, RefusesToServeUnconfined) {
            Denied{SCMP_SYS(prlimit64), 1, RLIMIT_AS, 71},
            Denied{SCMP_SYS(prctl), 0, PR_SET_PDEATHSIG, 73},
        }) {
-    Child service([&] {
+    SpokenTo service([&] {
       scmp_filter_ctx filter = seccomp_init(SCMP_ACT_ALLOW);
       const scmp_arg_cmp same = {denied.argument, SCMP_CMP_EQ, denied.value, 0};
       seccomp_rule_add_array(filter, SCMP_ACT_ERRNO(EPERM), denied.call, 1, &same);
@@ -215,9 +134,9 @@ TEST_F(FullyConfinedService, RefusesToServeUnconfined) {
 }
 
 TEST(ConfinedService, EndsWithTheThreadThatStartedIt) {
-  std::unique_ptr<Child> service;
+  std::unique_ptr<SpokenTo> service;
   std::thread starter([&] {
-    service = std::make_unique<Child>(runService);
+    service = std::make_unique<SpokenTo>(runService);
     EXPECT_TRUE(service->receive());
   });
   starter.join();
@@ -226,7 +145,7 @@ TEST(ConfinedService, EndsWithTheThreadThatStartedIt) {
 }
 
 TEST_F(FullyConfinedService, MemoryIsSharedAndRefusedToWhoWantsItAllAlone) {
-  Child server(runTestServer);
+  SpokenTo server(runTestServer);
   ASSERT_TRUE(server.receive());
   // Any two of the small ones are too much together.
   constexpr std::uint64_t kRequests = 40;
@@ -248,7 +167,7 @@ TEST_F(FullyConfinedService, MemoryIsSharedAndRefusedToWhoWantsItAllAlone) {
 }
 
 TEST(ConfinedService, NonBlockingDescriptorsAndStopsDoNotMatter) {
-  Child server(runTestServer, O_NONBLOCK);
+  SpokenTo server(runTestServer, O_NONBLOCK);
   ASSERT_TRUE(server.receive());
   const std::string large(std::size_t{8} << 20, 'x');
   server.request(1, large);

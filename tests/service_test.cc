@@ -5,18 +5,15 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <csignal>
 #include <cstdint>
 #include <map>
 #include <string>
 #include <string_view>
 #include <thread>
 
-#include "frames/frame.h"
-#include "frames/frame_assembler.h"
 #include "frames/record_codec.h"
-#include "ironmoat/command_response.h"
 #include "ironmoat/limits.h"
+#include "support/spoken_to.h"
 
 namespace ironmoat {
 namespace {
@@ -30,55 +27,24 @@ struct Outcome {
   int status = -1;
 };
 
-/// Runs the service over two pipes, writes `input`, closes, and collects all that comes back.
+/// Starts the service, writes `input`, closes, and collects all that comes back.
 Outcome converse(std::string_view input) {
-  int toService[2];
-  int fromService[2];
-  EXPECT_EQ(pipe(toService), 0);
-  EXPECT_EQ(pipe(fromService), 0);
-  const pid_t child = fork();
-  if (child == 0) {
-    dup2(toService[0], 0);
-    dup2(fromService[1], 1);
-    for (const int descriptor : {toService[0], toService[1], fromService[0], fromService[1]}) {
-      close(descriptor);
-    }
-    execl(IRONMOAT_SERVICE, IRONMOAT_SERVICE, nullptr);
-    _exit(127);
-  }
-  close(toService[0]);
-  close(fromService[1]);
+  testing::SpokenTo service([] { execl(IRONMOAT_SERVICE, IRONMOAT_SERVICE, nullptr); });
   std::thread writer([&] {
-    while (!input.empty()) {
-      const ssize_t count = write(toService[1], input.data(), input.size());
-      if (count <= 0) break;
-      input.remove_prefix(static_cast<std::size_t>(count));
-    }
-    close(toService[1]);
+    service.send(input);
+    service.endInput();
   });
   Outcome outcome;
-  frames::FrameAssembler assembler(frames::kMaxReplyBody, Sharing::anyThread);
-  bool greeted = false;
-  while (true) {
-    const auto room = assembler.room();
-    const ssize_t count = read(fromService[0], room.data(), room.size());
-    if (count <= 0) break;
-    assembler.commit(static_cast<std::size_t>(count));
-    while (const auto body = assembler.next()) {
-      if (!greeted) {
-        outcome.hello = frames::parseHello(*body);
-        greeted = true;
-        continue;
-      }
-      Reply reply = frames::parseReply(*body);
-      outcome.replies.emplace(reply.id, std::move(reply));
-    }
+  const auto hello = service.receive();
+  EXPECT_TRUE(hello);
+  if (hello) outcome.hello = frames::parseHello(*hello);
+  while (const auto body = service.receive()) {
+    Reply reply = frames::parseReply(*body);
+    outcome.replies.emplace(reply.id, std::move(reply));
   }
-  EXPECT_TRUE(greeted);
-  EXPECT_FALSE(assembler.midFrame());
+  EXPECT_FALSE(service.midFrame());
   writer.join();
-  close(fromService[0]);
-  EXPECT_EQ(waitpid(child, &outcome.status, 0), child);
+  outcome.status = service.end();
   return outcome;
 }
 
@@ -98,12 +64,7 @@ Int commandOf(const Reply& reply) {
   return frames::decodeRecord<VeskCommandResponse>(reply.body).command;
 }
 
-class ServiceTest : public ::testing::Test {
- protected:
-  static void SetUpTestSuite() { std::signal(SIGPIPE, SIG_IGN); }
-};
-
-TEST_F(ServiceTest, GreetsAndEndsAtTheEndOfInput) {
+TEST(ServiceTest, GreetsAndEndsAtTheEndOfInput) {
   const Outcome outcome = converse("");
   frames::Hello expected = frames::Hello::ours();
   expected.confinement = outcome.hello.confinement;
@@ -112,7 +73,7 @@ TEST_F(ServiceTest, GreetsAndEndsAtTheEndOfInput) {
   EXPECT_EQ(outcome.status, 0);
 }
 
-TEST_F(ServiceTest, AnswersEachOfManyRequestsOnce) {
+TEST(ServiceTest, AnswersEachOfManyRequestsOnce) {
   std::string input;
   constexpr int kRequests = 2000;
   for (int i = 0; i < kRequests; ++i) {
@@ -135,7 +96,7 @@ TEST_F(ServiceTest, AnswersEachOfManyRequestsOnce) {
   }
 }
 
-TEST_F(ServiceTest, BadRequestsGetAnErrorAndTheNextIsServed) {
+TEST(ServiceTest, BadRequestsGetAnErrorAndTheNextIsServed) {
   const std::string shortBody = request(7, "VeskCommandResponse", "");
   std::string lyingName = request(8, "VeskCommandResponse", "");
   lyingName[12] = '\xFF';                      // the name claims to be longer than the frame
@@ -153,7 +114,7 @@ TEST_F(ServiceTest, BadRequestsGetAnErrorAndTheNextIsServed) {
   EXPECT_EQ(commandOf(reply(9)), 9);
 }
 
-TEST_F(ServiceTest, AnOverLongFrameEndsTheConnectionInOrder) {
+TEST(ServiceTest, AnOverLongFrameEndsTheConnectionInOrder) {
   const std::string first = request(1, "VeskCommandResponse", response(1));
   const Outcome outcome =
       converse(first + std::string("\xFF\xFF\xFF\xFF", 4) + std::string(100000, 'x') + first);
@@ -162,7 +123,7 @@ TEST_F(ServiceTest, AnOverLongFrameEndsTheConnectionInOrder) {
   EXPECT_EQ(outcome.replies.count(0), 1U);
 }
 
-TEST_F(ServiceTest, AFrameCutShortIsAnEndOfInput) {
+TEST(ServiceTest, AFrameCutShortIsAnEndOfInput) {
   const std::string whole = request(1, "VeskCommandResponse", response(1));
   for (const std::size_t length : {std::size_t{1}, std::size_t{4}, whole.size() - 1}) {
     const Outcome outcome = converse(whole + whole.substr(0, length));
@@ -171,7 +132,7 @@ TEST_F(ServiceTest, AFrameCutShortIsAnEndOfInput) {
   }
 }
 
-TEST_F(ServiceTest, LargeMessagesUpToTheLimitAreServed) {
+TEST(ServiceTest, LargeMessagesUpToTheLimitAreServed) {
   const std::string padding(limits::messageBytes - response(1).size(), ' ');
   const Outcome outcome = converse(request(1, "VeskCommandResponse", response(1) + padding) +
                                    request(2, "VeskCommandResponse", response(2)));
