@@ -15,6 +15,7 @@
 
 #include "ironmoat/command_response.h"
 #include "ironmoat/limits.h"
+#include "support/leaves_nothing.h"
 
 namespace ironmoat {
 namespace {
@@ -33,7 +34,8 @@ Client::Options fake(std::chrono::milliseconds deadline = 20s) {
 }
 
 std::filesystem::path ownFolder() {
-  return std::filesystem::path(testing::TempDir()) / ("client_test." + std::to_string(::getpid()));
+  return std::filesystem::path(::testing::TempDir()) /
+         ("client_test." + std::to_string(::getpid()));
 }
 
 /// The fake service under another name, which decides how it starts.
@@ -75,28 +77,9 @@ void expectEchoes(std::vector<Pending>& all) {
   for (std::size_t i = 0; i < all.size(); ++i) EXPECT_EQ(outcome(all[i]), std::to_string(i));
 }
 
-/// Each test leaves descriptors, threads and children as they were.
-class ClientTest : public testing::Test {
+class ClientTest : public testing::LeavesNothing {
  public:
-  // Sanitizers start a thread of their own with the first thread.
-  static void SetUpTestSuite() {
-    std::thread([] {}).join();
-  }
   static void TearDownTestSuite() { std::filesystem::remove_all(ownFolder()); }
-  ~ClientTest() override {
-    EXPECT_EQ(entries("/proc/self/fd"), descriptors_);
-    EXPECT_EQ(entries("/proc/self/task"), threads_);
-    EXPECT_EQ(::waitpid(-1, nullptr, WNOHANG), -1) << "a child was left";
-  }
-
- private:
-  static std::size_t entries(const char* folder) {
-    const auto all = std::filesystem::directory_iterator(folder);
-    return static_cast<std::size_t>(std::distance(begin(all), end(all)));
-  }
-
-  std::size_t descriptors_ = entries("/proc/self/fd");
-  std::size_t threads_ = entries("/proc/self/task");
 };
 
 TEST_F(ClientTest, EachKindOfReplyIsItsOutcome) {

@@ -2,7 +2,6 @@
 
 #include <gtest/gtest.h>
 #include <signal.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -13,7 +12,6 @@
 #include <filesystem>
 #include <fstream>
 #include <future>
-#include <iterator>
 #include <mutex>
 #include <string>
 #include <thread>
@@ -23,6 +21,7 @@
 #include "frames/confinement_bits.h"
 #include "ironmoat/client.h"
 #include "ironmoat/command_response.h"
+#include "support/leaves_nothing.h"
 
 /// A client under load, a service that is killed, and what comes of it.
 namespace ironmoat::testing {
@@ -37,27 +36,7 @@ inline int sized(int usual, int full) {
   return fullSize ? full : frames::kSanitizedBuild ? std::max(usual / 5, 2) : usual;
 }
 
-/// Each test leaves descriptors, threads and children as they were.
-class FaultsTest : public ::testing::Test {
- public:
-  static void SetUpTestSuite() {
-    std::thread([] {}).join();  // sanitizers start a thread of their own with the first
-  }
-  ~FaultsTest() override {
-    EXPECT_EQ(entries("/proc/self/fd"), descriptors_);
-    EXPECT_EQ(entries("/proc/self/task"), threads_);
-    EXPECT_EQ(::waitpid(-1, nullptr, WNOHANG), -1) << "a child was left";
-  }
-
- private:
-  static std::ptrdiff_t entries(const char* folder) {
-    const auto all = std::filesystem::directory_iterator(folder);
-    return std::distance(begin(all), end(all));
-  }
-
-  std::ptrdiff_t descriptors_ = entries("/proc/self/fd");
-  std::ptrdiff_t threads_ = entries("/proc/self/task");
-};
+using FaultsTest = LeavesNothing;
 
 inline Client::Options optionsFor(const char* program, std::chrono::milliseconds deadline = 20s) {
   Client::Options options;
