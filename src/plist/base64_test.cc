@@ -7,10 +7,10 @@
 namespace ironmoat::plist {
 namespace {
 
-std::string decoded(std::string_view text) {
+std::string decoded(std::string_view text, Base64Way way = fastestBase64Way()) {
   BlockBuilder out;
   out.append("before:");
-  const auto wrong = decodeBase64(text, out);
+  const auto wrong = decodeBase64(text, out, way);
   std::string result(out.bytes(), out.size());
   return wrong ? result + " wrong at " + std::to_string(*wrong) : result;
 }
@@ -36,6 +36,7 @@ TEST(Base64Test, DecodesStrictly) {
   };
   for (const auto& row : rows) {
     EXPECT_EQ(decoded(row.text), "before:" + std::string(row.expected)) << row.text;
+    EXPECT_EQ(decoded(row.text, Base64Way::tables), "before:" + std::string(row.expected));
   }
 }
 
@@ -48,8 +49,21 @@ TEST(Base64Test, EveryByteAndLengthComesBackWithWhiteSpaceAnywhere) {
     EXPECT_EQ(text.size(), (bytes.size() + 2) / 3 * 4);
     EXPECT_EQ(decoded(text), "before:" + bytes);
     const std::size_t at = text.empty() ? 0 : static_cast<std::size_t>(length) * 7 % text.size();
-    EXPECT_EQ(decoded(text.substr(0, at) + "\r\n\t" + text.substr(at)), "before:" + bytes);
+    const std::string spaced = text.substr(0, at) + "\r\n\t" + text.substr(at);
+    EXPECT_EQ(decoded(spaced), "before:" + bytes);
+    EXPECT_EQ(decoded(spaced, Base64Way::tables), "before:" + bytes);
     bytes.push_back(static_cast<char>(length * 37));
+  }
+}
+
+TEST(Base64Test, BothWaysJudgeEveryByteInEveryPlaceAlike) {
+  const std::string good = "Vesk+/09azAZQUJDREVGR0hJSktMTU5PUFFSU1RVVldY";
+  for (std::size_t place = 0; place < good.size(); ++place) {
+    for (int byte = 0; byte < 256; ++byte) {
+      std::string text = good;
+      text[place] = static_cast<char>(byte);
+      EXPECT_EQ(decoded(text), decoded(text, Base64Way::tables)) << place << " " << byte;
+    }
   }
 }
 

@@ -268,6 +268,8 @@ void XmlReader::data(bool empty) {
   if (!empty) {
     const std::string_view rest = in_.rest();
     const std::string_view plain = rest.substr(0, rest.find('<'));
+    // A third more than it takes: what comes after a large value does not move it (a tenth).
+    side.reserve(plain.size());
     const std::optional<std::size_t> wrong = decodeBase64(plain, side);
     const bool atEndTag = rest.substr(plain.size()).starts_with("</");
     if (atEndTag && !(wrong && rest[*wrong] == '&')) {
