@@ -36,7 +36,10 @@ std::string outcome(const Data& message, bool& accepted) {
     accepted = true;
     return {block->bytes(), block->size()};
   } catch (const DecodingError& error) {
-    return std::string(nameOf(error.kind())) + " " + error.path() + " " + error.what();
+    const std::uint64_t offset = error.offset().value_or(0);
+    require(offset <= message.size());
+    return std::string(nameOf(error.kind())) + " " + error.path() + " " + error.what() + " " +
+           std::to_string(offset);
   }
 }
 

@@ -32,7 +32,9 @@ class DecodingError : public std::runtime_error {
   /// Where, in wire keys: `mml[1].dtl[0].U`; empty for the message itself; for a missing key the
   /// path that it would have.
   [[nodiscard]] const std::string& path() const noexcept { return path_; }
-  /// Byte of the message at which it stops being a property list.
+  /// Byte of the message at which it stops being a property list; for any other error where the
+  /// value at fault begins, which for a missing key is the dictionary without it. None where no one
+  /// place is at fault: the message is too long, nested too deep, or takes too much memory.
   [[nodiscard]] std::optional<std::uint64_t> offset() const noexcept { return offset_; }
 
  private:

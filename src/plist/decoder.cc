@@ -1,8 +1,22 @@
 #include "plist/decoder.h"
 
+#include <algorithm>
 #include <vector>
 
+#include "plist/place.h"
+
 namespace ironmoat::plist {
+
+namespace {
+
+char lowered(char c) noexcept { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + 32) : c; }
+
+bool equalsIgnoringCase(std::string_view a, std::string_view b) noexcept {
+  return std::equal(a.begin(), a.end(), b.begin(), b.end(),
+                    [](char x, char y) { return lowered(x) == lowered(y); });
+}
+
+}  // namespace
 
 std::string Decoder::path() const {
   std::vector<const Decoder*> way;
@@ -19,25 +33,37 @@ std::string Decoder::path() const {
   return path;
 }
 
+std::optional<std::uint64_t> Decoder::offset() const {
+  if (budget_.message == nullptr) return std::nullopt;
+  return placeOf(node_, *budget_.message);
+}
+
 void Decoder::failMismatch(Kind expected) const {
   std::string sentence("expected ");
   sentence.append(nameOf(expected)).append(", found ").append(nameOf(node().kind));
-  throw DecodingError(DecodingError::Kind::typeMismatch, path(), sentence);
+  throw DecodingError(DecodingError::Kind::typeMismatch, path(), sentence, offset());
 }
 
 void Decoder::failOutOfRange() const {
   throw DecodingError(DecodingError::Kind::outOfRange, path(),
-                      "integer does not fit in 64 bits with a sign");
+                      "integer does not fit in 64 bits with a sign", offset());
 }
 
 void Decoder::failMissing(std::string_view key) const {
-  throw DecodingError(DecodingError::Kind::keyNotFound, Decoder(*this, key, node_).path(),
-                      "required key is missing");
+  std::string sentence("required key is missing");
+  const auto keys = document_.keys(node());
+  if (std::any_of(keys.begin(), keys.end(), [&](NodeIndex other) {
+        return equalsIgnoringCase(document_.text(document_.node(other)), key);
+      })) {
+    sentence += "; one that differs from it only in case is there";
+  }
+  throw DecodingError(DecodingError::Kind::keyNotFound, Decoder(*this, key, node_).path(), sentence,
+                      offset());
 }
 
 void Decoder::failLimit(const char* what, std::size_t limit, const char* unit) const {
   throw DecodingError(DecodingError::Kind::limitExceeded, path(),
-                      what + std::to_string(limit) + unit);
+                      what + std::to_string(limit) + unit, offset());
 }
 
 }  // namespace ironmoat::plist

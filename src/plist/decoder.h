@@ -17,11 +17,13 @@
 
 namespace ironmoat::plist {
 
-/// What decoding one message may still cost; see ironmoat/limits.h.
+/// What the decoders of one message share: what it may still cost, see ironmoat/limits.h, and its
+/// bytes, in which errors name a place.
 struct Budget {
   std::size_t recordBytes = limits::recordBytes;
   std::size_t deliveredBytes = limits::deliveredBytes;
   std::size_t scannedEntries = limits::scannedEntries;
+  const Data* message = nullptr;  ///< none: errors have no offset
 };
 
 template <class Keys>
@@ -90,6 +92,7 @@ class Decoder {
   }
   [[noreturn]] void failLimit(const char* what, std::size_t limit, const char* unit) const;
   [[nodiscard]] std::string path() const;
+  [[nodiscard]] std::optional<std::uint64_t> offset() const;
 
   const Document& document_;
   Budget& budget_;

@@ -17,7 +17,7 @@ class PropertyListDecoder {
   [[nodiscard]] R decode(const Data& message) const {
     Document document;
     read(message, document);
-    Budget budget;
+    Budget budget{.message = &message};
     const Decoder decoder(document, budget);
     return R::decode(decoder);
   }

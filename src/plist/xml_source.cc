@@ -92,9 +92,9 @@ void XmlSource::checkEncoding(std::string_view name, const char* at) const {
   if (plain != message_.size()) throw malformed("not in the encoding that it declares", plain);
 }
 
-void XmlSource::refuse(const char* reason, const char* at) const {
+std::uint64_t XmlSource::offsetInMessage(const char* at) const noexcept {
   const auto wanted = static_cast<std::size_t>(at - text_.data());
-  if (!utf16_) throw malformed(reason, message_.size() - text_.size() + wanted);
+  if (!utf16_) return message_.size() - text_.size() + wanted;
   std::size_t unit = 0;
   for (std::size_t passed = 0; passed < wanted; ++unit) {
     const std::uint32_t c = utf16Unit(unit);
@@ -102,7 +102,11 @@ void XmlSource::refuse(const char* reason, const char* at) const {
     const bool half = isHighSurrogate(c) || isLowSurrogate(c);
     passed += c < 0x80 ? 1 : c < 0x800 || half ? 2 : 3;
   }
-  throw malformed(reason, kUtf16MarkSize + 2 * unit);
+  return kUtf16MarkSize + 2 * unit;
+}
+
+void XmlSource::refuse(const char* reason, const char* at) const {
+  throw malformed(reason, offsetInMessage(at));
 }
 
 }  // namespace ironmoat::plist

@@ -31,7 +31,9 @@ class XmlSource {
   /// Refuses the message when it is not in the encoding that its declaration names; `at` is where.
   void checkEncoding(std::string_view name, const char* at) const;
 
-  /// Throws `malformed` for the place `at` of the text, as an offset into the message.
+  /// The place `at` of the text, as an offset into the message.
+  [[nodiscard]] std::uint64_t offsetInMessage(const char* at) const noexcept;
+  /// Throws `malformed` for that place.
   [[noreturn]] void refuse(const char* reason, const char* at) const;
 
  private:

@@ -1,0 +1,57 @@
+#include "plist/place.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <span>
+
+#include "plist/binary_format.h"
+#include "plist/xml_scanner.h"
+#include "plist/xml_source.h"
+
+namespace ironmoat::plist {
+
+namespace {
+
+std::uint64_t bigEndian(std::span<const std::uint8_t> bytes) noexcept {
+  std::uint64_t value = 0;
+  for (const std::uint8_t byte : bytes) value = value << 8 | byte;
+  return value;
+}
+
+/// A node has the place in the document that its object has in the table. All sizes and offsets
+/// were proven when the message was read.
+std::uint64_t placeInBinary(NodeIndex node, std::span<const std::uint8_t> message) {
+  const auto trailer = message.last(binary::kTrailerSize);
+  const std::size_t offsetSize = trailer[6];
+  const std::uint64_t table = bigEndian(trailer.last(8));
+  return bigEndian(message.subspan(table + node * offsetSize, offsetSize));
+}
+
+/// Every element but the root's own is one node, in the order of the start tags.
+std::uint64_t placeInXml(NodeIndex node, const Data& message) {
+  const XmlSource source(message);
+  XmlScanner in(source);
+  in.skipProlog();
+  in.take("<plist");
+  if (in.skipSpace() && in.take("version")) in.takeAttributeValue();  // which may hold a '<'
+  while (!in.atEnd()) {
+    if (in.peek() != '<') {
+      in.advance(std::min(in.rest().find('<'), in.rest().size()));
+    } else if (in.take("<![CDATA[")) {
+      in.takeUntil("]]>");
+    } else if (!in.skipMarkup()) {
+      if (in.peek(1) != '/' && node-- == 0) break;
+      in.advance(1);
+    }
+  }
+  return source.offsetInMessage(in.at());
+}
+
+}  // namespace
+
+std::uint64_t placeOf(NodeIndex node, const Data& message) {
+  if (message.view().starts_with("bplist")) return placeInBinary(node, message.bytes());
+  return placeInXml(node, message);
+}
+
+}  // namespace ironmoat::plist
