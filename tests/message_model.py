@@ -76,6 +76,8 @@ class Model:
 
 def shown(line):
     """A line of vesk-unpack as an outcome."""
-    if "error" in line and not line["error"].pop("message"):
+    if "error" not in line:
+        return {"record": line["record"]}
+    if not line["error"]["message"]:
         raise AssertionError("an error without a message")
-    return {name: line[name] for name in line if name != "file"}
+    return {"error": {name: line["error"][name] for name in ("kind", "path")}}

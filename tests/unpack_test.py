@@ -89,7 +89,9 @@ class CommandLine(InFolder):
     def test_exit_status_and_lines(self):
         good = '{"file": "good", "record": {"command": 5, "applicationId": "é"}}\n'
         bad = ('{"file": "bad", "error": {"kind": "typeMismatch", "path": "U", '
-               '"message": "expected data, found string"}}\n')
+               '"message": "expected data, found string", '
+               f'"offset": {xml({"c": 5, "U": "text"}).index(b"<string>")}, '
+               '"line": 8, "column": 2}}\n')
         missing = ('{"file": "missing", "error": {"kind": "unreadable", "path": "", '
                    '"message": "No such file or directory"}}\n')
         folder = ('{"file": ".", "error": {"kind": "unreadable", "path": "", '
@@ -115,7 +117,7 @@ class CommandLine(InFolder):
         self.assertEqual([line["file"] for line in lines_of(result)], ["good", "-", "bad"])
 
     def test_wrong_usage_reads_nothing(self):
-        for arguments in (["--nonsense"], ["--format"], ["--type", "letter"], ["-", "-"]):
+        for arguments in (["-q", "--summary"], ["--schema=payload"], ["--nonsense"], ["--format"], ["--type", "letter"], ["-", "-"]):
             result = unpack("good", *arguments)
             self.assertEqual((result.returncode, result.stdout), (2, b""))
             self.assertIn(b"--help", result.stderr)
@@ -163,6 +165,143 @@ class CommandLine(InFolder):
             self.assertIn(b"standard output", result.stderr)
 
 
+class Places(InFolder):
+    """Where a message is wrong is told alike for both forms and all encodings."""
+
+    def error(self, content, *arguments):
+        return lines_of(unpack("--format=json", *arguments, input=content))[0]["error"]
+
+    def test_offsets_are_those_of_the_value_at_fault(self):
+        body = ('<plist version=">1"><dict><!-- <dict> --><key>c</key><integer>5</integer>'
+                '<key><![CDATA[<s>]]></key><?a <b>?><array ><data/><true/></array>'
+                '<key>é&lt;</key><dict/>\n%s</dict></plist>')
+        rows = [
+            ("<key>U</key>", "<string>x</string>", "typeMismatch", "U"),
+            ("<key>U</key>\r\n\t", "<array/>", "typeMismatch", "U"),
+            ("<key>s</key>", "<integer>9223372036854775808</integer>", "outOfRange", "s"),
+            ("<key>Dc</key>", "<date>2020-01-01T00:00:00Z</date>", "typeMismatch", "Dc"),
+            ("<key>mml</key><array><dict><key>c</key><integer>1</integer></dict>", "<dict/></array>",
+             "keyNotFound", "mml[1].c"),
+        ]
+        for before, value, kind, path in rows:
+            text = body % (before + value)
+            ahead = text[:text.index(before) + len(before)]
+            for mark, encoding in (("", "utf-8"), ("\ufeff", "utf-8"), ("\ufeff", "utf-16-le"),
+                                   ("\ufeff", "utf-16-be")):
+                error = self.error((mark + text).encode(encoding), "--type=payload")
+                del error["message"]
+                self.assertEqual(error, {
+                    "kind": kind, "path": path, "offset": len((mark + ahead).encode(encoding)),
+                    "line": 1 + ahead.count("\n"), "column": len(ahead) - ahead.rindex("\n")})
+
+    def test_offsets_in_the_binary_form(self):
+        filler = {str(number): number for number in range(300)}  # for offsets of two bytes
+        for message, path, marker in (({"c": 5, "U": "found me"}, "U", b"\x58found me"),
+                                      ({"c": 5, "s": 2**64 - 1}, "s", b"\x14" + bytes(8)),
+                                      ({"mml": [{"C": 77}]}, "c", b"\xdf\x11")):
+            content = binary({**filler, **message})
+            error = self.error(content, "--type=payload")
+            self.assertEqual((error["path"], error["offset"]), (path, content.index(marker)))
+            self.assertNotIn("line", error)
+
+    def test_a_key_in_the_wrong_case_is_hinted_at(self):
+        rows = [({"C": 5}, True), ({"d": 1}, False), ({"cc": 1}, False), ({"\u0421": 1}, False)]
+        for message, hinted in rows:
+            for content in (binary(message), xml(message)):
+                error = self.error(content)
+                self.assertEqual((error["kind"], "only in case" in error["message"]),
+                                 ("keyNotFound", hinted))
+
+
+class Types(InFolder):
+    def test_schemas_are_the_tables(self):
+        model = Model(DUMP_TABLES)
+
+        def check(wire, output, shown):
+            """Removes the record and those in it from `shown`."""
+            fields = shown.pop(output, None)
+            if fields is None:
+                return
+            self.assertEqual(len(fields), len(model.fields[wire]))
+            for field, wire_field, argument in zip(fields, model.fields[wire],
+                                                   model.arguments[output]):
+                inner = argument["type"].removeprefix("list of ")
+                self.assertEqual(field, {
+                    "key": wire_field["key"], "name": wire_field["name"],
+                    "label": argument["label"], "type": inner,
+                    "list": argument["type"] != inner, "required": not wire_field["optional"]})
+                if inner in model.arguments:
+                    check(wire_field["type"].removeprefix("list of "), inner, shown)
+
+        for kind, (wire, output) in RECORDS.items():
+            result = unpack("--format=json", "--schema", kind)
+            records = lines_of(result)[0]["records"]
+            self.assertEqual(records[0]["name"], output)
+            shown = {record["name"]: record["fields"] for record in records}
+            check(wire, output, shown)
+            self.assertEqual(shown, {})
+            text = unpack("--schema", kind).stdout.decode()
+            self.assertEqual(sum(line.startswith("  ") for line in text.splitlines()),
+                             sum(len(record["fields"]) for record in records))
+            self.assertIn("  c ", text)
+
+    def test_auto_takes_the_record_that_got_most(self):
+        everywhere = ["payload", "web-tunnel-response"]
+        rows = [
+            ({"c": 5}, "command-response", everywhere),
+            ({"c": 5, "unknown": 1}, "command-response", everywhere),
+            ({"c": 5, "i": 7}, "command-response", ["web-tunnel-response"]),
+            ({"c": 5, "i": "seven"}, "payload", []),
+            ({"c": 5, "qrss": True}, "command-response", ["payload"]),
+            ({"c": 5, "hs": 200}, "web-tunnel-response", ["payload"]),
+            ({"c": 5, "hs": 200, "mml": [{"c": 1}]}, "payload", []),
+        ]
+        for number, (message, _, _) in enumerate(rows):
+            self.write(str(number), binary(message))
+        files = [str(number) for number in range(len(rows))]
+        result = unpack("--type=auto", "--format=json", *files)
+        self.assertEqual(result.returncode, 0)
+        self.assertEqual([(line["type"], line["asWell"]) for line in lines_of(result)],
+                         [(kind, as_well) for _, kind, as_well in rows])
+        self.assertIn("0 (command-response; as well: payload, web-tunnel-response)\n",
+                      unpack("--type=auto", "0").stdout.decode())
+
+    def test_auto_when_no_type_fits(self):
+        result = unpack("--type=auto", "--format=json", input=xml({"c": 5, "i": True}))
+        self.assertEqual(result.returncode, 1)
+        error = lines_of(result)[0]["error"]
+        self.assertEqual(error["kind"], "noTypeFits")
+        self.assertEqual([(each["type"], each["path"], each["message"]) for each in error["types"]],
+                         [("payload", "i", "expected string, found boolean"),
+                          ("command-response", "i", "expected integer, found boolean"),
+                          ("web-tunnel-response", "i", "expected integer, found boolean")])
+        for content, kind in ((b"", "malformed"), (xml({"C": 1}), "keyNotFound")):  # all say the same
+            error = lines_of(unpack("--type=auto", "--format=json", input=content))[0]["error"]
+            self.assertEqual((error["kind"], "types" in error), (kind, False))
+        error = lines_of(unpack("--type=auto", "--format=json", "--service=/bin/true",
+                                input=xml({"c": 5})))[0]["error"]
+        self.assertEqual(error["kind"], "unavailable")
+
+    def test_quiet_and_summary(self):
+        for name, content in (("good", xml({"c": 5})), ("bad", xml({})), ("junk", b"")):
+            self.write(name, content)
+        for files, status in ((["good"], 0), (["good", "bad"], 1), (["bad", "missing"], 2)):
+            result = unpack("--quiet", *files)
+            self.assertEqual((result.returncode, result.stdout, result.stderr), (status, b"", b""))
+        files = ["good", "bad", "junk", "missing", "bad", *["good"] * 9]
+        result = unpack("--summary", *files)
+        self.assertEqual((result.returncode, result.stderr), (2, b""))
+        self.assertEqual(result.stdout.decode(), "14  messages\n"
+                                                 "10  accepted\n"
+                                                 " 2  keyNotFound\n"
+                                                 " 1  malformed\n"
+                                                 " 1  unreadable\n")
+        result = unpack("--summary", "--format=json", "--type=auto", *files)
+        self.assertEqual(lines_of(result), [
+            {"messages": 14, "accepted": 10, "types": {"command-response": 10},
+             "errors": {"keyNotFound": 2, "malformed": 1, "unreadable": 1}}])
+
+
 class Text(InFolder):
     def test_a_record_and_a_refusal(self):
         self.write("good", xml({"c": 5, "U": bytes(range(16)), "qai": "a.b", "qrss": False}))
@@ -176,6 +315,9 @@ class Text(InFolder):
         self.assertEqual(result.stdout.decode(),
                          record +
                          "vesk-unpack: bad: typeMismatch at U: expected data, found string\n"
+                         "  line 8, column 2\n"
+                         "    <string>text</string>\n"
+                         "    ^\n"
                          "vesk-unpack: missing: unreadable: No such file or directory\n"
                          "\n" + record)
         self.assertEqual(result.returncode, 2)
@@ -188,7 +330,7 @@ class Text(InFolder):
                         stderr=subprocess.STDOUT)
         output = result.stdout.decode()
         self.assertNotRegex(output, "[\x00-\x09\x0b-\x1f\x7f-\x9f\u202e]")
-        self.assertEqual(len(output.splitlines()), 5)
+        self.assertEqual(len(output.splitlines()), 8)
         self.assertLess(max(map(len, output.splitlines())), 600)
 
     def on_terminal(self, *arguments, **environment):

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <span>
 
 namespace ironmoat::inspect {
 
@@ -31,6 +32,16 @@ Lead leadOf(unsigned char byte) noexcept {
   return {0, 0, 0};
 }
 
+struct Range {
+  char32_t first;
+  char32_t last;
+};
+
+bool isIn(std::span<const Range> ranges, char32_t value) noexcept {
+  return std::any_of(ranges.begin(), ranges.end(),
+                     [value](Range range) { return value >= range.first && value <= range.last; });
+}
+
 }  // namespace
 
 CodePoint firstCodePoint(std::string_view text) noexcept {
@@ -53,10 +64,6 @@ bool isControl(char32_t value) noexcept {
 }
 
 bool isInvisible(char32_t value) noexcept {
-  struct Range {
-    char32_t first;
-    char32_t last;
-  };
   static constexpr std::array<Range, 10> kRanges = {{
       {0x00AD, 0x00AD},    // soft hyphen
       {0x061C, 0x061C},    // reading direction, also below
@@ -69,9 +76,22 @@ bool isInvisible(char32_t value) noexcept {
       {0xFFF9, 0xFFFB},    // annotations
       {0xE0000, 0xE0FFF},  // tags
   }};
-  return isControl(value) || std::any_of(kRanges.begin(), kRanges.end(), [value](Range range) {
-           return value >= range.first && value <= range.last;
-         });
+  return isControl(value) || isIn(kRanges, value);
+}
+
+std::size_t columnsOf(char32_t value) noexcept {
+  static constexpr std::array<Range, 4> kMarks = {
+      {{0x0300, 0x036F}, {0x200C, 0x200D}, {0x20D0, 0x20FF}, {0xFE00, 0xFE0F}}};
+  static constexpr std::array<Range, 9> kWide = {{{0x1100, 0x115F},
+                                                  {0x2E80, 0x303E},
+                                                  {0x3041, 0xA4CF},
+                                                  {0xAC00, 0xD7A3},
+                                                  {0xF900, 0xFAFF},
+                                                  {0xFE30, 0xFE6F},
+                                                  {0xFF01, 0xFF60},
+                                                  {0x1F300, 0x1FAFF},
+                                                  {0x20000, 0x3FFFD}}};
+  return isIn(kMarks, value) ? 0 : isIn(kWide, value) ? 2 : 1;
 }
 
 }  // namespace ironmoat::inspect

@@ -24,4 +24,8 @@ bool isControl(char32_t value) noexcept;
 /// without width.
 bool isInvisible(char32_t value) noexcept;
 
+/// Columns of a terminal that a visible one takes: 0 for marks on the character before, 2 for most
+/// of what East Asia writes with and for pictures, 1 for all others. Roughly.
+std::size_t columnsOf(char32_t value) noexcept;
+
 }  // namespace ironmoat::inspect

@@ -7,6 +7,7 @@
 
 #include "inspect/confinement_report.h"
 #include "inspect/options.h"
+#include "inspect/record_types.h"
 #include "inspect/service_program.h"
 #include "inspect/terminal.h"
 #include "inspect/unpack_files.h"
@@ -21,6 +22,14 @@ using ironmoat::inspect::Terminal;
 ExitStatus run(std::span<const char* const> arguments, Terminal& terminal) {
   const Options options = ironmoat::inspect::parseOptions(arguments);
   if (options.action == Action::unpack) return ironmoat::inspect::unpackFiles(options, terminal);
+  if (options.action == Action::showSchema) {
+    std::string text;
+    ironmoat::inspect::recordType(options.schema)
+        ->showSchema(options.format, terminal.outputColours(), text);
+    terminal.print(text);
+    terminal.flush();
+    return ironmoat::inspect::allUnpacked;
+  }
   if (options.action == Action::selfTest) {
     return static_cast<ExitStatus>(ironmoat::inspect::selfTest(
         std::cout,

@@ -1,6 +1,7 @@
 #include "inspect/options.h"
 
 #include <algorithm>
+#include <array>
 #include <optional>
 
 #include "inspect/record_types.h"
@@ -17,119 +18,131 @@ std::string quoted(std::string_view text) {
   return out;
 }
 
-class Arguments {
- public:
-  explicit Arguments(std::span<const char* const> rest) : rest_(rest) {}
-
-  [[nodiscard]] bool empty() const noexcept { return rest_.empty(); }
-
-  std::string_view take() noexcept {
-    const std::string_view first = rest_.front();
-    rest_ = rest_.subspan(1);
-    return first;
+void setAction(Options& options, Action action) {
+  if (options.action != Action::unpack && options.action != action) {
+    throw UsageError("options '--schema' and '--self-test' exclude one another");
   }
-
-  /// The value of `option` when `argument` is that option, alone or as `option=value`.
-  std::optional<std::string> valueOf(std::string_view option, std::string_view argument) {
-    if (!argument.starts_with(option)) return std::nullopt;
-    argument.remove_prefix(option.size());
-    if (argument.starts_with('=')) return std::string(argument.substr(1));
-    if (!argument.empty()) return std::nullopt;
-    if (empty()) throw UsageError("option " + quoted(option) + " needs a value");
-    return std::string(take());
-  }
-
- private:
-  std::span<const char* const> rest_;
-};
-
-Format formatNamed(std::string_view name) {
-  if (name == "text") return Format::text;
-  if (name == "json") return Format::json;
-  throw UsageError("unknown format " + quoted(name) + ": text or json");
+  options.action = action;
 }
 
-void checkType(std::string_view name) {
-  if (recordType(name) != nullptr) return;
+void setOutput(Options& options, Output output) {
+  if (options.output != Output::each && options.output != output) {
+    throw UsageError("options '--quiet' and '--summary' exclude one another");
+  }
+  options.output = output;
+}
+
+[[noreturn]] void refuseType(std::string_view name, std::string_view others) {
   std::string known;
   for (const RecordType& type : recordTypes()) {
     if (!known.empty()) known += ", ";
     known += type.name;
   }
-  throw UsageError("unknown type " + quoted(name) + ": one of " + known);
+  throw UsageError("unknown type " + quoted(name) + ": one of " + known.append(others));
+}
+
+void setType(Options& options, std::string_view name) {
+  if (name != kAutoType && recordType(name) == nullptr) refuseType(name, ", auto");
+  options.type = name;
+}
+
+void setSchema(Options& options, std::string_view name) {
+  setAction(options, Action::showSchema);
+  if (recordType(name) == nullptr) refuseType(name, "");
+  options.schema = name;
+}
+
+void setFormat(Options& options, std::string_view name) {
+  if (name != "text" && name != "json") {
+    throw UsageError("unknown format " + quoted(name) + ": text or json");
+  }
+  options.format = name == "text" ? Format::text : Format::json;
+}
+
+void setService(Options& options, std::string_view program) {
+  if (program.empty()) throw UsageError("option '--service' needs a program");
+  options.service = program;
+}
+
+struct Flag {
+  std::string_view name;
+  void (*set)(Options&);
+};
+constexpr std::array kFlags = {
+    Flag{"--quiet", [](Options& options) { setOutput(options, Output::nothing); }},
+    Flag{"-q", [](Options& options) { setOutput(options, Output::nothing); }},
+    Flag{"--summary", [](Options& options) { setOutput(options, Output::summary); }},
+    Flag{"--self-test", [](Options& options) { setAction(options, Action::selfTest); }},
+    Flag{"--help", [](Options& options) { options.action = Action::showHelp; }},
+    Flag{"-h", [](Options& options) { options.action = Action::showHelp; }},
+    Flag{"--version", [](Options& options) { options.action = Action::showVersion; }},
+};
+
+struct Setting {
+  std::string_view name;
+  void (*set)(Options&, std::string_view value);
+};
+constexpr std::array kSettings = {
+    Setting{"--type", setType},
+    Setting{"--format", setFormat},
+    Setting{"--service", setService},
+    Setting{"--schema", setSchema},
+};
+
+/// What stands after `name` and '=' in `argument`, if that is `name=value`.
+std::optional<std::string_view> valueIn(std::string_view argument, std::string_view name) {
+  if (!argument.starts_with(name) || argument.substr(name.size(), 1) != "=") return std::nullopt;
+  return argument.substr(name.size() + 1);
+}
+
+/// Sets what `argument` asks for, with the first of `rest` for its value where it has none in
+/// itself; returns how many of those it took.
+std::size_t takeOption(Options& options, std::string_view argument,
+                       std::span<const char* const> rest) {
+  for (const Flag& flag : kFlags) {
+    if (argument == flag.name) return flag.set(options), 0;
+  }
+  for (const Setting& setting : kSettings) {
+    if (const auto value = valueIn(argument, setting.name)) return setting.set(options, *value), 0;
+    if (argument != setting.name) continue;
+    if (rest.empty()) throw UsageError("option " + quoted(argument) + " needs a value");
+    return setting.set(options, rest.front()), 1;
+  }
+  throw UsageError("unknown option " + quoted(argument));
+}
+
+void checkFiles(Options& options) {
+  if (options.action != Action::unpack) {
+    const char* name = options.action == Action::selfTest ? "--self-test" : "--schema";
+    if (!options.files.empty()) throw UsageError("option " + quoted(name) + " goes without files");
+    return;
+  }
+  if (options.files.empty()) options.files.emplace_back(kStandardInput);
+  if (std::count(options.files.begin(), options.files.end(), kStandardInput) > 1) {
+    throw UsageError("standard input can be read only once");
+  }
 }
 
 }  // namespace
 
 Options parseOptions(std::span<const char* const> arguments) {
   Options options;
-  Arguments rest(arguments);
   bool onlyFiles = false;
-  while (!rest.empty()) {
-    const std::string_view argument = rest.take();
+  for (std::size_t i = 0; i < arguments.size(); ++i) {
+    const std::string_view argument = arguments[i];
     if (onlyFiles || argument == kStandardInput || !argument.starts_with('-')) {
       options.files.emplace_back(argument);
     } else if (argument == "--") {
       onlyFiles = true;
-    } else if (argument == "--help" || argument == "-h") {
-      options.action = Action::showHelp;
-      return options;
-    } else if (argument == "--version") {
-      options.action = Action::showVersion;
-      return options;
-    } else if (argument == "--self-test") {
-      options.action = Action::selfTest;
-    } else if (auto type = rest.valueOf("--type", argument)) {
-      options.type = *std::move(type);
-    } else if (const auto format = rest.valueOf("--format", argument)) {
-      options.format = formatNamed(*format);
-    } else if (auto service = rest.valueOf("--service", argument)) {
-      if (service->empty()) throw UsageError("option '--service' needs a program");
-      options.service = *std::move(service);
     } else {
-      throw UsageError("unknown option " + quoted(argument));
+      i += takeOption(options, argument, arguments.subspan(i + 1));
+      if (options.action == Action::showHelp || options.action == Action::showVersion) {
+        return options;
+      }
     }
   }
-  checkType(options.type);
-  if (options.action == Action::selfTest) {
-    if (!options.files.empty()) throw UsageError("option '--self-test' goes without files");
-    return options;
-  }
-  if (options.files.empty()) options.files.emplace_back(kStandardInput);
-  if (std::count(options.files.begin(), options.files.end(), kStandardInput) > 1) {
-    throw UsageError("standard input can be read only once");
-  }
+  checkFiles(options);
   return options;
-}
-
-std::string_view helpText() noexcept {
-  return R"(Usage: vesk-unpack [OPTION...] [FILE...]
-
-Has each FILE, one property-list message (binary or XML), unpacked by the
-service VeskIronmoatService in a process of its own, and prints the record, or
-why the message was refused. Without FILE, or for -, reads standard input.
-
-  --type TYPE        what the messages are: payload (default), command-response,
-                     web-tunnel-response
-  --format FORMAT    text (default), for people: records on standard output,
-                     refusals on standard error, long values cut; or
-                     json, for programs: one line for each FILE, in order,
-                     {"file": F, "record": {...}} or
-                     {"file": F, "error": {"kind": K, "path": P, "message": M}}
-  --service PROGRAM  use this service, not the one that came with this tool
-  --self-test        show what confines the service, and what comes of what is
-                     forbidden to it
-  --help, -h         print this
-  --version          print the version
-
-Kinds of error: malformed, limitExceeded, typeMismatch, outOfRange, keyNotFound
-(the message was refused), crashed, timedOut (the service failed over it),
-unavailable (no service could be had), unreadable (FILE could not be read).
-
-Exit status: 0 all unpacked; 1 some message refused, or the service failed over
-it, or it is not confined as it has to be; 2 wrong usage, a FILE that could not
-be read, no service, output not writable.
-)";
 }
 
 }  // namespace ironmoat::inspect

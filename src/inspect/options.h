@@ -10,14 +10,20 @@
 namespace ironmoat::inspect {
 
 enum class Format : std::uint8_t { text, json };
-enum class Action : std::uint8_t { unpack, selfTest, showHelp, showVersion };
+enum class Action : std::uint8_t { unpack, showSchema, selfTest, showHelp, showVersion };
+/// What is printed of the messages.
+enum class Output : std::uint8_t { each, summary, nothing };
 
 inline constexpr std::string_view kStandardInput = "-";
+/// Instead of a type's name: all are tried.
+inline constexpr std::string_view kAutoType = "auto";
 
 struct Options {
   Action action = Action::unpack;
   std::string type = "payload";
+  std::string schema;  ///< of which type to show it
   Format format = Format::text;
+  Output output = Output::each;
   std::string service;             ///< empty: to be found
   std::vector<std::string> files;  ///< never empty to unpack; `-` at most once
 };

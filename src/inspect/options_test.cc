@@ -23,7 +23,7 @@ TEST(Options, AreUnderstoodInEveryForm) {
       {{"a", "-", "b"}, "payload", Format::text, "", {"a", "-", "b"}},
       {{"--type", "command-response", "a"}, "command-response", Format::text, "", {"a"}},
       {{"a", "--format=json", "--service=/s", "b"}, "payload", Format::json, "/s", {"a", "b"}},
-      {{"--type=web-tunnel-response"}, "web-tunnel-response", Format::text, "", {"-"}},
+      {{"--type=auto"}, "auto", Format::text, "", {"-"}},
       {{"--format", "json", "--format", "text"}, "payload", Format::text, "", {"-"}},
       {{"--", "--type", "-x"}, "payload", Format::text, "", {"--type", "-x"}},
       {{""}, "payload", Format::text, "", {""}},
@@ -35,6 +35,31 @@ TEST(Options, AreUnderstoodInEveryForm) {
     EXPECT_EQ(options.format, row.format);
     EXPECT_EQ(options.service, row.service);
     EXPECT_EQ(options.files, row.files);
+    EXPECT_EQ(options.output, Output::each);
+  }
+}
+
+TEST(Options, SayWhatToDoAndWhatToPrint) {
+  struct Row {
+    Arguments arguments;
+    Action action;
+    Output output;
+    std::string schema;
+  };
+  const Row rows[] = {
+      {{"-q", "a"}, Action::unpack, Output::nothing, ""},
+      {{"--quiet", "--quiet"}, Action::unpack, Output::nothing, ""},
+      {{"--format=json", "--summary"}, Action::unpack, Output::summary, ""},
+      {{"--type=auto", "--schema", "payload"}, Action::showSchema, Output::each, "payload"},
+      {{"--self-test"}, Action::selfTest, Output::each, ""},
+      {{"--summary", "--help", "--nonsense"}, Action::showHelp, Output::summary, ""},
+      {{"--self-test", "--version"}, Action::showVersion, Output::each, ""},
+  };
+  for (const Row& row : rows) {
+    const Options options = parseOptions(row.arguments);
+    EXPECT_EQ(options.action, row.action);
+    EXPECT_EQ(options.output, row.output);
+    EXPECT_EQ(options.schema, row.schema);
   }
 }
 
@@ -47,7 +72,14 @@ TEST(Options, WrongOnesAreNamed) {
       {{"--service="}, "option '--service' needs a program"},
       {{"--format", "xml"}, "unknown format 'xml': text or json"},
       {{"--type", "\x1B[2J"},
-       "unknown type '\\u{1b}[2J': one of payload, command-response, web-tunnel-response"},
+       "unknown type '\\u{1b}[2J': one of payload, command-response, web-tunnel-response, auto"},
+      {{"--schema=auto"},
+       "unknown type 'auto': one of payload, command-response, web-tunnel-response"},
+      {{"--quiet=1"}, "unknown option '--quiet=1'"},
+      {{"-q", "--summary"}, "options '--quiet' and '--summary' exclude one another"},
+      {{"--schema=payload", "--self-test"},
+       "options '--schema' and '--self-test' exclude one another"},
+      {{"a", "--schema", "payload"}, "option '--schema' goes without files"},
       {{"--self-test", "a"}, "option '--self-test' goes without files"},
       {{"-", "-"}, "standard input can be read only once"},
   };

@@ -2,8 +2,10 @@
 
 #include <algorithm>
 #include <array>
+#include <future>
 
 #include "inspect/json.h"
+#include "inspect/schema.h"
 #include "ironmoat/command_response.h"
 #include "ironmoat/user_payload.h"
 #include "ironmoat/web_tunnel_response.h"
@@ -12,22 +14,48 @@ namespace ironmoat::inspect {
 
 namespace {
 
+template <class T>
+std::size_t valuesIn(const T& value) {
+  std::size_t values = 0;
+  if constexpr (kIsList<T>) {
+    for (const auto& element : value) values += valuesIn(element);
+  } else if constexpr (Record<T>) {
+    forEachPresentField(value,
+                        [&](std::string_view, const auto& field) { values += valuesIn(field); });
+  } else {
+    values = 1;
+  }
+  return values;
+}
+
+template <MessageSchema R>
+class RecordOf : public UnpackedRecord {
+ public:
+  explicit RecordOf(std::future<R>& pending) : record_(pending.get()) {}
+
+  [[nodiscard]] std::size_t values() const override { return valuesIn(record_); }
+  void show(Format format, const Colours& colours, std::string& out) const override {
+    if (format == Format::json) {
+      appendJson(out, record_);
+    } else {
+      TextView(out, colours).record(record_, 2);
+    }
+  }
+
+ private:
+  R record_;
+};
+
 template <MessageSchema R>
 PendingRecord submitAs(Client& client, const Data& message) {
-  return [pending = client.submit<R>(message).share()](Format format, const Colours& colours,
-                                                       std::string& out) {
-    const R& record = pending.get();
-    if (format == Format::json) {
-      appendJson(out, record);
-    } else {
-      TextView(out, colours).record(record, 2);
-    }
+  return [pending = std::make_shared<std::future<R>>(client.submit<R>(message))] {
+    return std::make_unique<RecordOf<R>>(*pending);
   };
 }
 
 template <MessageSchema R>
 constexpr RecordType row(std::string_view name) {
-  return {name, submitAs<R>};
+  return {name, R::Arguments::Fields::count, submitAs<R>, showSchemaOf<R>};
 }
 
 constexpr std::array kRecordTypes = {

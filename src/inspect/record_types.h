@@ -1,6 +1,8 @@
 #pragma once
 
+#include <cstddef>
 #include <functional>
+#include <memory>
 #include <span>
 #include <string>
 #include <string_view>
@@ -11,13 +13,28 @@
 
 namespace ironmoat::inspect {
 
-/// Waits for a submitted message's record and appends it to `out`: one JSON value, or lines of
-/// text. Throws what Client::unpack throws, with `out` as it was.
-using PendingRecord = std::function<void(Format, const Colours&, std::string& out)>;
+/// A record of any type.
+class UnpackedRecord {
+ public:
+  UnpackedRecord() = default;
+  UnpackedRecord(const UnpackedRecord&) = delete;
+  UnpackedRecord& operator=(const UnpackedRecord&) = delete;
+  virtual ~UnpackedRecord() = default;
+
+  /// Numbers, texts and so on in it and in the records in it: how much of the message it got.
+  [[nodiscard]] virtual std::size_t values() const = 0;
+  /// Appends one JSON value, or lines of text.
+  virtual void show(Format format, const Colours& colours, std::string& out) const = 0;
+};
+
+/// Waits for a submitted message's record. Throws what Client::unpack throws. Once only.
+using PendingRecord = std::function<std::unique_ptr<UnpackedRecord>()>;
 
 struct RecordType {
   std::string_view name;  ///< as after `--type`
+  std::size_t fields;     ///< of its record, those of records in it not counted
   PendingRecord (*submit)(Client& client, const Data& message);
+  void (*showSchema)(Format format, const Colours& colours, std::string& out);
 };
 
 /// All types of record that can be asked for.

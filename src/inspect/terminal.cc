@@ -1,5 +1,6 @@
 #include "inspect/terminal.h"
 
+#include <sys/ioctl.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -12,6 +13,7 @@ namespace ironmoat::inspect {
 namespace {
 
 constexpr std::size_t kBuffered = std::size_t{64} << 10;
+constexpr std::size_t kUsualWidth = 80;
 constexpr std::chrono::milliseconds kQuietStart{300};
 constexpr std::chrono::milliseconds kBetweenUpdates{100};
 
@@ -43,6 +45,12 @@ Terminal::Terminal()
       outputColours_(coloursFor(outputIsTerminal_)),
       errorColours_(coloursFor(errorIsTerminal_)),
       nextProgress_(Clock::now() + kQuietStart) {}
+
+std::size_t Terminal::errorWidth() const noexcept {
+  winsize size = {};
+  const bool known = ::ioctl(STDERR_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col != 0;
+  return known ? size.ws_col : kUsualWidth;
+}
 
 void Terminal::print(std::string_view text) {
   buffer_ += text;

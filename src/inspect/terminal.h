@@ -20,6 +20,9 @@ class Terminal {
   [[nodiscard]] const Colours& outputColours() const noexcept { return outputColours_; }
   [[nodiscard]] const Colours& errorColours() const noexcept { return errorColours_; }
 
+  /// Columns of the terminal that standard error is; a usual number where it is none.
+  [[nodiscard]] std::size_t errorWidth() const noexcept;
+
   /// Appends to standard output; buffered unless that is a terminal.
   void print(std::string_view text);
   /// Writes to standard error at once.

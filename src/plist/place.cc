@@ -27,13 +27,13 @@ std::uint64_t placeInBinary(NodeIndex node, std::span<const std::uint8_t> messag
   return bigEndian(message.subspan(table + node * offsetSize, offsetSize));
 }
 
-/// Every element but the root's own is one node, in the order of the start tags.
+/// Every element but the root's own is one node, in the order of the start tags; what else has a
+/// '<' is markup that is skipped: no attribute has.
 std::uint64_t placeInXml(NodeIndex node, const Data& message) {
   const XmlSource source(message);
   XmlScanner in(source);
   in.skipProlog();
   in.take("<plist");
-  if (in.skipSpace() && in.take("version")) in.takeAttributeValue();  // which may hold a '<'
   while (!in.atEnd()) {
     if (in.peek() != '<') {
       in.advance(std::min(in.rest().find('<'), in.rest().size()));

@@ -1,0 +1,86 @@
+#include "inspect/place.h"
+#include "inspect/report.h"
+
+namespace ironmoat::inspect {
+
+namespace {
+
+class TextReport : public Report {
+ public:
+  TextReport(const Options& options, Terminal& terminal)
+      : automatic_(options.type == kAutoType), terminal_(terminal) {}
+
+  void add(const std::string& file, const Data& message, const Outcome& outcome) override {
+    text_.clear();
+    if (outcome.failure) {
+      addFailure(file, message, outcome);
+      terminal_.complain(text_);
+    } else {
+      addRecord(file, outcome);
+      terminal_.print(text_);
+    }
+  }
+
+ private:
+  void addRecord(const std::string& file, const Outcome& outcome) {
+    const Colours& colours = terminal_.outputColours();
+    if (printedRecord_) text_ += '\n';
+    printedRecord_ = true;
+    text_ += colours.title;
+    appendHarmless(text_, file);
+    text_ += colours.end;
+    if (automatic_) addType(outcome);
+    text_ += '\n';
+    outcome.record->show(Format::text, colours, text_);
+  }
+
+  void addType(const Outcome& outcome) {
+    const Colours& colours = terminal_.outputColours();
+    text_.append(colours.aside).append(" (").append(outcome.type->name);
+    for (const std::string_view& type : outcome.asWell) {
+      text_ += &type == &outcome.asWell.front() ? "; as well: " : ", ";
+      text_ += type;
+    }
+    text_.append(")").append(colours.end);
+  }
+
+  void addFailure(const std::string& file, const Data& message, const Outcome& outcome) {
+    text_ += "vesk-unpack: ";
+    appendHarmless(text_, file);
+    text_ += ": ";
+    addReason(*outcome.failure, message, 2);
+    for (const Outcome::Refusal& refusal : outcome.refusals) {
+      text_.append("  ").append(refusal.type).append(": ");
+      addReason(refusal.why, message, 4);
+    }
+  }
+
+  void addReason(const Failure& failure, const Data& message, std::size_t indent) {
+    const Colours& colours = terminal_.errorColours();
+    text_.append(colours.error).append(failure.kind).append(colours.end);
+    if (!failure.path.empty()) {
+      text_ += " at ";
+      appendHarmless(text_, failure.path);
+    }
+    text_ += ": ";
+    appendHarmless(text_, failure.message);
+    text_ += '\n';
+    if (failure.offset) {
+      appendPlace(text_, message, *failure.offset,
+                  {.indent = indent, .width = terminal_.errorWidth(), .colours = colours});
+    }
+  }
+
+  const bool automatic_;
+  Terminal& terminal_;
+  bool printedRecord_ = false;
+  std::string text_;
+};
+
+}  // namespace
+
+std::unique_ptr<Report> makeTextReport(const Options& options, Terminal& terminal) {
+  return std::make_unique<TextReport>(options, terminal);
+}
+
+}  // namespace ironmoat::inspect
