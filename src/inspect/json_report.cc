@@ -28,7 +28,7 @@ class JsonReport : public Report {
     } else {
       if (automatic_) addType(outcome);
       line_ += ", \"record\": ";
-      outcome.record->show(Format::json, Colours::none(), line_);
+      outcome.record->show(Format::json, {}, line_);
     }
     line_ += "}\n";
     terminal_.print(line_);

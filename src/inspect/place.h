@@ -22,15 +22,9 @@ struct TextPlace {
 /// as an offset: its end.
 std::optional<TextPlace> placeInText(const Data& message, std::uint64_t offset);
 
-struct PlaceStyle {
-  std::size_t indent;
-  std::size_t width;  ///< columns of the screen
-  Colours colours;
-};
-
 /// Appends a line that says where the offset is, and two that show what stands there and around it,
 /// if anything does, with a mark below; nothing for an offset that is not in the message.
-void appendPlace(std::string& out, const Data& message, std::uint64_t offset,
-                 const PlaceStyle& style);
+void appendPlace(std::string& out, const Data& message, std::uint64_t offset, const Style& style,
+                 std::size_t indent);
 
 }  // namespace ironmoat::inspect

@@ -11,7 +11,7 @@ using namespace std::literals;
 
 std::string place(std::string_view message, std::uint64_t offset, std::size_t width = 60) {
   std::string out;
-  appendPlace(out, Data(message), offset, {.indent = 0, .width = width, .colours = {}});
+  appendPlace(out, Data(message), offset, {{}, width}, 0);
   return out;
 }
 
@@ -31,7 +31,7 @@ TEST(Place, OfTextIsALineAndAColumnOfCharacters) {
       {"\x1B[2J\xFFz", 5, "line 1, column 6\n  \\u{1b}[2J\\x{ff}z\n                 ^\n"},
       {"\xFE\xFF\0\n\xD8\x3D\xDE\x00\0<\0>"sv, 8,
        "line 2, column 2\n  \xF0\x9F\x98\x80<>\n    ^\n"},
-      {"\xFF\xFE<\0>\0\n"sv, 4, "line 1, column 2\n  <>\\n\n   ^\n"},
+      {"\xFF\xFE<\0>\0\n"sv, 4, "line 1, column 2\n  <>\\x{a}\n   ^\n"},
   };
   for (const Row& row : rows) EXPECT_EQ(place(row.message, row.offset), row.shown);
   EXPECT_EQ(place("abc", 4), "");

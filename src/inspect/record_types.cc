@@ -34,11 +34,11 @@ class RecordOf : public UnpackedRecord {
   explicit RecordOf(std::future<R>& pending) : record_(pending.get()) {}
 
   [[nodiscard]] std::size_t values() const override { return valuesIn(record_); }
-  void show(Format format, const Colours& colours, std::string& out) const override {
+  void show(Format format, const Style& style, std::string& out) const override {
     if (format == Format::json) {
       appendJson(out, record_);
     } else {
-      TextView(out, colours).record(record_, 2);
+      TextView(out, style).record(record_, 2);
     }
   }
 

@@ -24,7 +24,7 @@ class UnpackedRecord {
   /// Numbers, texts and so on in it and in the records in it: how much of the message it got.
   [[nodiscard]] virtual std::size_t values() const = 0;
   /// Appends one JSON value, or lines of text.
-  virtual void show(Format format, const Colours& colours, std::string& out) const = 0;
+  virtual void show(Format format, const Style& style, std::string& out) const = 0;
 };
 
 /// Waits for a submitted message's record. Throws what Client::unpack throws. Once only.

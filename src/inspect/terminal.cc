@@ -13,7 +13,6 @@ namespace ironmoat::inspect {
 namespace {
 
 constexpr std::size_t kBuffered = std::size_t{64} << 10;
-constexpr std::size_t kUsualWidth = 80;
 constexpr std::chrono::milliseconds kQuietStart{300};
 constexpr std::chrono::milliseconds kBetweenUpdates{100};
 
@@ -26,6 +25,11 @@ Colours coloursFor(bool isTerminal) {
   const bool wanted =
       isTerminal && environment("NO_COLOR").empty() && environment("TERM") != "dumb";
   return wanted ? Colours::quiet() : Colours::none();
+}
+
+std::size_t widthOf(int descriptor) noexcept {
+  winsize size = {};
+  return ::ioctl(descriptor, TIOCGWINSZ, &size) == 0 ? size.ws_col : 0;
 }
 
 bool writeAll(int descriptor, std::string_view text) noexcept {
@@ -46,11 +50,8 @@ Terminal::Terminal()
       errorColours_(coloursFor(errorIsTerminal_)),
       nextProgress_(Clock::now() + kQuietStart) {}
 
-std::size_t Terminal::errorWidth() const noexcept {
-  winsize size = {};
-  const bool known = ::ioctl(STDERR_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col != 0;
-  return known ? size.ws_col : kUsualWidth;
-}
+std::size_t Terminal::outputWidth() const noexcept { return widthOf(STDOUT_FILENO); }
+std::size_t Terminal::errorWidth() const noexcept { return widthOf(STDERR_FILENO); }
 
 void Terminal::print(std::string_view text) {
   buffer_ += text;

@@ -20,7 +20,8 @@ class Terminal {
   [[nodiscard]] const Colours& outputColours() const noexcept { return outputColours_; }
   [[nodiscard]] const Colours& errorColours() const noexcept { return errorColours_; }
 
-  /// Columns of the terminal that standard error is; a usual number where it is none.
+  /// Columns; 0 where it is no terminal, or one that does not tell.
+  [[nodiscard]] std::size_t outputWidth() const noexcept;
   [[nodiscard]] std::size_t errorWidth() const noexcept;
 
   /// Appends to standard output; buffered unless that is a terminal.

@@ -31,7 +31,7 @@ class TextReport : public Report {
     text_ += colours.end;
     if (automatic_) addType(outcome);
     text_ += '\n';
-    outcome.record->show(Format::text, colours, text_);
+    outcome.record->show(Format::text, {colours, terminal_.outputWidth()}, text_);
   }
 
   void addType(const Outcome& outcome) {
@@ -66,8 +66,7 @@ class TextReport : public Report {
     appendHarmless(text_, failure.message);
     text_ += '\n';
     if (failure.offset) {
-      appendPlace(text_, message, *failure.offset,
-                  {.indent = indent, .width = terminal_.errorWidth(), .colours = colours});
+      appendPlace(text_, message, *failure.offset, {colours, terminal_.errorWidth()}, indent);
     }
   }
 

@@ -9,6 +9,7 @@
 #include <string_view>
 #include <type_traits>
 
+#include "inspect/code_points.h"
 #include "inspect/present_fields.h"
 #include "ironmoat/values.h"
 
@@ -31,13 +32,22 @@ struct Colours {
 /// Appends `text` so that it shows on a terminal and does nothing else there: what is not visible
 /// as itself is written out, as in `\n` or `\u{202e}`, and a byte that is no text as `\x{ff}`.
 void appendHarmless(std::string& out, std::string_view text);
+/// Appends one character so, which is the first of `text`; returns the columns that it takes.
+std::size_t appendHarmless(std::string& out, std::string_view text, const CodePoint& point);
 
-/// A person's view of records: a field a line. Lists of records that are there but empty, which
-/// every payload has, are left out.
+/// How text is to look.
+struct Style {
+  Colours colours = Colours::none();
+  std::size_t width = 0;  ///< columns of the screen; 0: lines may have any length
+};
+
+/// A person's view of records: a field a line, or more where a value is wider than the screen.
+/// Lists of records that are there but empty, which every payload has, are left out.
 class TextView {
  public:
   /// Appends to `out`, which must outlive the view.
-  explicit TextView(std::string& out, const Colours& colours) : out_(out), colours_(colours) {}
+  explicit TextView(std::string& out, const Style& style)
+      : out_(out), colours_(style.colours), width_(style.width) {}
 
   /// Appends lines, each with its line end; none for a record without fields.
   template <Record R>
@@ -51,6 +61,7 @@ class TextView {
       label(name, indent);
       if constexpr (!Record<std::remove_cvref_t<decltype(value)>>) {
         out_.append(spansLines(value) ? kGap : width - name.size() + kGap, ' ');
+        column_ = valueColumn_ = indent + width + kGap;
       }
       field(value, indent + kStep);
     });
@@ -96,6 +107,8 @@ class TextView {
       for (std::size_t i = 0; i < value.size(); ++i) {
         position(i, indent);
         out_ += Record<typename T::value_type> ? '\n' : ' ';
+        ++column_;
+        ++valueColumn_;
         element(value[i], indent + kStep);
       }
     } else {
@@ -122,9 +135,14 @@ class TextView {
   void count(std::size_t elements);
   void noFields(std::size_t indent);
   void aside(std::string_view remark);
+  void remark(std::string_view words);
+  void makeRoom(std::size_t columns, bool spaced = false);
 
   std::string& out_;
   Colours colours_;
+  std::size_t width_;
+  std::size_t valueColumn_ = 0;  // where the value that is being written started
+  std::size_t column_ = 0;       // how far it has come
 };
 
 }  // namespace ironmoat::inspect

@@ -11,9 +11,9 @@ namespace {
 
 using namespace std::literals;
 
-std::string view(const Whole& whole, const Colours& colours = Colours::none()) {
+std::string view(const Whole& whole, const Style& style = {}) {
   std::string out;
-  TextView(out, colours).record(whole, 2);
+  TextView(out, style).record(whole, 2);
   return out;
 }
 
@@ -60,10 +60,30 @@ TEST(TextView, CutsLongValuesAndSaysSo) {
                 " ... the first 32 of 33 bytes\n");
 }
 
+TEST(TextView, BreaksValuesThatAreWiderThanTheScreen) {
+  Whole whole;
+  whole.bytes = Data("0123456789");
+  whole.text = String("0123456789abc\n\xE6\xBC\xA2");
+  whole.texts = List<String>{"0123456789abcdefgh", "", "0123456789abcdef"};
+  EXPECT_EQ(view(whole, {.width = 24}),
+            "  command  0\n"
+            "  text     \"0123456789ab\n"
+            "           c\\n\xE6\xBC\xA2\"\n"
+            "  bytes    30313233\n"
+            "           34353637 3839\n"
+            "           (10 bytes)\n"
+            "  texts  (3 elements)\n"
+            "    [0] \"0123456789abcde\n"
+            "        fgh\"\n"
+            "    [1] \"\"\n"
+            "    [2] \"0123456789abcde\n"
+            "        f\"\n");
+}
+
 TEST(TextView, ColoursLabelsAndNothingOfTheSender) {
   Whole whole;
   whole.text = String("\x1B[31mred");
-  EXPECT_EQ(view(whole, Colours::quiet()),
+  EXPECT_EQ(view(whole, {.colours = Colours::quiet()}),
             "  \033[36mcommand\033[0m  0\n"
             "  \033[36mtext\033[0m     \"\\u{1b}[31mred\"\n");
 }
