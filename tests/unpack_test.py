@@ -20,6 +20,7 @@ from message_generator import Generator, binary, xml
 from message_model import RECORDS, Model, shown
 
 TOOL = DUMP_TABLES = None
+PROJECT = os.path.dirname(os.path.dirname(os.path.abspath(__file__)))
 MESSAGE_BYTES = 16 << 20
 
 
@@ -163,6 +164,44 @@ class CommandLine(InFolder):
                 result = unpack(*arguments, stdout=full)
             self.assertEqual(result.returncode, 2)
             self.assertIn(b"standard output", result.stderr)
+
+
+class Companions(unittest.TestCase):
+    """The man page and the completions know what the tool does."""
+
+    def read(self, *path):
+        with open(os.path.join(PROJECT, *path)) as file:
+            return file.read()
+
+    def test_all_options_are_known(self):
+        options = set(re.findall(r"^  (--[a-z-]+)", unpack("--help").stdout.decode(), re.MULTILINE))
+        self.assertGreater(len(options), 8)
+        page = self.read("doc", "man", "vesk-unpack.1").replace("Fl Fl ", "--")
+        self.assertEqual(set(re.findall(r"^\.It (--[a-z-]+)", page, re.MULTILINE)), options)
+        zsh = self.read("packaging", "completion", "_vesk-unpack")
+        self.assertEqual(set(re.findall("--[a-z-]+", zsh)), options)
+        self.assertEqual(set(self.completions("--")), options)
+
+    def completions(self, *words):
+        script = '''source "$1"; shift
+            COMP_WORDS=("$@"); COMP_CWORD=$(($# - 1)); _vesk_unpack; printf '%s\\n' "${COMPREPLY[@]}"'''
+        return subprocess.check_output(
+            ["bash", "-c", script, "bash",
+             os.path.join(PROJECT, "packaging", "completion", "vesk-unpack.bash"),
+             "vesk-unpack", *words], cwd=os.path.join(PROJECT, "examples"), text=True).split()
+
+    def test_completions_of_values(self):
+        types = ["payload", "command-response", "web-tunnel-response"]
+        rows = [
+            (["--type", ""], [*types, "auto"]),
+            (["--type", "=", "pay"], ["payload"]),
+            (["a", "--schema", "="], types),
+            (["--format", "j"], ["json"]),
+            (["pay"], ["payload"]),
+            (["--", "--t"], []),
+        ]
+        for words, expected in rows:
+            self.assertEqual(self.completions(*words), expected)
 
 
 class Places(InFolder):
