@@ -1,0 +1,175 @@
+"""tests/vectors/ through vesk-unpack and through the Python client, which nothing of ours but
+doc/frames.md helped to write; and how that client takes a service that dies or lies.
+
+    vectors_test.py TOOL SERVICE TEST_SERVER DUMP_TABLES [unittest arguments]
+"""
+
+import base64
+import json
+import os
+import pathlib
+import re
+import struct
+import subprocess
+import sys
+import unittest
+
+ROOT = pathlib.Path(__file__).resolve().parents[1]
+sys.path.append(str(ROOT / "examples/python"))
+import ironmoat  # noqa: E402
+
+VECTORS = ROOT / "tests/vectors"
+ENTRIES = json.loads((VECTORS / "vectors.json").read_text())
+RECORDS = json.loads((ROOT / "doc/records.json").read_text())["records"]
+SANITIZED = 0b10_0000_1010  # what a service built with a sanitizer has in force
+TOOL = SERVICE = TEST_SERVER = DUMP_TABLES = None
+
+
+def outcome(entry):
+    return {"record": entry["record"]} if "record" in entry else {"error": entry["error"]}
+
+
+def comparable(record_or_error, entry):
+    """As the vector has it, whatever more is known of an error."""
+    error = record_or_error.get("error")
+    return {"error": {name: error.get(name) for name in entry["error"]}} \
+        if error and "error" in entry else record_or_error
+
+
+def shown(answer):
+    """An outcome of the Python client as vectors.json would have it."""
+    if isinstance(answer, dict):
+        return {"record": json.loads(json.dumps(
+            answer, default=lambda data: base64.b64encode(data).decode()))}
+    return {"error": vars(answer) | {"message": str(answer)}}
+
+
+class Client(ironmoat.Client):
+    def __init__(self, program, patience=20):
+        super().__init__(program, RECORDS, patience, SANITIZED)
+
+
+class Vectors(unittest.TestCase):
+    maxDiff = 2000
+
+    def test_tables(self):
+        subprocess.run([sys.executable, ROOT / "tests/generated_files.py", DUMP_TABLES, "--check"],
+                       check=True)
+
+    def test_tool(self):
+        for kind, output_type in (("payload", "DrelUserPayload"),
+                                  ("command-response", "VeskCommandResponse"),
+                                  ("web-tunnel-response", "VeskCommandWebTunnelResponse")):
+            files = {file: entry for entry in ENTRIES if entry["outputType"] == output_type
+                     for file in entry["files"]}
+            result = subprocess.run([TOOL, "--type", kind, "--format", "json", *files], cwd=VECTORS,
+                                    stdout=subprocess.PIPE)
+            lines = list(map(json.loads, result.stdout.splitlines()))
+            self.assertEqual([line["file"] for line in lines], list(files))
+            for line in lines:
+                entry = files[line.pop("file")]
+                with self.subTest(entry["about"]):
+                    if "offset" in (expected := outcome(entry)).get("error", {}):
+                        where = f"at offset {expected['error']['offset']}"
+                        self.assertIn(where, line["error"]["message"])
+                        line["error"]["offset"] = expected["error"]["offset"]
+                    self.assertEqual(comparable(line, entry), expected)
+
+    def test_python_client(self):
+        """All of them in flight at once."""
+        requests = [(entry, (entry["outputType"], (VECTORS / file).read_bytes()))
+                    for entry in ENTRIES for file in entry["files"]]
+        client = Client(SERVICE)
+        answers = client.unpack([request for _, request in requests])
+        client.close()
+        for (entry, _), answer in zip(requests, answers):
+            with self.subTest(entry["about"]):
+                self.assertEqual(comparable(shown(answer), entry), outcome(entry))
+
+
+class FramesPage(unittest.TestCase):
+    def test_exchange(self):
+        """The one that the page shows; the hello's confinement is the machine's."""
+        page = (ROOT / "doc/frames.md").read_text()
+        lines = re.findall(r"^([<>]) ((?:[0-9a-f]{2} )+)", page, re.MULTILINE)
+        sent, received = (bytes.fromhex("".join(line for sign, line in lines if sign == wanted))
+                          for wanted in "><")
+        result = subprocess.run([SERVICE], input=sent, stdout=subprocess.PIPE, check=True)
+        self.assertEqual(frames(result.stdout), frames(received))
+
+
+def frames(stream):
+    """The hello without its confinement, and the replies, which come in any order."""
+    bodies = []
+    while stream:
+        end = 4 + int.from_bytes(stream[:4], "little")
+        bodies.append(stream[4:end])
+        stream = stream[end:]
+    hello, *replies = bodies
+    return [hello[:10] + hello[14:], *sorted(replies)]
+
+
+class PythonClient(unittest.TestCase):
+    def test_more_than_the_buffers_hold(self):
+        messages = [os.urandom(3 << 20) for _ in range(40)]
+        client = Client(TEST_SERVER)
+        answers = client.unpack([("VeskCommandResponse", message) for message in messages])
+        self.assertEqual([answer["token"] for answer in answers], messages)
+        client.close()
+
+    def test_the_message_at_fault_fails_alone(self):
+        messages = [b"a 1", b"crash 2", b"b 3", b"stall 4", b"c 5"]
+        client = Client(TEST_SERVER, patience=2)
+        answers = client.unpack([("VeskCommandResponse", message) for message in messages])
+        self.assertEqual([isinstance(answer, dict) and answer["command"] for answer in answers],
+                         [1, False, 3, False, 5])
+        answer, = client.unpack([("Unknown", b"")])
+        self.assertEqual(str(answer), "no unpacker for this type")
+        client.close()
+
+    def test_replies_that_lie(self):
+        limits = dict(zip(ironmoat.LIMITS, (16 << 20, 64 << 20, 64 << 20, 144 << 20, 512)))
+
+        def take(output_type, body):
+            return ironmoat.Reply(bytes(8) + body, RECORDS, limits).outcome(output_type)
+
+        response, payload = "VeskCommandResponse", "DrelUserPayload"
+        number = bytes(8)
+        refusal = struct.pack("<BBQHs", 1, 2, 2**64 - 1, 1, b"c")
+        self.assertEqual(take(response, b"\0\x01\0" + number), {"command": 0})
+        self.assertEqual(vars(take(response, refusal + b"why")),
+                         {"kind": "typeMismatch", "path": "c", "offset": None})
+        # The lists that every payload has, the last field of each level being such a list.
+        fields = RECORDS[payload]["fields"]
+        always = sum(1 << place for place, field in enumerate(fields) if not field["optional"])
+        head = always.to_bytes(19, "little") + number
+        lists = sum(field["type"].startswith("List") and not field["optional"] for field in fields)
+        empty = head + bytes(4 * lists)
+        take(payload, b"\0" + empty)
+        nested = empty
+        for _ in range(600):
+            nested = head + struct.pack("<I", 1) + nested + bytes(4 * (lists - 1))
+        for what, output_type, body in (
+                ("unknown status", response, b"\x04"),
+                ("unknown kind", response, b"\1\5" + refusal[2:]),
+                ("path beyond the end", response, refusal[:-1]),
+                ("zero byte in a sentence", response, refusal + b"a\0"),
+                ("no UTF-8 in a sentence", response, b"\3\xff"),
+                ("required field missing", response, b"\0\0\0"),
+                ("unused presence bit", response, b"\0\x01\x20" + number),
+                ("Bool of 2", response, b"\0\x41\0" + number + b"\2"),
+                ("text beyond the end", response, b"\0\x01\1" + number + struct.pack("<I", 1)),
+                ("no UTF-8 in a record", response,
+                 b"\0\x01\1" + number + struct.pack("<I", 1) + b"\xff"),
+                ("bytes behind the record", response, b"\0\x01\0" + number + b"\0"),
+                ("a list of everything", payload, b"\0" + head + b"\xff" * 4 + bytes(64)),
+                ("a list that takes too much memory", payload,
+                 b"\0" + head + struct.pack("<I", 28_150) + bytes(28_150)),
+                ("nested too deep", payload, b"\0" + nested)):
+            with self.subTest(what), self.assertRaises((ironmoat.NoAnswer, UnicodeDecodeError)):
+                take(output_type, body)
+
+
+if __name__ == "__main__":
+    TOOL, SERVICE, TEST_SERVER, DUMP_TABLES = map(os.path.abspath, sys.argv[1:5])
+    unittest.main(argv=sys.argv[:1] + sys.argv[5:])
