@@ -5,8 +5,8 @@
 #include <string_view>
 #include <utility>
 
-/// Lists of a record's members that the compiler keeps complete and in order, and what is derived
-/// from them: names, types, a walk over all fields.
+// Lists of a record's members that the compiler keeps complete and in order, and what is derived
+// from them: names, types, a walk over all fields.
 namespace ironmoat {
 
 namespace detail {
