@@ -6,6 +6,7 @@
 #include <memory>
 #include <string>
 
+#include "ironmoat/api.h"
 #include "ironmoat/errors.h"
 #include "ironmoat/message_schema.h"
 #include "ironmoat/values.h"
@@ -28,11 +29,13 @@ class Connection;
 /// handling; a SIGCHLD comes when its process ends, and a handler that reaps it does no harm. After
 /// fork() a client that was used belongs to the parent: in the child every request fails with
 /// `unavailable`, and destroying the copy does nothing.
-class Client {
+class IRONMOAT_API Client {
  public:
   struct Options {
-    /// Path of the service's executable, started with an empty environment; empty: where the
-    /// library was configured to be installed.
+    /// Path of the service's executable, started with an empty environment. Empty: the service that
+    /// was installed with this library. The static library looks where it was configured to be
+    /// installed; the shared one first in its own installation, wherever that was moved to, when
+    /// nobody but root and this process's user can change what is there.
     std::string program;
     /// How long the service may work on one message, from 1 ms to a day. A request that is past it
     /// is tried once more, alone, before it fails with `timedOut`; waiting for other requests does

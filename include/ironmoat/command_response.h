@@ -28,10 +28,10 @@ struct VeskCommandResponseArguments {
                 &R::token, &R::internalBuild, &R::loggingProfile, &R::applicationId,
                 &R::requestType, &R::veskSessionId, &R::sharedSession, &R::protocolVersion>;
 };
-void admit(const VeskCommandResponseArguments& arguments);
+IRONMOAT_API void admit(const VeskCommandResponseArguments& arguments);
 
 /// The response to a command. Its fields are read as `response.command`, `response.token`, ...
-struct VeskCommandResponse : OutputRecord<VeskCommandResponse, VeskCommandResponseArguments> {
+struct IRONMOAT_API VeskCommandResponse : OutputRecord<VeskCommandResponse, VeskCommandResponseArguments> {
   using OutputRecord::OutputRecord;
   static constexpr std::string_view schemaName = "VeskCommandResponse";
 };

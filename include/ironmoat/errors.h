@@ -7,6 +7,8 @@
 #include <string_view>
 #include <utility>
 
+#include "ironmoat/api.h"
+
 namespace ironmoat {
 
 /// A message was refused. The same bytes give the same error, always: retrying is useless.
@@ -14,7 +16,7 @@ namespace ironmoat {
 /// `what()` is a sentence for people. A service as it should be never repeats the sender's text in
 /// it or in `path()`; one that was taken over may say anything: escape both for a terminal or a
 /// log.
-class DecodingError : public std::runtime_error {
+class IRONMOAT_API DecodingError : public std::runtime_error {
  public:
   enum class Kind : std::uint8_t {
     malformed,      ///< the bytes are no property list; `offset()` says where
@@ -44,7 +46,7 @@ class DecodingError : public std::runtime_error {
 };
 
 /// No answer could be had about a message: nothing is known of its bytes.
-class ServiceError : public std::runtime_error {
+class IRONMOAT_API ServiceError : public std::runtime_error {
  public:
   enum class Kind : std::uint8_t {
     crashed,      ///< the service died over this request
@@ -61,7 +63,7 @@ class ServiceError : public std::runtime_error {
 };
 
 /// The enumerator's own name, as in `typeMismatch`.
-std::string_view nameOf(DecodingError::Kind kind) noexcept;
-std::string_view nameOf(ServiceError::Kind kind) noexcept;
+IRONMOAT_API std::string_view nameOf(DecodingError::Kind kind) noexcept;
+IRONMOAT_API std::string_view nameOf(ServiceError::Kind kind) noexcept;
 
 }  // namespace ironmoat

@@ -19,7 +19,7 @@ struct DrelUserPayloadHttpHeadersArguments {
       FieldList<R, &R::adhocServiceOverride, &R::responseIdentifierString,
                 &R::strictTransportSecurity, &R::traceId, &R::splunkHint, &R::asHttpHeader>;
 };
-void admit(const DrelUserPayloadHttpHeadersArguments& arguments);
+IRONMOAT_API void admit(const DrelUserPayloadHttpHeadersArguments& arguments);
 
 /// HTTP header values, each opaque text.
 struct DrelUserPayloadHttpHeaders

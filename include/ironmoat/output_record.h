@@ -4,6 +4,7 @@
 #include <type_traits>
 #include <utility>
 
+#include "ironmoat/api.h"
 #include "ironmoat/fields.h"
 #include "ironmoat/values.h"
 

@@ -11,7 +11,7 @@ struct DrelUserPayloadDeliveryContextArguments {
   using R = DrelUserPayloadDeliveryContextArguments;
   using Fields = FieldList<R, &R::count>;
 };
-void admit(const DrelUserPayloadDeliveryContextArguments& arguments);
+IRONMOAT_API void admit(const DrelUserPayloadDeliveryContextArguments& arguments);
 
 /// The delivery context of a message payload.
 struct DrelUserPayloadDeliveryContext
@@ -30,7 +30,7 @@ struct DrelHoplinePluginRequestArguments {
   using Fields =
       FieldList<R, &R::pluginName, &R::pluginConfig, &R::pluginStream, &R::pluginDevMode>;
 };
-void admit(const DrelHoplinePluginRequestArguments& arguments);
+IRONMOAT_API void admit(const DrelHoplinePluginRequestArguments& arguments);
 
 /// A plugin request of a message payload.
 struct DrelHoplinePluginRequest
@@ -50,7 +50,7 @@ struct DrelHoplineAllocationStatusArguments {
   using Fields =
       FieldList<R, &R::participantId, &R::allocationStatus, &R::token, &R::destinationId>;
 };
-void admit(const DrelHoplineAllocationStatusArguments& arguments);
+IRONMOAT_API void admit(const DrelHoplineAllocationStatusArguments& arguments);
 
 /// One participant's allocation status.
 struct DrelHoplineAllocationStatus
@@ -72,7 +72,7 @@ struct DrelHoplineSelfAllocTokenArguments {
   using Fields = FieldList<R, &R::relayIp, &R::relayIpv6, &R::relayPort, &R::relaySessionKey,
                            &R::relaySessionId, &R::relayAccessToken, &R::relayProvider>;
 };
-void admit(const DrelHoplineSelfAllocTokenArguments& arguments);
+IRONMOAT_API void admit(const DrelHoplineSelfAllocTokenArguments& arguments);
 
 /// A self-allocation token: a relay and what opens a session on it.
 struct DrelHoplineSelfAllocToken
@@ -92,7 +92,7 @@ struct DrelHoplinePluginAllocationArguments {
   using Fields = FieldList<R, &R::pluginName, &R::pluginStream, &R::participantId,
                            &R::relaySessionKey, &R::relayAccessToken>;
 };
-void admit(const DrelHoplinePluginAllocationArguments& arguments);
+IRONMOAT_API void admit(const DrelHoplinePluginAllocationArguments& arguments);
 
 /// A plugin allocation of a message payload.
 struct DrelHoplinePluginAllocation

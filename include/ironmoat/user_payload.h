@@ -201,11 +201,11 @@ struct DrelUserPayloadArguments {
       &R::relayServerType, &R::pluginAllocations, &R::hoplineErrorCode, &R::originalCommand,
       &R::isBulkedPayload, &R::wantsAppAck, &R::errorDomain, &R::expectsPeerResponse, &R::allowGDR>;
 };
-void admit(const DrelUserPayloadArguments& arguments);
+IRONMOAT_API void admit(const DrelUserPayloadArguments& arguments);
 
 /// A message payload, with the payloads and relay records nested in it. Its six lists of records
 /// are always there and may be empty; every other field but `command` may be absent.
-struct DrelUserPayload : OutputRecord<DrelUserPayload, DrelUserPayloadArguments> {
+struct IRONMOAT_API DrelUserPayload : OutputRecord<DrelUserPayload, DrelUserPayloadArguments> {
   using OutputRecord::OutputRecord;
   static constexpr std::string_view schemaName = "DrelUserPayload";
 };

@@ -7,6 +7,7 @@
 #include <utility>
 #include <vector>
 
+#include "ironmoat/api.h"
 #include "ironmoat/block.h"
 #include "ironmoat/optional.h"
 
@@ -71,7 +72,7 @@ class Slice {
   [[nodiscard]] std::uint32_t offset() const noexcept { return range_.offset; }
 
   /// The same bytes in a block of their own.
-  static Slice copyOf(std::string_view bytes, Sharing sharing = Sharing::anyThread);
+  IRONMOAT_API static Slice copyOf(std::string_view bytes, Sharing sharing = Sharing::anyThread);
 
  private:
   struct Range {
@@ -96,7 +97,7 @@ class String {
  public:
   String() noexcept = default;
   /// Copies the text. Throws std::invalid_argument when it is not valid UTF-8.
-  String(std::string_view text);  // NOLINT(google-explicit-constructor)
+  IRONMOAT_API String(std::string_view text);  // NOLINT(google-explicit-constructor)
   // NOLINTNEXTLINE(google-explicit-constructor)
   String(const char* text) : String(std::string_view(text)) {}
   /// Internal: the caller has checked that the slice is valid UTF-8.
@@ -122,7 +123,7 @@ class Data {
  public:
   Data() noexcept = default;
   /// Copies the bytes.
-  explicit Data(std::span<const std::uint8_t> bytes);
+  IRONMOAT_API explicit Data(std::span<const std::uint8_t> bytes);
   explicit Data(std::string_view bytes) : slice_(detail::Slice::copyOf(bytes)) {}
   /// Internal.
   explicit Data(detail::Slice slice) noexcept : slice_(std::move(slice)) {}

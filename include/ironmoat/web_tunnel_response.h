@@ -29,10 +29,10 @@ struct VeskCommandWebTunnelResponseArguments {
                 &R::epochTimeNanos, &R::httpUrl, &R::httpHeaders, &R::httpBody, &R::httpBodyUrl,
                 &R::httpBodyKey, &R::httpResponseStatus, &R::httpErrorMsg>;
 };
-void admit(const VeskCommandWebTunnelResponseArguments& arguments);
+IRONMOAT_API void admit(const VeskCommandWebTunnelResponseArguments& arguments);
 
 /// The response to a web-tunnel command: an HTTP exchange beside the fields of a response.
-struct VeskCommandWebTunnelResponse
+struct IRONMOAT_API VeskCommandWebTunnelResponse
     : OutputRecord<VeskCommandWebTunnelResponse, VeskCommandWebTunnelResponseArguments> {
   using OutputRecord::OutputRecord;
   static constexpr std::string_view schemaName = "VeskCommandWebTunnelResponse";

@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "client/connection.h"
+#include "client/default_program.h"
 #include "frames/record_codec.h"
 #include "ironmoat/command_response.h"
 #include "ironmoat/limits.h"
@@ -59,7 +60,7 @@ class RequestFor final : public client::Request {
 Client::Client() : Client(Options()) {}
 
 Client::Client(Options options) {
-  if (options.program.empty()) options.program = IRONMOAT_SERVICE_PATH;
+  if (options.program.empty()) options.program = client::defaultProgram();
   connection_ = std::make_unique<client::Connection>(std::move(options));
 }
 

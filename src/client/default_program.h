@@ -1,0 +1,12 @@
+#pragma once
+
+#include <string>
+
+namespace ironmoat::client {
+
+/// The service's executable when the daemon names none: the one in the installation that the shared
+/// library was loaded from, or, when that is none to trust and in the static library, the one where
+/// this was configured to be installed.
+std::string defaultProgram();
+
+}  // namespace ironmoat::client
