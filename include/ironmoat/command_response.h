@@ -31,7 +31,8 @@ struct VeskCommandResponseArguments {
 IRONMOAT_API void admit(const VeskCommandResponseArguments& arguments);
 
 /// The response to a command. Its fields are read as `response.command`, `response.token`, ...
-struct IRONMOAT_API VeskCommandResponse : OutputRecord<VeskCommandResponse, VeskCommandResponseArguments> {
+struct IRONMOAT_API VeskCommandResponse
+    : OutputRecord<VeskCommandResponse, VeskCommandResponseArguments> {
   using OutputRecord::OutputRecord;
   static constexpr std::string_view schemaName = "VeskCommandResponse";
 };
