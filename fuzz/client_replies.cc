@@ -20,15 +20,14 @@
 #include "client/request_queue.h"
 #include "frames/frame.h"
 #include "frames/frame_assembler.h"
+#include "require.h"
 
 namespace {
 
 using namespace ironmoat;
 using client::RequestQueue;
 
-void require(bool truth) {
-  if (!truth) std::abort();
-}
+using fuzz::require;
 
 class Asked final : public client::Request {
  public:

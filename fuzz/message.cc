@@ -1,17 +1,21 @@
-// Any bytes as a message of each kind, all the way: unpacked, carried in a reply, taken out of it;
-// written again in both forms and unpacked to the same reply. The same bytes give the same error.
+// Any bytes as a message of each kind, all the way: decoded as a second, slow decoder does it, paid
+// for exactly as there; unpacked, carried in a reply, taken out of it; written again in both forms
+// and unpacked to the same reply, or to the same refusal.
 
+#include <cstddef>
 #include <cstdint>
-#include <cstdlib>
+#include <functional>
 #include <stdexcept>
 #include <string>
 
+#include "document_oracles.h"
 #include "frames/record_codec.h"
 #include "plist/encoder.h"
 #include "plist/property_list_decoder.h"
 #include "records/command_response.h"
 #include "records/message_payload.h"
 #include "records/web_tunnel.h"
+#include "slow_decode.h"
 #include "support/tight_message.h"
 #include "unpackers/command_response_unpacker.h"
 #include "unpackers/corvel_payload_unpacker.h"
@@ -20,52 +24,91 @@
 namespace {
 
 using namespace ironmoat;
+using fuzz::Outcome;
+using fuzz::require;
 
-void require(bool holds) {
-  if (!holds) std::abort();
+/// What the service may spend, in the small: so that a message of a few bytes can go over it.
+constexpr plist::Budget kSmallBudget{
+    .recordBytes = 100'000, .deliveredBytes = 20'000, .scannedEntries = 2'000};
+
+Outcome refused(const DecodingError& error) {
+  return {false, std::string(nameOf(error.kind())) + " " + error.path() + ": " + error.what()};
 }
 
 /// The reply's body, or the refusal in words.
 template <class Unpacker>
-std::string outcome(const Data& message, bool& accepted) {
-  accepted = false;
+Outcome unpack(const Data& message) {
   try {
     BlockBuilder out;
     frames::encodeRecord(Unpacker().unpack(message), out);
     const BlockRef block = out.finish();
-    accepted = true;
-    return {block->bytes(), block->size()};
+    return {true, {block->bytes(), block->size()}};
   } catch (const DecodingError& error) {
-    const std::uint64_t offset = error.offset().value_or(0);
-    require(offset <= message.size());
-    return std::string(nameOf(error.kind())) + " " + error.path() + " " + error.what() + " " +
-           std::to_string(offset);
+    require(error.offset().value_or(0) <= message.size());
+    return refused(error);
+  }
+}
+
+/// The record in the slow decoder's words, or the refusal; `left` is what the budget still has.
+template <class Wire>
+Outcome decode(const plist::Document& document, plist::Budget& left) {
+  try {
+    const Wire record = Wire::decode(plist::Decoder(document, left));
+    Outcome outcome{true, {}};
+    fuzz::describe(outcome.text, record);
+    return outcome;
+  } catch (const DecodingError& error) {
+    return refused(error);
   }
 }
 
 template <class Unpacker, class Wire>
-void unpackAs(const Data& message) {
+void unpackAs(const Data& message, const plist::Document& document) {
   using Output = typename Unpacker::MessageSchemaType;
-  bool accepted = false;
-  bool acceptedAgain = false;
-  const std::string first = outcome<Unpacker>(message, accepted);
-  require(outcome<Unpacker>(message, acceptedAgain) == first && accepted == acceptedAgain);
-  if (!accepted) return;
+  plist::Budget left = kSmallBudget;
+  fuzz::SlowDecoder slow(document, kSmallBudget);
+  const Outcome decoded = decode<Wire>(document, left);
+  require(slow.decode<Wire>() == decoded);
+  require(left.recordBytes == slow.left().recordBytes &&
+          left.deliveredBytes == slow.left().deliveredBytes &&
+          left.scannedEntries == slow.left().scannedEntries);
+  require(left.recordBytes <= kSmallBudget.recordBytes &&
+          left.deliveredBytes <= kSmallBudget.deliveredBytes &&
+          left.scannedEntries <= kSmallBudget.scannedEntries);
+  // Over the small budget: the whole one costs much time, and a few messages show enough.
+  const bool costly = decoded.text.starts_with("limitExceeded");
+  if (costly && std::hash<std::string_view>()(message.view()) % 64 != 0) return;
 
-  BlockBuilder carried;
-  const auto decoded = frames::decodeRecord<Output>(Data(std::string_view(first)));
-  frames::encodeRecord(decoded, carried);
-  const BlockRef block = carried.finish();
-  require(std::string_view(block->bytes(), block->size()) == first);
+  const Outcome first = unpack<Unpacker>(message);
+  require(costly ||
+          (first.accepted == decoded.accepted && (first.accepted || first.text == decoded.text)));
+  if (first.accepted) {
+    const auto record = frames::decodeRecord<Output>(Data(std::string_view(first.text)));
+    BlockBuilder carried;
+    frames::encodeRecord(record, carried);
+    require(std::string_view(carried.bytes(), carried.size()) == first.text);
+  }
+  const fuzz::Walk walked = fuzz::walk(document);
+  if (walked.tooLarge()) return;  // shared values written out take the fun out of fuzzing
 
-  if (first.size() > 100000) return;  // shared values written out take the fun out of fuzzing
-  const Wire wire = plist::PropertyListDecoder().decode<Wire>(message);
-  for (const plist::Form form : {plist::Form::binary, plist::Form::xml}) {
+  const auto check = [&](auto write, plist::Form form) {
     try {
-      const Data written = plist::PropertyListEncoder(form).encode(wire);
-      require(outcome<Unpacker>(written, accepted) == first && accepted);
+      require(unpack<Unpacker>(write(form)) == first);
     } catch (const std::invalid_argument&) {
       require(form == plist::Form::xml);  // text that XML cannot hold
+    }
+  };
+  for (const plist::Form form : {plist::Form::binary, plist::Form::xml}) {
+    if (walked.writable) {
+      check(
+          [&](plist::Form as) {
+            return as == plist::Form::xml ? writeXml(document) : writeBinary(document);
+          },
+          form);
+    }
+    if (first.accepted) {
+      const Wire wire = plist::PropertyListDecoder().decode<Wire>(message);
+      check([&](plist::Form as) { return plist::PropertyListEncoder(as).encode(wire); }, form);
     }
   }
 }
@@ -74,8 +117,16 @@ void unpackAs(const Data& message) {
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const Data message = testing::tightMessage({reinterpret_cast<const char*>(data), size});
-  unpackAs<VeskCorvelPayloadUnpacker, VeskCorvelProtocolPayload>(message);
-  unpackAs<VeskCommandResponseUnpacker, VeskCommandResponseSchema>(message);
-  unpackAs<VeskCommandWebTunnelResponseUnpacker, VeskCommandWebTunnelResponseSchema>(message);
+  plist::Document document;
+  const std::string malformed = fuzz::refusalOf(plist::read, message, document);
+  if (!malformed.empty()) {
+    const Outcome outcome = unpack<VeskCommandResponseUnpacker>(message);
+    require(!outcome.accepted && outcome == unpack<VeskCorvelPayloadUnpacker>(message));
+    return 0;
+  }
+  unpackAs<VeskCorvelPayloadUnpacker, VeskCorvelProtocolPayload>(message, document);
+  unpackAs<VeskCommandResponseUnpacker, VeskCommandResponseSchema>(message, document);
+  unpackAs<VeskCommandWebTunnelResponseUnpacker, VeskCommandWebTunnelResponseSchema>(message,
+                                                                                     document);
   return 0;
 }

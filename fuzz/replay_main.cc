@@ -1,5 +1,6 @@
 // Feeds every file named on the command line, or found below a folder named there, to the fuzz
-// target: how a corpus is replayed by a compiler without libFuzzer.
+// target, and some changes of each where the target brings a mutator: how a corpus is replayed by a
+// compiler without libFuzzer.
 
 #include <cstdint>
 #include <cstdio>
@@ -7,19 +8,47 @@
 #include <fstream>
 #include <iterator>
 #include <memory>
+#include <span>
 #include <vector>
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size);
+extern "C" std::size_t LLVMFuzzerMutate(std::uint8_t* data, std::size_t size, std::size_t maxSize);
+extern "C" __attribute__((weak)) std::size_t LLVMFuzzerCustomMutator(std::uint8_t* data,
+                                                                     std::size_t size,
+                                                                     std::size_t maxSize,
+                                                                     unsigned seed);
+
+/// libFuzzer's, when it is there, knows more.
+extern "C" std::size_t LLVMFuzzerMutate(std::uint8_t* data, std::size_t size, std::size_t) {
+  if (size != 0) data[size / 2] ^= 0x11;
+  return size;
+}
 
 namespace {
 
-void replay(const std::filesystem::path& file) {
-  std::ifstream stream(file, std::ios::binary);
-  const std::vector<char> bytes((std::istreambuf_iterator<char>(stream)), {});
+using Bytes = std::vector<std::uint8_t>;
+
+void run(std::span<const std::uint8_t> bytes) {
   // Exactly as large as the input, so that a sanitizer sees the first byte read past it.
   const auto exact = std::make_unique<std::uint8_t[]>(bytes.size());
   std::copy(bytes.begin(), bytes.end(), exact.get());
   LLVMFuzzerTestOneInput(exact.get(), bytes.size());
+}
+
+void replay(const std::filesystem::path& file) {
+  std::ifstream stream(file, std::ios::binary);
+  const Bytes bytes((std::istreambuf_iterator<char>(stream)), {});
+  run(bytes);
+  constexpr std::size_t kRoom = 4096;
+  if (LLVMFuzzerCustomMutator == nullptr || bytes.size() > kRoom) return;
+  constexpr unsigned kChanges = 30;
+  Bytes changed(bytes);
+  std::size_t size = bytes.size();
+  for (unsigned seed = 0; seed < kChanges; ++seed) {
+    changed.resize(kRoom);
+    size = LLVMFuzzerCustomMutator(changed.data(), size, kRoom, seed);
+    run(std::span(changed).first(size));
+  }
 }
 
 }  // namespace

@@ -25,10 +25,13 @@ concept Record = requires {
   typename FieldsOf<T>::List;
 };
 
-class RecordGenerator {
+/// `Random` gives numbers of 64 bits.
+template <class Random>
+class BasicRecordGenerator {
  public:
   /// `presence` of 0 makes every optional field absent, of 1 present.
-  RecordGenerator(std::uint64_t seed, double presence) : random_(seed), present_(presence) {}
+  BasicRecordGenerator(Random random, double presence)
+      : random_(std::move(random)), presence_(presence) {}
 
   /// Lists inside one another end after `depth` of them.
   template <Record R>
@@ -65,7 +68,7 @@ class RecordGenerator {
   }
   template <class T>
   void fill(Optional<T>& value, int depth) {
-    if (present_(random_)) value = some<T>(depth);
+    if (present()) value = some<T>(depth);
   }
   template <class T>
   T some(int depth) {
@@ -78,6 +81,8 @@ class RecordGenerator {
     }
   }
 
+  /// Never for all zeros, unless it is to be always.
+  bool present() { return presence_ >= 1 - static_cast<double>(random_() >> 11) * 0x1p-53; }
   std::uint64_t below(std::uint64_t bound) { return random_() % bound; }
   /// The least, the most, or up to any number of bits, of either sign.
   std::int64_t integer() {
@@ -87,8 +92,13 @@ class RecordGenerator {
     return static_cast<std::int64_t>(random_()) >> pick;
   }
 
-  std::mt19937_64 random_;
-  std::bernoulli_distribution present_;
+  Random random_;
+  double presence_;
+};
+class RecordGenerator : public BasicRecordGenerator<std::mt19937_64> {
+ public:
+  RecordGenerator(std::uint64_t seed, double presence)
+      : BasicRecordGenerator(std::mt19937_64(seed), presence) {}
 };
 
 /// The way to the first field in which two records differ, or nothing.

@@ -13,7 +13,7 @@ namespace ironmoat::testing {
 /// read past them; a Data made in the ordinary way has room behind a short message. For tests and
 /// fuzz targets.
 inline Data tightMessage(std::string_view bytes) {
-  constexpr std::size_t kNoSlackFrom = 4096;
+  constexpr std::size_t kNoSlackFrom = 256;  // smaller blocks have room to spare
   const std::size_t before = kNoSlackFrom - std::min(kNoSlackFrom, bytes.size());
   BlockBuilder builder;
   char* place = builder.extend(before + bytes.size());

@@ -1,0 +1,68 @@
+// How libFuzzer changes messages of the binary form: half the time as a graph of objects, the other
+// half as bytes, which reaches what no writer produces.
+
+#include <algorithm>
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+#include "binary_edits.h"
+
+extern "C" std::size_t LLVMFuzzerMutate(std::uint8_t* data, std::size_t size, std::size_t maxSize);
+extern "C" std::size_t LLVMFuzzerCustomMutator(std::uint8_t* data, std::size_t size,
+                                               std::size_t maxSize, unsigned seed);
+extern "C" std::size_t LLVMFuzzerCustomCrossOver(const std::uint8_t* a, std::size_t aSize,
+                                                 const std::uint8_t* b, std::size_t bSize,
+                                                 std::uint8_t* out, std::size_t maxSize,
+                                                 unsigned seed);
+
+namespace {
+
+using ironmoat::fuzz::BinaryEditor;
+using ironmoat::fuzz::BinarySketch;
+
+std::string_view textOf(const std::uint8_t* data, std::size_t size) {
+  return {reinterpret_cast<const char*>(data), size};
+}
+
+/// Or so little that it may become one.
+bool isBinary(std::string_view message) {
+  return message.size() < 8 || message.starts_with("bplist");
+}
+
+void mutateBytes(std::string& bytes) {
+  const std::size_t size = bytes.size();
+  bytes.resize(size + 16);
+  bytes.resize(LLVMFuzzerMutate(reinterpret_cast<std::uint8_t*>(bytes.data()), size, bytes.size()));
+}
+
+/// Writes the sketch, unless it is too large.
+std::size_t write(const BinarySketch& sketch, std::uint8_t* out, std::size_t maxSize) {
+  const std::string bytes = sketch.write();
+  if (bytes.size() > maxSize) return 0;
+  std::copy(bytes.begin(), bytes.end(), out);
+  return bytes.size();
+}
+
+}  // namespace
+
+extern "C" std::size_t LLVMFuzzerCustomMutator(std::uint8_t* data, std::size_t size,
+                                               std::size_t maxSize, unsigned seed) {
+  if (seed % 2 == 0 && isBinary(textOf(data, size))) {
+    BinarySketch sketch = BinarySketch::parse(textOf(data, size));
+    BinaryEditor editor(sketch, seed, mutateBytes);
+    for (unsigned edits = 1 + seed / 2 % 4; edits > 0; --edits) editor.edit();
+    if (const std::size_t written = write(sketch, data, maxSize); written != 0) return written;
+  }
+  return LLVMFuzzerMutate(data, size, maxSize);
+}
+
+extern "C" std::size_t LLVMFuzzerCustomCrossOver(const std::uint8_t* a, std::size_t aSize,
+                                                 const std::uint8_t* b, std::size_t bSize,
+                                                 std::uint8_t* out, std::size_t maxSize,
+                                                 unsigned seed) {
+  if (!isBinary(textOf(a, aSize)) || !isBinary(textOf(b, bSize))) return 0;
+  BinarySketch sketch = BinarySketch::parse(textOf(a, aSize));
+  BinaryEditor(sketch, seed, mutateBytes).adopt(BinarySketch::parse(textOf(b, bSize)));
+  return write(sketch, out, maxSize);
+}

@@ -1,0 +1,112 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <stdexcept>
+#include <string>
+
+#include "ironmoat/errors.h"
+#include "ironmoat/limits.h"
+#include "plist/document.h"
+#include "plist/reader.h"
+#include "plist/writer.h"
+#include "require.h"
+#include "support/show_document.h"
+
+namespace ironmoat::fuzz {
+
+/// The refusal of a reader, "kind: sentence", or nothing when it accepted the message.
+template <class Read>
+std::string refusalOf(Read read, const Data& message, plist::Document& document) {
+  try {
+    read(message, document);
+    return {};
+  } catch (const DecodingError& error) {
+    require(error.path().empty());
+    require(error.offset().value_or(0) <= message.size());
+    require((error.kind() == DecodingError::Kind::malformed) == error.offset().has_value());
+    return std::string(nameOf(error.kind())) + ": " + error.what();
+  }
+}
+
+/// The tree that a document stands for, walked without trust: shared nodes are counted each time,
+/// up to `most`.
+struct Walk {
+  const plist::Document& document;
+  std::size_t most;
+  std::size_t nodes = 0;
+  std::size_t bytes = 0;
+  bool writable = true;  ///< only kinds that are written occur
+
+  [[nodiscard]] bool tooLarge() const { return nodes > most || bytes > 256 * most; }
+
+  void visit(plist::NodeIndex index, std::uint32_t depth) {
+    using plist::Kind;
+    require(depth <= limits::nestedContainers);
+    ++nodes;
+    if (tooLarge()) return;
+    const plist::Node& node = document.node(index);
+    switch (node.kind) {
+      case Kind::dictionary:
+        for (const plist::NodeIndex key : document.keys(node)) {
+          require(document.node(key).kind == Kind::string);
+          visitChild(key, depth);
+        }
+        for (const plist::NodeIndex value : document.values(node)) visitChild(value, depth);
+        return;
+      case Kind::array:
+        for (const plist::NodeIndex element : document.elements(node)) visitChild(element, depth);
+        return;
+      case Kind::string:
+      case Kind::data:
+        bytes += node.count;
+        return;
+      case Kind::real:
+      case Kind::date:
+      case Kind::uid:
+      case Kind::unsignedInteger:
+        writable = false;
+        return;
+      case Kind::integer:
+      case Kind::boolean:
+        return;
+    }
+  }
+  void visitChild(plist::NodeIndex index, std::uint32_t depth) {
+    const plist::Kind kind = document.node(index).kind;
+    const bool container = kind == plist::Kind::dictionary || kind == plist::Kind::array;
+    if (!tooLarge()) visit(index, depth + (container ? 1 : 0));
+  }
+};
+inline Walk walk(const plist::Document& document) {
+  Walk walk{document, 5000};
+  walk.visit(document.root(), 1);
+  return walk;
+}
+
+/// Reading the same bytes gives the same, and what was read comes back equal from either form.
+template <class Read>
+void checkReading(Read read, const Data& message) {
+  plist::Document document;
+  plist::Document again;
+  const std::string error = refusalOf(read, message, document);
+  require(refusalOf(read, message, again) == error);
+  if (!error.empty()) return;
+  const Walk walked = walk(document);
+  if (walked.tooLarge()) return;
+  const std::string shown = show(document);
+  require(show(again) == shown);
+  if (!walked.writable) return;
+  plist::Document fromBinary;
+  readBinary(writeBinary(document), fromBinary);
+  require(show(fromBinary) == shown);
+  try {
+    plist::Document fromXml;
+    readXml(writeXml(document), fromXml);
+    require(show(fromXml) == shown);
+  } catch (const std::invalid_argument&) {
+    require(read != plist::readXml);  // text that XML cannot hold
+  }
+}
+
+}  // namespace ironmoat::fuzz

@@ -1,0 +1,68 @@
+// Records of every kind, made of the input's bytes: encoded in either form and decoded, each comes
+// back as it was. The first byte chooses the kind, the second how many fields are present.
+
+#include "plist/encoder.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <span>
+
+#include "plist/property_list_decoder.h"
+#include "records/command_response.h"
+#include "records/message_payload.h"
+#include "records/web_tunnel.h"
+#include "require.h"
+#include "slow_decode.h"
+
+namespace {
+
+using namespace ironmoat;
+
+/// The input as a source of random numbers; all zero past its end, which makes fields absent and
+/// lists empty.
+class InputNumbers {
+ public:
+  using result_type = std::uint64_t;
+  explicit InputNumbers(std::span<const std::uint8_t> bytes) : left_(bytes) {}
+  static constexpr result_type min() { return 0; }
+  static constexpr result_type max() { return ~result_type{}; }
+  result_type operator()() {
+    if (left_.empty()) return 0;
+    const std::uint64_t byte = left_.front();
+    left_ = left_.subspan(1);
+    return byte * 0x9E3779B97F4A7C15U;
+  }
+
+ private:
+  std::span<const std::uint8_t> left_;
+};
+
+template <class Wire>
+void roundTrip(std::span<const std::uint8_t> bytes, double presence) {
+  const Wire record =
+      testing::BasicRecordGenerator(InputNumbers(bytes), presence).template make<Wire>(3);
+  for (const plist::Form form : {plist::Form::binary, plist::Form::xml}) {
+    const Data message = plist::PropertyListEncoder(form).encode(record);
+    const Wire again = plist::PropertyListDecoder().decode<Wire>(message);
+    fuzz::require(testing::difference(record, again).empty());
+  }
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  if (size < 2) return 0;
+  const double presence = data[1] / 255.0;
+  const std::span bytes(data + 2, size - 2);
+  switch (data[0] % 3) {
+    case 0:
+      roundTrip<VeskCommandResponseSchema>(bytes, presence);
+      break;
+    case 1:
+      roundTrip<VeskCommandWebTunnelResponseSchema>(bytes, presence);
+      break;
+    default:
+      roundTrip<VeskCorvelProtocolPayload>(bytes, presence);
+  }
+  return 0;
+}

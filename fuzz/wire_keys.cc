@@ -1,0 +1,58 @@
+#include "wire_keys.h"
+
+#include <concepts>
+#include <type_traits>
+#include <vector>
+
+#include "records/command_response.h"
+#include "records/message_payload.h"
+#include "records/payload_parts.h"
+#include "records/web_tunnel.h"
+
+namespace ironmoat::fuzz {
+
+namespace {
+
+template <class T>
+struct HoldsOf {
+  static constexpr Holds value = std::same_as<T, Bool>     ? Holds::boolean
+                                 : std::same_as<T, String> ? Holds::text
+                                 : std::same_as<T, Data>   ? Holds::data
+                                 : std::integral<T>        ? Holds::integer
+                                                           : Holds::record;
+};
+template <class T>
+struct HoldsOf<List<T>> {
+  static constexpr Holds value = std::same_as<T, String> ? Holds::texts : Holds::records;
+};
+template <class T>
+struct HoldsOf<Optional<T>> : HoldsOf<T> {};
+
+template <class R>
+void addKeysOf(std::vector<WireKey>& keys) {
+  constexpr const auto& rows = records::Table<R>::rows;
+  std::size_t place = 0;
+  std::remove_cvref_t<decltype(rows)>::template Fields<R>::forEach([&](auto field) {
+    keys.push_back({rows.keys[place++], HoldsOf<typename decltype(field)::Type>::value});
+  });
+}
+
+template <class... R>
+std::vector<WireKey> keysOf() {
+  std::vector<WireKey> keys;
+  (addKeysOf<R>(keys), ...);
+  return keys;
+}
+
+}  // namespace
+
+std::span<const WireKey> wireKeys() {
+  static const std::vector<WireKey> keys =
+      keysOf<VeskCorvelProtocolPayload, VeskCommandResponseSchema,
+             VeskCommandWebTunnelResponseSchema, VeskCorvelProtocolHttpHeaders,
+             VeskCorvelProtocolDeliveryContext, VeskHoplinePluginRequest,
+             VeskHoplineAllocationStatus, VeskHoplineSelfAllocToken, VeskHoplinePluginAllocation>();
+  return keys;
+}
+
+}  // namespace ironmoat::fuzz

@@ -1,0 +1,19 @@
+#pragma once
+
+#include <cstdint>
+#include <span>
+#include <string_view>
+
+namespace ironmoat::fuzz {
+
+enum class Holds : std::uint8_t { integer, boolean, text, data, texts, record, records };
+
+struct WireKey {
+  std::string_view key;
+  Holds holds;
+};
+
+/// The keys of all records, straight from their tables; one that several records have, once each.
+std::span<const WireKey> wireKeys();
+
+}  // namespace ironmoat::fuzz
