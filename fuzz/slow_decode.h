@@ -35,7 +35,8 @@ inline void describe(std::string& out, Int value) { out += std::to_string(value)
 inline void describe(std::string& out, Int64 value) { out += std::to_string(value) + ";"; }
 inline void describe(std::string& out, Bool value) { out += value ? "yes;" : "no;"; }
 inline void describeBytes(std::string& out, char kind, std::string_view bytes) {
-  out += kind + std::to_string(bytes.size()) + ":";
+  out += kind;
+  out += std::to_string(bytes.size()) + ":";
   out += bytes;
 }
 inline void describe(std::string& out, const String& value) {
@@ -47,7 +48,7 @@ requires requires { typename R::CodingKeys; }
 void describe(std::string& out, const R& record);
 template <class T>
 void describe(std::string& out, const List<T>& list) {
-  out += "[" + std::to_string(list.size()) + ":";
+  out.append("[").append(std::to_string(list.size())).append(":");
   for (const T& element : list) describe(out, element);
 }
 template <class T>
@@ -151,7 +152,7 @@ class SlowDecoder {
     const plist::Node& node = expect(plist::Kind::array, index, path);
     pay(left_.recordBytes, node.count * sizeof(T), path,
         "lists take more memory than the limit of 67108864 bytes");
-    out += "[" + std::to_string(node.count) + ":";
+    out.append("[").append(std::to_string(node.count)).append(":");
     for (std::uint32_t i = 0; i < node.count; ++i) {
       value(document_.elements(node)[i], path + "[" + std::to_string(i) + "]", out,
             static_cast<const T*>(nullptr));

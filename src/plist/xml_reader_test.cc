@@ -221,6 +221,7 @@ TEST(XmlReaderTest, RefusesAndSaysWhere) {
       {"<?xml version='1.0' standalone='~maybe'?><plist><true/></plist>", "neither yes nor no"},
       {"<!DOCTYPE plist ~[<!ENTITY a 'b'>]><plist><true/></plist>", "internal subset"},
       {"<!DOCTYPE plist SYSTEM 'a'~[]><plist><true/></plist>", "internal subset"},
+      {"<!DOCTYPE plist PUBLIC 'a+~&' 'b'><plist><true/></plist>", "no public identifier"},
       {"<!DOCTYPE plist PUBLIC 'a'~><plist><true/></plist>", "no white space"},
       {"<!DOCTYPE plist ~OTHER><plist><true/></plist>", "bad document type"},
       {"<!DOCTYPE a>~<!DOCTYPE a><plist><true/></plist>", "no plist element"},

@@ -93,15 +93,23 @@ void XmlScanner::doctype() {
   const bool isPublic = spaced && take("PUBLIC");
   if (isPublic || (spaced && take("SYSTEM"))) {
     requireSpace();
-    takeQuoted();
     if (isPublic) {
+      publicIdentifier();
       requireSpace();
-      takeQuoted();
     }
+    takeQuoted();
     skipSpace();
   }
   if (peek() == '[') refuse("internal subset");
   if (!take(">")) refuse("bad document type");
+}
+
+void XmlScanner::publicIdentifier() {
+  constexpr std::string_view kCharacters =
+      " \r\nabcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789-'()+,./:=?;!*#@$_%";
+  const std::string_view identifier = takeQuoted();
+  const std::size_t wrong = identifier.find_first_not_of(kCharacters);
+  if (wrong != std::string_view::npos) refuse("no public identifier", identifier.data() + wrong);
 }
 
 void XmlScanner::skipMisc() {

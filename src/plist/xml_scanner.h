@@ -84,6 +84,7 @@ class XmlScanner {
  private:
   void declaration();
   void doctype();
+  void publicIdentifier();
   void requireSpace();
 
   const XmlSource& source_;
