@@ -1,5 +1,6 @@
 #include "ironmoat/client.h"
 
+#include <new>
 #include <optional>
 #include <utility>
 
@@ -19,6 +20,13 @@ template <MessageSchema R>
 class RequestFor final : public client::Request {
  public:
   explicit RequestFor(const Data& message) : Request(R::schemaName, message) {}
+  RequestFor(const RequestFor&) = delete;
+  RequestFor& operator=(const RequestFor&) = delete;
+  /// Only for want of memory is a request dropped that has no outcome. The promise would break
+  /// then, and make the error for that of memory that there may not be.
+  ~RequestFor() override {
+    if (!done_) fail(std::make_exception_ptr(std::bad_alloc()));
+  }
 
   [[nodiscard]] std::future<R> outcome() { return promise_.get_future(); }
 
@@ -36,6 +44,7 @@ class RequestFor final : public client::Request {
     throw frames::FrameError("a reply of unknown status");
   }
   void fail(std::exception_ptr error) noexcept override {
+    done_ = true;
     promise_.set_exception(std::move(error));
   }
 
@@ -49,10 +58,12 @@ class RequestFor final : public client::Request {
     } catch (...) {  // the record's initialiser refused, or memory ran out: no fault of the service
       return fail(std::current_exception());
     }
+    done_ = true;
     promise_.set_value(std::move(*record));
   }
 
   std::promise<R> promise_;
+  bool done_ = false;
 };
 
 }  // namespace

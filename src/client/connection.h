@@ -8,6 +8,7 @@
 #include <mutex>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <thread>
 
 #include "client/admission.h"
@@ -72,7 +73,7 @@ class Connection {
   void startFailed(Lock& lock, const std::string& why, bool passing);
   /// Replaces the process. `what` as from `receive`.
   void lose(Lock& lock, const std::string& what, ServiceError::Kind kind);
-  void failAll(Lock& lock, const std::string& why) noexcept;
+  void failAll(Lock& lock, std::string_view why) noexcept;
 
   const std::string program_;
   const Clock::duration deadline_;

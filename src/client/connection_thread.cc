@@ -7,6 +7,8 @@
 #include <algorithm>
 #include <array>
 #include <exception>
+#include <string>
+#include <string_view>
 #include <utility>
 
 #include "client/connection.h"
@@ -25,9 +27,9 @@ constexpr auto kGraceToEnd = 100ms;     // from a closed socket to a process tha
 constexpr auto kGraceToReadUp = 100ms;  // past a deadline, while replies wait to be read
 constexpr auto kReadOn = 100ms;         // after the last submit
 
-std::exception_ptr serviceError(ServiceError::Kind kind, const std::string& message) noexcept {
+std::exception_ptr serviceError(ServiceError::Kind kind, std::string_view message) noexcept {
   try {
-    return std::make_exception_ptr(ServiceError(kind, message));
+    return std::make_exception_ptr(ServiceError(kind, std::string(message)));
   } catch (...) {  // no memory for the message
     return std::current_exception();
   }
@@ -162,14 +164,16 @@ void Connection::lose(Lock& lock, const std::string& what, ServiceError::Kind ki
     return startFailed(lock, program_ + " " + word + (byItself ? " before it greeted" : ""),
                        byItself);
   }
+  const bool late = kind == ServiceError::Kind::timedOut;
+  // Made before the culprit is taken out, who would have no outcome if memory ran out here.
+  const std::string sentence = late ? word : "the service " + word + " over this message";
   const std::unique_ptr<Request> culprit = queue_.lose();
   if (culprit == nullptr) return;
   admission_.leave(culprit->cost());
-  const bool late = kind == ServiceError::Kind::timedOut;
-  culprit->fail(serviceError(kind, late ? word : "the service " + word + " over this message"));
+  culprit->fail(serviceError(kind, sentence));
 }
 
-void Connection::failAll(Lock& lock, const std::string& why) noexcept {
+void Connection::failAll(Lock& lock, std::string_view why) noexcept {
   state_ = State::absent;
   unwritable_ = false;
   socket_ = -1;
