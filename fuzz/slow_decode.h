@@ -135,8 +135,9 @@ class SlowDecoder {
           inOtherCase |= lowered(document_.text(document_.node(other))) == lowered(key);
         }
         refuse("keyNotFound", below,
-               inOtherCase ? "required key is missing; one that differs from it only in case is there"
-                           : "required key is missing");
+               inOtherCase
+                   ? "required key is missing; one that differs from it only in case is there"
+                   : "required key is missing");
       } else {
         out += '-';
       }
