@@ -69,11 +69,7 @@ class Vectors(unittest.TestCase):
             for line in lines:
                 entry = files[line.pop("file")]
                 with self.subTest(entry["about"]):
-                    if "offset" in (expected := outcome(entry)).get("error", {}):
-                        where = f"at offset {expected['error']['offset']}"
-                        self.assertIn(where, line["error"]["message"])
-                        line["error"]["offset"] = expected["error"]["offset"]
-                    self.assertEqual(comparable(line, entry), expected)
+                    self.assertEqual(comparable(line, entry), outcome(entry))
 
     def test_python_client(self):
         """All of them in flight at once."""
