@@ -1,0 +1,214 @@
+"""Attacks the service as a process, and shows what each comes to.
+
+    attacks.py SERVICE [--size BYTES] [--seconds S] [--mebibytes M] [--refused N] [--table]
+
+Each attack of attack_messages.py meets a fresh service, one message at a time: each must be
+answered within the seconds of processor time, and the service's memory must stay below the
+mebibytes (0: as it likes). Then the heaviest of all come at once, several times over, and each must
+get what it got alone, or a refusal for want of memory. Last, N refused messages must leave no
+memory behind. --table prints the rows of doc/attacks.md. (S1, S3, S4, S5)
+"""
+
+import argparse
+import collections
+import os
+import socket
+import struct
+import subprocess
+import sys
+import threading
+import time
+
+import attack_messages
+
+KINDS = ["malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound"]
+OUTPUT_TYPE = b"DrelUserPayload"
+
+
+class Service:
+    def __init__(self, program):
+        ours, theirs = socket.socketpair()
+        self.process = subprocess.Popen([program], stdin=theirs, stdout=theirs)
+        theirs.close()
+        self.socket = ours
+        self.frame()  # the hello
+
+    def receive(self, count):
+        parts = []
+        while count > 0:
+            part = self.socket.recv(min(count, 1 << 22))
+            if not part:
+                raise EOFError("the service closed its connection")
+            parts.append(part)
+            count -= len(part)
+        return b"".join(parts)
+
+    def frame(self):
+        return self.receive(struct.unpack("<I", self.receive(4))[0])
+
+    def send(self, number, message):
+        start = struct.pack("<QB", number, len(OUTPUT_TYPE)) + OUTPUT_TYPE
+        self.socket.sendall(struct.pack("<I", len(start) + len(message)) + start)
+        self.socket.sendall(message)
+
+    def ask(self, message):
+        """The verdict, and the seconds that it took of the processor, and of the clock."""
+        begun, worked = time.monotonic(), self.worked()
+        sender = threading.Thread(target=self.send, args=(1, message))
+        sender.start()
+        reply = self.frame()
+        seconds = time.monotonic() - begun
+        sender.join()
+        return verdict(reply), self.worked() - worked, seconds
+
+    def worked(self):
+        with open(f"/proc/{self.process.pid}/stat", encoding="ascii") as stat:
+            times = stat.read().rpartition(")")[2].split()[11:13]
+        return sum(map(int, times)) / os.sysconf("SC_CLK_TCK")
+
+    def memory(self, what):
+        """VmHWM (the most there was) or VmRSS (what there is), in MiB."""
+        with open(f"/proc/{self.process.pid}/status", encoding="ascii") as status:
+            for line in status:
+                if line.startswith(what):
+                    return int(line.split()[1]) / 1024
+        raise EOFError("the service is gone")
+
+    def end(self):
+        self.socket.shutdown(socket.SHUT_WR)
+        status = self.process.wait(timeout=60)
+        self.socket.close()
+        if status != 0:
+            raise EOFError(f"the service ended with {status}")
+
+
+def verdict(reply):
+    status = reply[8]
+    if status == 0:
+        return "record"
+    if status != 1:
+        return f"status {status}"
+    path = struct.unpack("<H", reply[18:20])[0]
+    return KINDS[reply[9]] + ": " + reply[20 + path:].decode()
+
+
+def short(verdicts):
+    """What a group of verdicts has in common."""
+    counts = collections.Counter(
+        v.partition(" at offset")[0].replace("limitExceeded: ", "limit: ").replace("malformed: ", "")
+        for v in verdicts)
+    words = [f"{count} × {word}" if len(verdicts) > 1 else word
+             for word, count in counts.most_common(3)]
+    left = sum(counts.values()) - sum(count for _, count in counts.most_common(3))
+    return "; ".join(words) + (f"; {left} others" if left else "")
+
+
+class Run:
+    def __init__(self, options):
+        self.options = options
+        self.wrong = []
+        self.heaviest = []  # (mebibytes, verdict, message)
+
+    def check(self, holds, what):
+        if not holds:
+            self.wrong.append(what)
+            print("WRONG:", what, flush=True)
+
+    def attack(self, group, name, messages):
+        service = Service(self.options.service)
+        verdicts, longest, waited = [], 0, 0
+        try:
+            for message in messages:
+                outcome, seconds, clock = service.ask(message)
+                verdicts.append(outcome)
+                longest, waited = max(longest, seconds), max(waited, clock)
+            peak = service.memory("VmHWM")
+            service.end()
+        except (EOFError, OSError) as error:
+            service.process.kill()
+            self.check(False, f"{group}, {name}: {error} at message {len(verdicts)}")
+            return
+        self.check(not any(v.startswith("status") for v in verdicts), f"{name}: {short(verdicts)}")
+        self.check(longest < self.options.seconds, f"{name}: {longest:.2f} s")
+        if self.options.mebibytes:
+            self.check(peak < self.options.mebibytes, f"{name}: {peak:.0f} MiB")
+        largest = max(range(len(messages)), key=lambda i: len(messages[i]))
+        self.heaviest.append((peak, verdicts[largest], messages[largest]))
+        self.heaviest = sorted(self.heaviest, key=lambda heavy: -heavy[0])[:6]
+        row = (group, name, f"{max(map(len, messages)):,}", short(verdicts),
+               f"{longest * 1000:.0f} ms", f"{waited * 1000:.0f} ms", f"{peak:.0f} MiB")
+        print("| " + " | ".join(row) + " |" if self.options.table else " - ".join(row), flush=True)
+
+    def all_at_once(self):
+        service = Service(self.options.service)
+        rounds = self.options.rounds
+        asked = [(outcome, message) for _ in range(rounds) for _, outcome, message in self.heaviest]
+
+        def send():
+            for number, (_, message) in enumerate(asked):
+                service.send(number, message)
+        begun = time.monotonic()
+        sender = threading.Thread(target=send, daemon=True)
+        sender.start()
+        counts = collections.Counter()
+        for _ in asked:
+            reply = service.frame()
+            number = struct.unpack("<Q", reply[:8])[0]
+            outcome = verdict(reply)
+            counts[outcome.partition(":")[0]] += 1
+            no_memory = outcome == "limitExceeded: the message takes more memory than there is"
+            self.check(no_memory or outcome == asked[number][0],
+                       f"at once: {outcome}, alone: {asked[number][0]}")
+        peak = service.memory("VmHWM")
+        service.end()
+        print(f"the {len(self.heaviest)} heaviest, {rounds} times at once: {dict(counts)}, "
+              f"{time.monotonic() - begun:.1f} s, {peak:.0f} MiB", flush=True)
+
+    def refusals_leave_nothing(self, count):
+        """All refused attacks in the small, over and over."""
+        service = Service(self.options.service)
+        messages = []
+        for _, _, attacks in attack_messages.catalogue(1 << 16):
+            messages += [attack for attack in attacks[:20] if service.ask(attack)[0] != "record"]
+
+        def refuse(count):
+            def send():
+                for number in range(count):
+                    service.send(number, messages[number % len(messages)])
+            sender = threading.Thread(target=send, daemon=True)
+            sender.start()
+            for _ in range(count):
+                self.check(verdict(service.frame()) != "record", "refused before, now a record")
+            return service.memory("VmRSS")
+        # What malloc keeps for later depends on which messages meet: that settles first.
+        before = refuse(max(count // 5, 3 * len(messages)))
+        grown = refuse(count) - before
+        service.end()
+        print(f"{count} messages refused, of {len(messages)} sorts: {before:.1f} MiB before, "
+              f"{grown:+.1f} MiB after", flush=True)
+        if self.options.mebibytes:
+            self.check(grown < 4, f"refusals left {grown:.1f} MiB")
+
+
+def main():
+    parser = argparse.ArgumentParser(description=__doc__.split("\n\n", maxsplit=1)[0])
+    parser.add_argument("service")
+    parser.add_argument("--size", type=int, default=16 << 20)
+    parser.add_argument("--seconds", type=float, default=1)
+    parser.add_argument("--mebibytes", type=float, default=320)
+    parser.add_argument("--rounds", type=int, default=6)
+    parser.add_argument("--refused", type=int, default=100_000)
+    parser.add_argument("--only", default="", help="attacks with this in their group or name")
+    parser.add_argument("--table", action="store_true")
+    run = Run(parser.parse_args())
+    for group, name, messages in attack_messages.catalogue(run.options.size):
+        if run.options.only in group + ": " + name:
+            run.attack(group, name, messages)
+    run.all_at_once()
+    if run.options.refused:
+        run.refusals_leave_nothing(run.options.refused)
+    return 1 if run.wrong else 0
+
+
+if __name__ == "__main__":
+    sys.exit(main())
