@@ -9,7 +9,6 @@
 #include <thread>
 #include <vector>
 
-#include "frames/confinement_bits.h"
 #include "frames/record_codec.h"
 #include "plist/encoder.h"
 #include "records/command_response.h"
@@ -64,7 +63,9 @@ void damage(const std::string& good) {
   }
   for (std::size_t at = 0; at < good.size(); ++at) {
     for (unsigned change = 1; change < 256; ++change) {
-      if (frames::kSanitizedBuild && (change & (change - 1)) != 0) continue;  // single bits
+#if defined(__SANITIZE_THREAD__)
+      if ((change & (change - 1)) != 0) continue;  // single bits: there is one thread here
+#endif
       std::string changed = good;
       changed[at] = static_cast<char>(changed[at] ^ static_cast<char>(change));
       outcome<Unpacker>(testing::tightMessage(changed));
