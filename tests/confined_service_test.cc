@@ -16,6 +16,7 @@
 #include <fstream>
 #include <map>
 #include <memory>
+#include <set>
 #include <string>
 #include <thread>
 
@@ -164,6 +165,26 @@ TEST_F(FullyConfinedService, MemoryIsSharedAndRefusedToWhoWantsItAllAlone) {
   }
   server.endInput();
   EXPECT_EQ(server.end(), 0);
+}
+
+/// Sent at once, so that one thread reads them all.
+TEST(ConfinedService, NoReplyAndNoRequestWaitsBehindAStall) {
+  SpokenTo server(runTestServer);
+  ASSERT_TRUE(server.receive());
+  BlockBuilder frames;
+  std::uint64_t id = 0;
+  for (const std::string_view message : {"before", "stall", "after"}) {
+    frames::appendRequest(frames, ++id, VeskCommandResponse::schemaName, message);
+  }
+  server.send({frames.bytes(), frames.size()});
+  std::set<std::uint64_t> answered;
+  for (std::uint64_t i = 0; i < 3; ++i) {
+    const auto body = server.receive();
+    ASSERT_TRUE(body) << "after " << i;
+    answered.insert(frames::parseReply(*body).id);
+    if (i == 1) server.request(4, "later");
+  }
+  EXPECT_EQ(answered, (std::set<std::uint64_t>{1, 3, 4}));
 }
 
 TEST(ConfinedService, NonBlockingDescriptorsAndStopsDoNotMatter) {

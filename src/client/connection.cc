@@ -21,14 +21,18 @@ namespace ironmoat::client {
 using namespace std::chrono_literals;
 
 namespace {
-constexpr int kWritesInARow = 4;  // before replies are looked at again
-}
+constexpr int kWritesInARow = 4;                 // before replies are looked at again
+constexpr std::size_t kAtOnce = 64;              // replies given out together, at most
+constexpr std::size_t kMostParts = 2 * kAtOnce;  // of a write: two for each request
+}  // namespace
 
 Connection::Connection(Client::Options options)
     : program_(std::move(options.program)),
       deadline_(std::clamp<std::chrono::milliseconds>(options.deadline, 1ms, 24h)),
       admission_(options.maxBytesInFlight),
-      queue_(deadline_) {}
+      queue_(deadline_) {
+  answers_.reserve(kAtOnce);
+}
 
 Connection::~Connection() {
   {
@@ -38,11 +42,6 @@ Connection::~Connection() {
     if (wake_) wake();
   }
   if (thread_.joinable()) thread_.join();
-}
-
-bool Connection::inForkedChild() const noexcept {
-  const pid_t owner = owner_.load(std::memory_order_relaxed);
-  return owner != 0 && owner != ::getpid();
 }
 
 void Connection::submit(std::unique_ptr<Request> request, Then then) {
@@ -59,6 +58,7 @@ void Connection::submit(std::unique_ptr<Request> request, Then then) {
   const std::size_t cost = request->cost();
   if (!admission_.enter(lock, cost)) return refuse("the client is being destroyed");
   const bool othersFirst = queue_.hasUnsent();
+  const bool wasBlocked = blocked_;
   const TimePoint now = Clock::now();
   std::uint64_t id = 0;
   try {
@@ -68,26 +68,32 @@ void Connection::submit(std::unique_ptr<Request> request, Then then) {
     throw;
   }
   if (then == Then::returns) lastSubmit_ = now;
-  if (state_ == State::ready && !othersFirst) flush();
+  // Others may follow it: held back for a moment, many are sent with one system call, by whoever
+  // submits the last of them or by the reader, as soon as a reply comes.
+  const bool held =
+      then == Then::returns && attentive_ && reader_ != Reader::nobody && !queue_.isWorthSending();
+  if (state_ == State::ready && !blocked_ && !held) flush();
 
-  const bool stuck = state_ != State::ready || queue_.hasUnsent();
+  const bool stuck = state_ != State::ready || blocked_;
   if (then == Then::waits && reader_ == Reader::nobody && !stuck && !trouble_) {
     return readUntilAnswered(lock, id);
   }
-  if (waiting_ && ((stuck && !othersFirst) || reader_ == Reader::nobody)) wake();
+  const bool news = state_ == State::ready ? blocked_ && !wasBlocked : !othersFirst;
+  if (waiting_ && (news || reader_ == Reader::nobody)) wake();
 }
 
 void Connection::startThread() {
   if (!wake_) wake_ = FileDescriptor(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK));
   if (!wake_) throw std::system_error(errno, std::generic_category());
-  owner_.store(::getpid(), std::memory_order_relaxed);
+  if (!forkMark_.isSet()) forkMark_.set();
   thread_ = startQuietThread(&Connection::run, this);
 }
 
 void Connection::wake() noexcept { ::eventfd_write(wake_.get(), 1); }
 
 void Connection::flush() {
-  std::array<iovec, 64> parts;
+  blocked_ = false;
+  std::array<iovec, kMostParts> parts;
   for (int i = 0; i < kWritesInARow && !unwritable_; ++i) {
     msghdr message = {};
     message.msg_iov = parts.data();
@@ -97,11 +103,12 @@ void Connection::flush() {
     if (count >= 0) {
       queue_.sent(static_cast<std::size_t>(count));
     } else if (errno == EAGAIN) {
-      return;
+      break;
     } else if (errno != EINTR) {
       unwritable_ = true;  // what it has still said is read before it is given up
     }
   }
+  blocked_ = queue_.hasUnsent();
 }
 
 /// Leaves everything but replies that are in order to the connection's thread.
@@ -124,17 +131,22 @@ void Connection::readUntilAnswered(Lock& lock, std::uint64_t id) {
     std::array<pollfd, 2> fds = {
         {{process_->socket(), POLLIN, 0}, {process_->endedFd(), POLLIN, 0}}};
     const auto expiry = queue_.expiry().value_or(TimePoint::max());
-    const int timeout = waitMilliseconds(Clock::now());
+    const int timeout = readerTimeout(Clock::now());
+    const bool lookedOut = attentive_;
     lock.unlock();
     const int count = ::poll(fds.data(), fds.size(), timeout);
     const int error = errno;
     lock.lock();
     if (count < 0 && error == EINTR) continue;
-    if (count <= 0 || (fds[0].revents & POLLIN) == 0) return;
-    trouble_ = receive(lock);
-    if (trouble_ || Clock::now() >= expiry) return;
+    if (count > 0 && (fds[0].revents & POLLIN) != 0) {
+      attentive_ = true;
+      trouble_ = receive(lock);
+      if (trouble_ || Clock::now() >= expiry) return;
+    } else if (count != 0 || !lookedOut) {
+      return;
+    }
     flush();
-    if (queue_.hasUnsent() && waiting_) wake();
+    if (blocked_ && waiting_) wake();
   }
   turn.orderly = true;
 }
@@ -150,20 +162,17 @@ std::optional<std::string> Connection::receive(Lock& lock) {
     return "";
   }
   assembler_->commit(static_cast<std::size_t>(count));
+  stirred_ = true;
   std::optional<std::string> violation;
   try {
-    while (const auto body = assembler_->next()) {
-      lock.lock();
-      if (state_ == State::greeting) {
+    lock.lock();
+    if (state_ == State::greeting) {
+      if (const std::optional<Data> body = assembler_->next()) {
         const std::string objection = greet(*body);
         if (!objection.empty()) return "cannot be used: " + objection;
-        lock.unlock();
-      } else {
-        const std::unique_ptr<Request> done = settle(lock, *body);
-        lock.unlock();
       }
     }
-    lock.lock();
+    if (state_ == State::ready) settle(lock);
     if (state_ == State::ready && assembler_->midFrame() && !queue_.owesAny()) {
       violation = "sent bytes that nobody asked for";
     }
@@ -188,16 +197,57 @@ std::string Connection::greet(const Data& body) {
   return objection;
 }
 
-std::unique_ptr<Request> Connection::settle(Lock& lock, const Data& body) {
-  const frames::Reply reply = frames::parseReply(body);
-  // Stays where it is without the lock: only the reader takes requests out.
-  Request* request = queue_.owed(reply.id);
-  if (request == nullptr) throw frames::FrameError("a reply to no request");
-  lock.unlock();
-  request->resolve(reply);
-  lock.lock();
-  admission_.leave(request->cost());
-  return queue_.finish(reply.id, Clock::now());
+std::exception_ptr Connection::collect() noexcept {
+  try {
+    while (answers_.size() < kAtOnce) {
+      const std::optional<Data> body = assembler_->next();
+      if (!body) break;
+      answers_.push_back({frames::parseReply(*body), nullptr, nullptr});
+    }
+  } catch (...) {
+    return std::current_exception();
+  }
+  return nullptr;
+}
+
+std::exception_ptr Connection::decode() noexcept {
+  std::size_t good = 0;
+  try {
+    for (; good < answers_.size(); ++good) {
+      const auto& [reply, request, done] = answers_[good];
+      if (request == nullptr || request->taken()) throw frames::FrameError("a reply to no request");
+      request->take(reply);
+    }
+  } catch (...) {
+    answers_.resize(good);
+    return std::current_exception();
+  }
+  return nullptr;
+}
+
+void Connection::settle(Lock& lock) {
+  for (bool more = true; more;) {
+    lock.unlock();
+    std::exception_ptr wrong = collect();
+    more = answers_.size() == kAtOnce;
+    lock.lock();
+    // They stay where they are without the lock: only the reader takes requests out.
+    for (Answer& answer : answers_) answer.request = queue_.owed(answer.reply.id);
+    lock.unlock();
+    if (const std::exception_ptr earlier = decode()) wrong = earlier;
+    lock.lock();
+    const TimePoint now = Clock::now();
+    for (Answer& answer : answers_) {
+      admission_.leave(answer.request->cost());
+      answer.done = queue_.finish(answer.reply.id, now);
+    }
+    lock.unlock();
+    // Newest first: who waits for them in the order of their submission is woken once, when all are
+    // there, and not for each anew.
+    for (; !answers_.empty(); answers_.pop_back()) answers_.back().done->deliver();
+    if (wrong) std::rethrow_exception(wrong);
+    lock.lock();
+  }
 }
 
 }  // namespace ironmoat::client

@@ -68,7 +68,7 @@ void Connection::turn(Lock& lock) {
   watchesEnd_ = reader_ != Reader::caller && state_ != State::absent;
   if (watchesEnd_) ended.fd = process_->endedFd();
   const int timeout = reads && unwritable_        ? 0
-                      : reader_ == Reader::thread ? waitMilliseconds(Clock::now())
+                      : reader_ == Reader::thread ? readerTimeout(Clock::now())
                                                   : -1;
   waiting_ = true;
   lock.unlock();
@@ -85,6 +85,7 @@ void Connection::turn(Lock& lock) {
     if (ended.revents != 0 && reader_ == Reader::nobody) trouble_ = "";
     return;
   }
+  attentive_ = true;
   const bool readable = (socket.revents & POLLIN) != 0;
   if (readable) {
     trouble_ = receive(lock);
@@ -112,7 +113,14 @@ void Connection::chooseReader(TimePoint now) noexcept {
   reader_ = busy ? Reader::thread : Reader::nobody;
 }
 
-/// How long the reader's poll may sleep. With nothing in flight it wakes before anything submitted
+int Connection::readerTimeout(TimePoint now) noexcept {
+  constexpr int kAttentive = 1;
+  attentive_ = std::exchange(stirred_, false);
+  const int wait = waitMilliseconds(now);
+  return attentive_ ? std::min(wait, kAttentive) : wait;
+}
+
+/// With nothing in flight it wakes before anything submitted
 /// meanwhile can be late.
 int Connection::waitMilliseconds(TimePoint now) const noexcept {
   TimePoint until = now + std::min<Clock::duration>(deadline_, kReadOn);

@@ -10,7 +10,7 @@
 
 namespace ironmoat::client {
 
-/// One message on its way to one outcome: `resolve` or `fail` takes effect once.
+/// One message on its way to one outcome: either `take` and then `deliver`, or `fail`, once.
 class Request {
  public:
   Request(std::string_view outputType, Data message)
@@ -25,9 +25,11 @@ class Request {
   /// Bytes that it takes up until its outcome: the message, and about what comes with it.
   [[nodiscard]] std::size_t cost() const noexcept { return message_.size() + 512; }
 
-  /// The outcome that `reply` carries. Throws frames::RecordError or frames::FrameError, with no
-  /// outcome given, when the reply is not what a service would send.
-  virtual void resolve(const frames::Reply& reply) = 0;
+  /// Takes the outcome that `reply` carries, for `deliver` to give. Throws frames::RecordError or
+  /// frames::FrameError, with nothing taken, when the reply is not what a service would send.
+  virtual void take(const frames::Reply& reply) = 0;
+  [[nodiscard]] virtual bool taken() const noexcept = 0;
+  virtual void deliver() noexcept = 0;
   virtual void fail(std::exception_ptr error) noexcept = 0;
 
  private:

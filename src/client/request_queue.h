@@ -2,6 +2,7 @@
 
 #include <sys/uio.h>
 
+#include <algorithm>
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
@@ -34,6 +35,8 @@ class RequestQueue {
   /// Requests given to a process and not yet answered, at most: bounds how many become suspects.
   static constexpr std::size_t kWindow = 256;
 
+  static constexpr std::size_t kWorthSending = 16;
+
   explicit RequestQueue(Clock::duration deadline) : deadline_(deadline) {}
 
   /// Returns its id.
@@ -48,6 +51,11 @@ class RequestQueue {
   /// The first `bytes` of what `gather` gave have been sent.
   void sent(std::size_t bytes);
   [[nodiscard]] bool hasUnsent() const noexcept;
+  /// There is enough unsent to be worth a system call, for a service that has work meanwhile: as
+  /// much again as it has, or kWorthSending. A single request is, when none is under way.
+  [[nodiscard]] bool isWorthSending() const noexcept {
+    return sendableEnd() - next_ >= std::clamp<std::size_t>(owedCount_, 1, kWorthSending);
+  }
 
   /// The request that `id` names, if its reply is owed; it stays owed until `finish`.
   [[nodiscard]] Request* owed(std::uint64_t id) noexcept;

@@ -14,7 +14,9 @@ using namespace std::chrono_literals;
 class Silent final : public Request {
  public:
   explicit Silent(std::string_view text) : Request("R", Data(text)) {}
-  void resolve(const frames::Reply&) override {}
+  void take(const frames::Reply&) override {}
+  [[nodiscard]] bool taken() const noexcept override { return false; }
+  void deliver() noexcept override {}
   void fail(std::exception_ptr) noexcept override {}
 };
 
@@ -136,6 +138,19 @@ TEST_F(RequestQueueTest, AProcessIsGivenSoManyAtOnce) {
   EXPECT_EQ(queue_.owed(RequestQueue::kWindow + 1), nullptr);
   finish(7);
   EXPECT_EQ(send(), std::to_string(RequestQueue::kWindow + 1) + "m ");
+}
+
+TEST_F(RequestQueueTest, WhatIsWorthSendingGrowsWithWhatIsOwed) {
+  restart();
+  std::size_t owed = 0;
+  for (const std::size_t worth : {1, 1, 2, 4, 8, 16, 16, 16}) {
+    for (std::size_t unsent = 1; unsent <= worth; ++unsent) {
+      push("m");
+      EXPECT_EQ(queue_.isWorthSending(), unsent == worth) << unsent << " for " << owed;
+    }
+    send();
+    owed += worth;
+  }
 }
 
 }  // namespace

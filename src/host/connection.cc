@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <chrono>
 #include <cstdint>
 #include <utility>
 
@@ -14,6 +15,10 @@
 namespace ironmoat::host {
 
 namespace {
+
+constexpr std::size_t kWorthCalling = std::size_t{16} << 10;  // bytes: some 30 microseconds' work
+constexpr std::size_t kMostSmall = std::size_t{64} << 10;     // bytes of small replies that wait
+constexpr auto kPatience = std::chrono::milliseconds(1);
 
 enum class Readiness : std::uint8_t { toRead, toWrite };
 
@@ -35,48 +40,134 @@ bool waitOut(int descriptor, Readiness readiness) {
 RequestSource::RequestSource(int descriptor)
     : descriptor_(descriptor), assembler_(frames::kMaxRequestBody, Sharing::oneThread) {}
 
-std::optional<Data> RequestSource::next() {
-  const std::lock_guard lock(mutex_);
+std::optional<Data> RequestSource::next(const std::function<void()>& beforeWaiting) {
+  Lock lock(mutex_);
   while (!ended_) {
-    try {
-      if (std::optional<Data> body = assembler_.next()) return body;
-    } catch (const frames::FrameError&) {
-      ended_ = true;
-      throw;
-    }
-    const std::span<char> room = assembler_.room();
-    const ssize_t count = read(descriptor_, room.data(), room.size());
-    if (count > 0) {
-      assembler_.commit(static_cast<std::size_t>(count));
-    } else if (count == 0 || !waitOut(descriptor_, Readiness::toRead)) {
-      ended_ = true;
+    if (std::optional<Data> body = take()) return body;
+    const bool reads = !reading_;
+    const std::span<char> room = reads ? assembler_.room() : std::span<char>();
+    reading_ = true;
+    lock.unlock();
+    beforeWaiting();
+    if (reads) {
+      const std::size_t count = readSome(room);
+      lock.lock();
+      reading_ = false;
+      if (count == 0) end();
+      if (!ended_) assembler_.commit(count);
+    } else {
+      lock.lock();
+      if (!reading_ || ended_ || !watch(lock)) continue;
+      lock.unlock();
+      beforeWaiting();
+      lock.lock();
     }
   }
   return std::nullopt;
 }
 
-void RequestSource::close() {
-  const std::lock_guard lock(mutex_);
+std::optional<Data> RequestSource::take() {
+  if (reading_) return std::nullopt;
+  std::optional<Data> body;
+  try {
+    body = assembler_.next();
+  } catch (const frames::FrameError&) {
+    end();
+    throw;
+  }
+  if (!body) return body;
+  ++taken_;
+  const bool forTwo = std::max(body->size(), assembler_.buffered()) >= kWorthCalling;
+  if (watching_ && !called_ && (forTwo || asleep_)) {
+    called_ = forTwo;
+    asleep_ = false;
+    watcher_.notify_one();
+  }
+  return body;
+}
+
+std::size_t RequestSource::readSome(std::span<char> room) const noexcept {
+  ssize_t count = 0;
+  do {
+    count = read(descriptor_, room.data(), room.size());
+  } while (count < 0 && waitOut(descriptor_, Readiness::toRead));
+  return count > 0 ? static_cast<std::size_t>(count) : 0;
+}
+
+bool RequestSource::watch(Lock& lock) {
+  if (watching_) {
+    others_.wait(lock);
+    return false;
+  }
+  watching_ = true;
+  bool stepsIn = false;
+  while (!called_ && !ended_ && !stepsIn) {
+    const std::uint64_t before = taken_;
+    if (watcher_.wait_for(lock, kPatience) == std::cv_status::no_timeout || taken_ != before) {
+      continue;
+    }
+    if (reading_) {  // nothing comes; whoever takes the next request says so
+      asleep_ = true;
+      watcher_.wait(lock, [this] { return !asleep_; });
+    } else {
+      stepsIn = true;
+    }
+  }
+  watching_ = called_ = false;
+  others_.notify_one();
+  return stepsIn;
+}
+
+void RequestSource::end() noexcept {
   ended_ = true;
+  asleep_ = false;
+  watcher_.notify_all();
+  others_.notify_all();
+}
+
+void RequestSource::close() {
+  const Lock lock(mutex_);
+  end();
 }
 
 ReplySink::ReplySink(int descriptor) : descriptor_(descriptor) {
-  waiting_.reserve(kMostFrames);
-  batch_.reserve(kMostFrames);
+  for (Batch* each : {&waiting_, &batch_}) {
+    each->small.reserve(kMostSmall);
+    each->large.reserve(kMostFrames);
+  }
 }
 
-void ReplySink::send(BlockRef frame) {
-  std::unique_lock lock(mutex_);
-  written_.wait(lock, [&] {
-    return (waitingBytes_ < kMostWaiting && waiting_.size() < kMostFrames) || broken_;
-  });
-  if (broken_ || !frame) return;
-  waitingBytes_ += frame->size();
-  waiting_.push_back(std::move(frame));
+bool ReplySink::hasRoom() const noexcept {
+  return waitingBytes_ < kMostWaiting && waiting_.large.size() < kMostFrames &&
+         kMostSmall - waiting_.small.size() >= kSmall;
+}
+
+void ReplySink::add(BlockBuilder& frame) {
+  Lock lock(mutex_);
+  written_.wait(lock, [this] { return hasRoom() || broken_; });
+  if (broken_ || frame.size() == 0) return;
+  waitingBytes_ += frame.size();
+  if (frame.size() <= kSmall) {
+    waiting_.small.insert(waiting_.small.end(), frame.bytes(), frame.bytes() + frame.size());
+    frame.truncate(0);
+    // Not what an attempt at a large one has left: memory is shared.
+    if (frame.capacity() > kWorthWriting) static_cast<void>(frame.finish());
+  } else {
+    waiting_.large.push_back(frame.finish());
+  }
+  if (waitingBytes_ >= kWorthWriting || !hasRoom()) write(lock);
+}
+
+void ReplySink::flush() {
+  Lock lock(mutex_);
+  write(lock);
+}
+
+void ReplySink::write(Lock& lock) {
   if (writing_) return;
   writing_ = true;
   while (!waiting_.empty()) {
-    batch_.swap(waiting_);
+    std::swap(batch_, waiting_);
     waitingBytes_ = 0;
     lock.unlock();
     written_.notify_all();
@@ -87,27 +178,36 @@ void ReplySink::send(BlockRef frame) {
   writing_ = false;
 }
 
-void ReplySink::writeAll(const std::vector<BlockRef>& frames) {
+void ReplySink::writeAll(const Batch& batch) {
   constexpr std::size_t kMostPieces = 64;
-  std::size_t first = 0;
-  std::size_t written = 0;  // bytes of frames[first] that are out
-  while (first < frames.size() && !broken_) {
-    iovec pieces[kMostPieces];
-    const std::size_t count = std::min(kMostPieces, frames.size() - first);
-    for (std::size_t i = 0; i < count; ++i) {
-      const std::size_t skip = i == 0 ? written : 0;
-      const Block& block = *frames[first + i].get();
-      pieces[i] = {const_cast<char*>(block.bytes()) + skip, block.size() - skip};
+  iovec pieces[kMostPieces];
+  std::size_t count = 0;
+  pieces[count++] = {const_cast<char*>(batch.small.data()), batch.small.size()};
+  for (const BlockRef& frame : batch.large) {
+    if (count == kMostPieces) {
+      writeAll(pieces);
+      count = 0;
     }
-    const ssize_t result = writev(descriptor_, pieces, static_cast<int>(count));
+    pieces[count++] = {const_cast<char*>(frame->bytes()), frame->size()};
+  }
+  writeAll({pieces, count});
+}
+
+void ReplySink::writeAll(std::span<iovec> pieces) {
+  while (!pieces.empty() && !broken_) {
+    const ssize_t result = writev(descriptor_, pieces.data(), static_cast<int>(pieces.size()));
     if (result < 0) {
       if (!waitOut(descriptor_, Readiness::toWrite)) broken_ = true;
       continue;
     }
-    written += static_cast<std::size_t>(result);
-    while (first < frames.size() && written >= frames[first]->size()) {
-      written -= frames[first]->size();
-      ++first;
+    auto written = static_cast<std::size_t>(result);
+    while (!pieces.empty() && written >= pieces.front().iov_len) {
+      written -= pieces.front().iov_len;
+      pieces = pieces.subspan(1);
+    }
+    if (written > 0) {
+      pieces.front().iov_base = static_cast<char*>(pieces.front().iov_base) + written;
+      pieces.front().iov_len -= written;
     }
   }
 }

@@ -96,46 +96,50 @@ void IronmoatServer::run() {
   host::RequestSource source(STDIN_FILENO);
   host::MemoryTurns turns;
 
+  // Replies are added and written within a turn, for it is memory that counts.
+  const auto flush = [&] {
+    const std::shared_lock together(turns);
+    sink.flush();
+  };
   const auto next = [&] {
     for (int failures = 0;; ++failures) {
       try {
-        return source.next();
+        return source.next(flush);
       } catch (const std::bad_alloc&) {
         if (failures == kMostFailuresToRead) throw;
         const std::unique_lock othersAreDone(turns);
+        sink.flush();
       }
     }
   };
-  // A reply is sent within the turn, for it is memory that counts.
-  const auto reply = [&](const Data& request) {
+  const auto reply = [&](const Data& request, BlockBuilder& frame) {
     try {
       const std::shared_lock together(turns);
-      BlockBuilder frame(Sharing::oneThread);
       answer(request, frame);
-      return sink.send(frame.finish());
+      return sink.add(frame);
     } catch (const std::bad_alloc&) {  // once more, then, below
+      static_cast<void>(frame.finish());
     }
     const std::unique_lock alone(turns);
-    BlockBuilder frame(Sharing::oneThread);
+    sink.flush();
     serve(request, frame);
-    sink.send(frame.finish());
+    sink.add(frame);
   };
-  // Leader and followers: whoever holds the source takes the next request out and serves it, while
-  // the next one takes its place.
   const auto serveAll = [&] {
+    BlockBuilder frame(Sharing::oneThread);
     try {
       while (!sink.broken()) {
         const std::optional<Data> request = next();
-        if (!request) return;
-        reply(*request);
+        if (!request) break;
+        reply(*request, frame);
       }
     } catch (const frames::FrameError& error) {
-      BlockBuilder frame(Sharing::oneThread);
       frames::appendSentence(frame, 0, Status::notServed, error.what());
-      sink.send(frame.finish());
+      sink.add(frame);
     } catch (const std::bad_alloc&) {
       // Not even room for an error: an end in order, and the peer may start another service.
     }
+    flush();
     source.close();
   };
 
@@ -162,7 +166,8 @@ void IronmoatServer::run() {
   if (confine_ == Confine::yes) hello.confinement = confineOrExit();
   BlockBuilder greeting;
   frames::appendHello(greeting, hello);
-  sink.send(greeting.finish());
+  sink.add(greeting);
+  sink.flush();
   confined.count_down();
 }
 
