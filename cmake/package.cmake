@@ -41,17 +41,15 @@ connection.
 .
 ${contents}")
   if(CMAKE_INSTALL_PREFIX STREQUAL /usr)
-    set(papers DESTINATION ${CMAKE_INSTALL_DATAROOTDIR}/doc/${name} COMPONENT ${component})
-    install(FILES ${PROJECT_SOURCE_DIR}/packaging/debian/copyright ${papers})
-    install(FILES ${PROJECT_BINARY_DIR}/changelog.Debian.gz ${papers})
+    install(FILES ${changelog} ${debian_changelog} ${PROJECT_SOURCE_DIR}/packaging/debian/copyright
+      DESTINATION ${CMAKE_INSTALL_DATAROOTDIR}/doc/${name} COMPONENT ${component})
   endif()
 endmacro()
 
 if(CMAKE_INSTALL_PREFIX STREQUAL /usr)
-  configure_file(${PROJECT_SOURCE_DIR}/packaging/debian/changelog.in
-    ${PROJECT_BINARY_DIR}/changelog.Debian)
-  execute_process(COMMAND gzip -9nf ${PROJECT_BINARY_DIR}/changelog.Debian
-    COMMAND_ERROR_IS_FATAL ANY)
+  ironmoat_compressed(changelog ${PROJECT_SOURCE_DIR}/CHANGELOG.md changelog COPYONLY)
+  ironmoat_compressed(debian_changelog ${PROJECT_SOURCE_DIR}/packaging/debian/changelog.in
+    changelog.Debian @ONLY)
 endif()
 
 ironmoat_package(service ironmoat utils "service"
