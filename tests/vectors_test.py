@@ -14,6 +14,8 @@ import subprocess
 import sys
 import unittest
 
+import message_model
+
 ROOT = pathlib.Path(__file__).resolve().parents[1]
 sys.path.append(str(ROOT / "examples/python"))
 import ironmoat  # noqa: E402
@@ -57,9 +59,7 @@ class Vectors(unittest.TestCase):
                        check=True)
 
     def test_tool(self):
-        for kind, output_type in (("payload", "DrelUserPayload"),
-                                  ("command-response", "VeskCommandResponse"),
-                                  ("web-tunnel-response", "VeskCommandWebTunnelResponse")):
+        for kind, (_, output_type) in message_model.RECORDS.items():
             files = {file: entry for entry in ENTRIES if entry["outputType"] == output_type
                      for file in entry["files"]}
             result = subprocess.run([TOOL, "--type", kind, "--format", "json", *files], cwd=VECTORS,
