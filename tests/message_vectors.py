@@ -106,17 +106,18 @@ class Vectors:
     # Refused messages.
 
     def wrong_kinds(self):
-        """A wrong value for the first field of each type, top-level records first."""
+        """A wrong value for the first field of each type."""
         seen = set()
         for kind, (name, _) in RECORDS.items():
             for field in self.model.fields[name]:
-                if field["type"] in seen:
-                    continue
-                seen.add(field["type"])
-                wrong = wrong_values(field["type"], True)[0]
-                short = field["type"].replace(LIST_OF, "list-of-")
-                self.add(kind, f"no-{short}", f"{field['type']} wanted, another kind found",
-                         {"c": 96} | {field["key"]: wrong})
+                wanted = field["type"]
+                for record in self.model.fields:
+                    wanted = wanted.replace(record, "record")
+                if wanted not in seen:
+                    seen.add(wanted)
+                    self.add(kind, "no-" + wanted.replace(" ", "-"),
+                             f"{wanted} wanted, another kind found",
+                             {"c": 96} | {field["key"]: wrong_values(field["type"], True)[0]})
 
     def faults(self):
         add = self.add
