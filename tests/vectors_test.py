@@ -115,7 +115,7 @@ class PythonClient(unittest.TestCase):
 
     def test_the_message_at_fault_fails_alone(self):
         messages = [b"a 1", b"crash 2", b"b 3", b"stall 4", b"c 5"]
-        client = Client(TEST_SERVER, patience=2)
+        client = Client(TEST_SERVER, patience=5)
         answers = client.unpack([("VeskCommandResponse", message) for message in messages])
         self.assertEqual([isinstance(answer, dict) and answer["command"] for answer in answers],
                          [1, False, 3, False, 5])
