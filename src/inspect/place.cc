@@ -1,7 +1,7 @@
 #include "inspect/place.h"
 
 #include <algorithm>
-#include <vector>
+#include <deque>
 
 #include "inspect/message_text.h"
 
@@ -11,6 +11,8 @@ namespace {
 
 constexpr std::string_view kHexDigits = "0123456789abcdef";
 constexpr std::string_view kCut = "...";
+
+bool isBlank(char32_t value) { return value == ' ' || value == '\t'; }
 
 bool isBinary(const Data& message) { return message.view().starts_with("bplist"); }
 
@@ -44,48 +46,67 @@ Cell cellOf(const CodePoint& point, std::string_view bytes) {
   return cell;
 }
 
+/// Some of a line, a cell for each character.
+class Cells {
+ public:
+  explicit Cells(const MessageText& text) : text_(text) {}
+
+  /// Appends the character at `at`, and moves on behind it.
+  void take(std::size_t& at) {
+    const CodePoint point = text_.at(at);
+    std::string buffer;
+    cells_.push_back(cellOf(point, text_.utf8(at, point, buffer)));
+    columns_ += cells_.back().columns;
+    at += point.length;
+  }
+  void dropFirst() {
+    columns_ -= cells_.front().columns;
+    cells_.pop_front();
+  }
+  void dropLast() {
+    columns_ -= cells_.back().columns;
+    cells_.pop_back();
+  }
+  [[nodiscard]] std::size_t size() const { return cells_.size(); }
+  [[nodiscard]] std::size_t columns() const { return columns_; }
+  [[nodiscard]] std::string shown() const {
+    std::string all;
+    for (const Cell& cell : cells_) all += cell.shown;
+    return all;
+  }
+
+ private:
+  const MessageText& text_;
+  std::deque<Cell> cells_;
+  std::size_t columns_ = 0;
+};
+
 /// The line around `offset`, from its first visible character on, cut to what there is room for.
 void appendText(std::string& out, const Data& message, std::size_t offset, const Style& style,
                 std::size_t indent) {
   const MessageText text(message);
   const std::size_t room = roomFor(style, indent);
-  const std::size_t roomBefore = room / 2;
-  std::vector<Cell> cells;
-  std::size_t before = 0;  // columns of the cells in front of the place
-  std::size_t first = 0;   // of the cells that are shown
-  bool cut = false;
-  std::size_t at = text.startNear(offset, 2 * roomBefore, cut);
-  const auto next = [&] {
-    const CodePoint point = text.at(at);
-    std::string buffer;
-    cells.push_back(cellOf(point, text.utf8(at, point, buffer)));
-    at += point.length;
+  const auto goesOn = [&](std::size_t at) {
+    return at < message.size() && !isLineEnd(text.at(at).value);
   };
-  while (at < offset) {
-    const CodePoint point = text.at(at);
-    if (cells.empty() && !cut && (point.value == ' ' || point.value == '\t')) {
-      at += point.length;
-      continue;
-    }
-    next();
-    before += cells.back().columns;
+  bool cut = false;
+  std::size_t at = text.startNear(offset, room, cut);
+  while (!cut && at < offset && isBlank(text.at(at).value)) at += text.at(at).length;
+  Cells before(text);
+  while (at < offset) before.take(at);
+  for (; before.columns() > room / 2; cut = true) before.dropFirst();
+
+  Cells after(text);
+  while (after.size() < room && goesOn(at)) after.take(at);
+  const std::string front = std::string(cut ? kCut : "") + before.shown();
+  const std::size_t mark = before.columns() + (cut ? kCut.size() : 0);
+  bool cutAfter = goesOn(at);
+  while (mark + after.columns() + (cutAfter ? kCut.size() : 0) > room) {
+    after.dropLast();
+    cutAfter = true;
   }
-  for (; before > roomBefore; cut = true) before -= cells[first++].columns;
-  std::size_t width = before;
-  while (at < message.size() && !isLineEnd(text.at(at).value)) {
-    const std::size_t here = at;
-    next();
-    width += cells.back().columns;
-    if (width + 2 * kCut.size() > room) {
-      cells.pop_back();
-      at = here;
-      break;
-    }
-  }
-  std::string line(cut ? kCut : "");
-  for (std::size_t i = first; i < cells.size(); ++i) line += cells[i].shown;
-  if (at < message.size() && !isLineEnd(text.at(at).value)) line += kCut;
-  appendMarked(out, line, before + (cut ? kCut.size() : 0), 1, style, indent);
+  appendMarked(out, front + after.shown() + std::string(cutAfter ? kCut : ""), mark, 1, style,
+               indent);
 }
 
 /// Some bytes from before `offset` on, in hexadecimal and, where there is room, as ASCII.

@@ -41,8 +41,13 @@ TEST(Place, LongLinesAreCutAroundIt) {
   const std::string line = std::string(1000, 'a') + "!" + std::string(1000, 'b');
   EXPECT_EQ(place(line, 1000, 33),
             "line 1, column 1001\n  ...aaaaaaaaaaaaaaa!bbbbbbbb...\n                    ^\n");
-  const std::string wide(3000, '\xF0');
-  EXPECT_LT(place(wide, 2000).size(), 400U);
+  EXPECT_EQ(place("<a>" + std::string(15, 'b') + "<c/></a>", 3, 33),
+            "line 1, column 4\n  <a>" + std::string(15, 'b') + "<c/></a>\n     ^\n");
+  std::string marks = "a";
+  for (int i = 0; i < 3000; ++i) marks += "\xCC\x81";  // no columns at all
+  for (const std::string& wide : {marks, std::string(3000, '\xF0')}) {
+    EXPECT_LT(place(wide, 2001).size(), 400U);
+  }
 }
 
 TEST(Place, OfBytesIsAnOffsetAndSomeBytesAround) {
