@@ -30,17 +30,21 @@ std::uint64_t placeInBinary(NodeIndex node, std::span<const std::uint8_t> messag
 /// Every element but the root's own is one node, in the order of the start tags; what else has a
 /// '<' is markup that is skipped: no attribute has.
 std::uint64_t placeInXml(NodeIndex node, const Data& message) {
-  const XmlSource source(message);
+  const XmlSource source(message, XmlSource::Characters::known);
   XmlScanner in(source);
   in.skipProlog();
   in.take("<plist");
   while (!in.atEnd()) {
-    if (in.peek() != '<') {
-      in.advance(std::min(in.rest().find('<'), in.rest().size()));
-    } else if (in.take("<![CDATA[")) {
-      in.takeUntil("]]>");
-    } else if (!in.skipMarkup()) {
-      if (in.peek(1) != '/' && node-- == 0) break;
+    in.advance(std::min(in.rest().find('<'), in.rest().size()));
+    const char next = in.peek(1);
+    if (next == '!' || next == '?') {
+      if (in.take("<![CDATA[")) {
+        in.takeUntil("]]>");
+      } else if (!in.skipMarkup()) {
+        in.advance(1);
+      }
+    } else {
+      if (in.atEnd() || (next != '/' && node-- == 0)) break;
       in.advance(1);
     }
   }

@@ -31,7 +31,7 @@ bool equalsIgnoringCase(std::string_view text, std::string_view word) noexcept {
 
 }  // namespace
 
-XmlSource::XmlSource(const Data& message)
+XmlSource::XmlSource(const Data& message, Characters characters)
     : message_(message), block_(shared(message.slice().block())) {
   const std::string_view bytes = message.view();
   if (bytes.starts_with("\xFE\xFF") || bytes.starts_with("\xFF\xFE")) {
@@ -40,6 +40,7 @@ XmlSource::XmlSource(const Data& message)
   } else {
     text_ = bytes.starts_with(kUtf8Mark) ? bytes.substr(kUtf8Mark.size()) : bytes;
   }
+  if (characters == Characters::known) return;
   const std::size_t valid = xmlTextPrefix(text_);
   if (valid != text_.size()) refuse("no character of xml", text_.data() + valid);
 }

@@ -12,8 +12,11 @@ namespace ironmoat::plist {
 /// transcoded into a block of its own; any other is its own text.
 class XmlSource {
  public:
-  /// Throws DecodingError for bytes that are no such text. Keeps a reference to `message`.
-  explicit XmlSource(const Data& message);
+  enum class Characters { unknown, known };
+
+  /// Throws DecodingError for bytes that are no such text; `known` ones have been such a source
+  /// before, which is not checked again. Keeps a reference to `message`.
+  explicit XmlSource(const Data& message, Characters characters = Characters::unknown);
 
   /// The message is UTF-16; its text here is UTF-8 all the same.
   [[nodiscard]] bool isUtf16() const noexcept { return utf16_; }
