@@ -1,3 +1,5 @@
+#include <algorithm>
+
 #include "inspect/place.h"
 #include "inspect/report.h"
 
@@ -57,17 +59,39 @@ class TextReport : public Report {
 
   void addReason(const Failure& failure, const Data& message, std::size_t indent) {
     const Colours& colours = terminal_.errorColours();
+    const std::size_t start = text_.rfind('\n') + 1;  // of the line
     text_.append(colours.error).append(failure.kind).append(colours.end);
     if (!failure.path.empty()) {
       text_ += " at ";
       appendHarmless(text_, failure.path);
     }
-    text_ += ": ";
-    appendHarmless(text_, failure.message);
-    text_ += '\n';
+    text_ += ':';
+    const std::size_t unseen = colours.error.size() + colours.end.size();
+    addWords(failure.message, text_.size() - start - unseen, indent + 2);
     if (failure.offset) {
       appendPlace(text_, message, *failure.offset, {colours, terminal_.errorWidth()}, indent);
     }
+  }
+
+  /// A sentence behind `column` columns, on more lines where the screen is too narrow.
+  void addWords(std::string_view sentence, std::size_t column, std::size_t indent) {
+    std::string words;
+    appendHarmless(words, sentence);
+    const std::size_t width = terminal_.errorWidth();
+    for (std::size_t at = 0; at < words.size();) {
+      const std::size_t end = std::min(words.find(' ', at), words.size());
+      column += 1 + end - at;
+      if (width != 0 && column > width) {
+        text_ += '\n';
+        text_.append(indent, ' ');
+        column = indent + end - at;
+      } else {
+        text_ += ' ';
+      }
+      text_.append(words, at, end - at);
+      at = end + 1;
+    }
+    text_ += '\n';
   }
 
   const bool automatic_;
