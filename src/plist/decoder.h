@@ -91,6 +91,9 @@ class Decoder {
     left -= amount;
   }
   [[noreturn]] void failLimit(const char* what, std::size_t limit, const char* unit) const;
+  [[nodiscard]] DecodingError mismatch(Kind expected) const;
+  [[nodiscard]] DecodingError outOfRange() const;
+  [[nodiscard]] DecodingError missing(std::string_view key) const;
   [[nodiscard]] std::string path() const;
   [[nodiscard]] std::optional<std::uint64_t> offset() const;
 
