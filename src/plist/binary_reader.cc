@@ -11,6 +11,10 @@
 #include "plist/refusal.h"
 #include "values/utf8.h"
 
+#if defined(__SSE2__)
+#include <emmintrin.h>
+#endif
+
 namespace ironmoat::plist {
 
 using binary::Marker;
@@ -52,11 +56,14 @@ class BinaryReader {
   /// trailer that stays inside the message, since the trailer's 32 bytes follow.
   static std::uint64_t bigEndian(const unsigned char* bytes, std::size_t size) {
     static_assert(binary::kTrailerSize >= 8);
+    static_assert(std::endian::native == std::endian::little);
     std::uint64_t word;
     std::memcpy(&word, bytes, sizeof word);
     return __builtin_bswap64(word) >> (64 - 8 * size);
   }
 
+  /// A length that follows in one byte.
+  static constexpr std::uint8_t kByteFollows = 0x10;
   static constexpr std::uint16_t kTooDeep = limits::nestedContainers + 1;
   static constexpr std::uint16_t kOpen = std::numeric_limits<std::uint16_t>::max();
 
@@ -97,21 +104,54 @@ class BinaryReader {
   }
 
   void readObjects() {
-    Node* nodes = nodes_.extend(objectCount_);
+    Node* const nodes = nodes_.extend(objectCount_);
+    // Copies, which the compiler need not load again for each object.
+    const unsigned char* const bytes = bytes_;
+    const std::size_t end = objectsEnd_;
+    const std::size_t count = objectCount_;
+    const std::size_t offsetSize = offsetSize_;
+    const std::size_t base = base_;
     // Objects may overlap, but not so much that their sum exceeds the room they share: that bounds
     // the work by the size of the message.
-    std::size_t room = objectsEnd_ - binary::kHeader.size();
-    for (std::size_t i = 0; i < objectCount_; ++i) {
-      const std::size_t entry = objectsEnd_ + i * offsetSize_;
-      const std::uint64_t offset = bigEndian(bytes_ + entry, offsetSize_);
-      if (offset < binary::kHeader.size() || offset >= objectsEnd_) {
+    std::size_t room = end - binary::kHeader.size();
+    std::size_t entry = end;
+    for (std::size_t i = 0; i < count; ++i, entry += offsetSize) {
+      const std::uint64_t offset = bigEndian(bytes + entry, offsetSize);
+      if (offset - binary::kHeader.size() >= end - binary::kHeader.size()) {  // below it, too
         throw malformed("object offset out of bounds", entry);
       }
-      current_ = static_cast<NodeIndex>(i);
       const std::size_t start = static_cast<std::size_t>(offset);
-      const std::size_t end = readObject(start, nodes[i]);
-      if (end - start > room) throw malformed("objects overlap", start);
-      room -= end - start;
+      const std::uint8_t marker = bytes[start];
+      const auto kind = static_cast<Marker>(marker >> 4);
+      // Most objects are short texts (keys are), data or integers: in line, a seventh off a typical
+      // message. Whatever is not quite so is left to `readObject`, refusals too.
+      std::size_t body = start + 1;
+      std::size_t length = marker & 0x0F;
+      std::size_t size = 0;
+      if (kind == Marker::ascii || kind == Marker::data) {
+        bool fits = true;
+        if (length == binary::kLengthFollows) {
+          fits = bytes[body] == kByteFollows;
+          length = bytes[body + 1];  // inside the message: the trailer is longer than that
+          body += 2;
+        }
+        fits = fits && body + length <= end;
+        if (fits && (kind == Marker::data || isAsciiInside(bytes + body, length))) {
+          size = body + length - start;
+          nodes[i] = {kind == Marker::data ? Kind::data : Kind::string, false, 0,
+                      static_cast<std::uint32_t>(length), base + body};
+        }
+      } else if (kind == Marker::integer && length <= 3 &&
+                 (std::size_t{1} << length) < end - start) {
+        size = 1 + (std::size_t{1} << length);
+        nodes[i] = {Kind::integer, false, 0, 0, bigEndian(bytes + body, size - 1)};
+      }
+      if (size == 0) {
+        current_ = static_cast<NodeIndex>(i);
+        size = readObject(start, nodes[i]) - start;
+      }
+      if (size > room) throw malformed("objects overlap", start);
+      room -= size;
     }
   }
 
@@ -202,7 +242,7 @@ class BinaryReader {
     node.payload = base_ + body;
     if (static_cast<Marker>(bytes_[at] >> 4) == Marker::ascii) {
       node.kind = Kind::string;
-      if (length < binary::kLengthFollows ? !shortIsAscii(body, length) : !isAscii(textAt(node))) {
+      if (!isAscii(textAt(node))) {
         throw malformed("ASCII text is not ASCII", body + asciiPrefix(textAt(node)));
       }
     }
@@ -213,19 +253,18 @@ class BinaryReader {
     return {reinterpret_cast<const char*>(bytes_) + (node.payload - base_), node.count};
   }
 
-  /// Fewer than 15 bytes, tested in one go (an eighth off reading a typical message). Reading 16
-  /// bytes from any place in the object area, its end included, stays inside the message: the
-  /// offset table and the trailer behind it take 33 bytes at least.
-  [[nodiscard]] bool shortIsAscii(std::size_t at, std::size_t length) const {
+  /// Texts of fewer than 16 bytes are tested in one go. Reading 16 bytes from any place in the
+  /// object area, its end included, stays inside the message: the offset table and the trailer
+  /// behind it take 33 bytes at least.
+  [[nodiscard]] static bool isAsciiInside(const unsigned char* text, std::size_t length) {
     static_assert(binary::kTrailerSize >= 16);
-    std::uint64_t words[2];
-    std::memcpy(words, bytes_ + at, sizeof words);
-    const auto highBits = [](std::size_t count) {  // of the first `count` bytes, 0 to 8
-      return count == 0 ? 0 : 0x8080808080808080U >> (8 * (8 - count));
-    };
-    static_assert(std::endian::native == std::endian::little);
-    const std::size_t first = std::min<std::size_t>(length, 8);
-    return ((words[0] & highBits(first)) | (words[1] & highBits(length - first))) == 0;
+#if defined(__SSE2__)
+    if (length < 16) {
+      const __m128i bytes = _mm_loadu_si128(reinterpret_cast<const __m128i*>(text));
+      return (static_cast<unsigned>(_mm_movemask_epi8(bytes)) & ((1U << length) - 1)) == 0;
+    }
+#endif
+    return isAscii({reinterpret_cast<const char*>(text), length});
   }
 
   std::size_t readUtf16(std::size_t at, Node& node) {
@@ -254,6 +293,7 @@ class BinaryReader {
   }
 
   std::size_t readContainer(std::size_t at, Node& node) {
+    containers_.push(current_);
     const bool dictionary = static_cast<Marker>(bytes_[at] >> 4) == Marker::dictionary;
     std::size_t body = 0;
     const std::uint64_t count = readLength(at, body);
@@ -294,7 +334,7 @@ class BinaryReader {
   }
 
   void checkKeys() const {
-    for (std::size_t i = 0; i < objectCount_; ++i) {
+    for (const NodeIndex i : containers_.span(0, containers_.size())) {
       if (nodes_[i].kind != Kind::dictionary) continue;
       for (const NodeIndex key : document_.keys(nodes_[i])) {
         if (nodes_[key].kind != Kind::string) {
@@ -316,9 +356,8 @@ class BinaryReader {
   /// What most writers produce: parents stand before their children, hence no cycle, and from the
   /// last object to the first every height is known before it is asked for.
   void measureBackwards() {
-    for (std::size_t i = objectCount_; i-- > 0;) {
-      Node& node = nodes_[i];
-      if (!isContainer(node)) continue;
+    for (std::size_t i = containers_.size(); i-- > 0;) {
+      Node& node = nodes_[containers_[i]];
       std::uint16_t height = 0;
       for (const NodeIndex child : childrenOf(node))
         height = std::max(height, nodes_[child].height);
@@ -379,6 +418,7 @@ class BinaryReader {
   Document& document_;
   Document::Nodes& nodes_;
   Document::Children& children_;
+  ScratchArray<NodeIndex, 128> containers_;  // in the order of the table
   BlockBuilder side_;
 
   std::size_t offsetSize_ = 0;
