@@ -172,6 +172,8 @@ TEST(BinaryReaderTest, TrailersThatLieAreRefused) {
       {[](auto& d) { d.offsets = {7}; }, "malformed: object offset out of bounds at offset 10"},
       {[](auto& d) { d.offsets = {10}; }, "malformed: object offset out of bounds at offset 10"},
       {[](auto& d) { d.offsets.assign(2, 8); }, "malformed: objects overlap at offset 8"},
+      {[](auto& d) { d.offsets.assign(3, 8); },
+       "malformed: more objects than bytes for them at offset 24"},
       {[](auto& d) { d.objects.clear(); },
        "malformed: binary property list cut short at offset 40"},
   };
