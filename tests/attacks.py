@@ -4,14 +4,16 @@
 
 Each attack of attack_messages.py meets a fresh service, one message at a time: each must be
 answered within the seconds of processor time, and the service's memory must stay below the
-mebibytes (0: as it likes). Then the heaviest of all come at once, several times over, and each must
-get what it got alone, or a refusal for want of memory. Last, N refused messages must leave no
-memory behind. --table prints the rows of doc/attacks.md. (S1, S3, S4, S5)
+mebibytes (0: as it likes). Then the heaviest of all come at once, several times over, and again
+where addresses are short: each must get what it got alone, or a refusal for want of memory. Last, N
+refused messages must leave no memory behind. --table prints the rows of doc/attacks.md.
+(S1, S3, S4, S5, S6)
 """
 
 import argparse
 import collections
 import os
+import resource
 import socket
 import struct
 import subprocess
@@ -26,9 +28,12 @@ OUTPUT_TYPE = b"DrelUserPayload"
 
 
 class Service:
-    def __init__(self, program):
+    def __init__(self, program, address_space=None):
+        def limit():
+            resource.setrlimit(resource.RLIMIT_AS, (address_space, address_space))
         ours, theirs = socket.socketpair()
-        self.process = subprocess.Popen([program], stdin=theirs, stdout=theirs)
+        self.process = subprocess.Popen([program], stdin=theirs, stdout=theirs,
+                                        preexec_fn=limit if address_space else None)
         theirs.close()
         self.socket = ours
         self.frame()  # the hello
@@ -139,8 +144,8 @@ class Run:
                f"{longest * 1000:.0f} ms", f"{waited * 1000:.0f} ms", f"{peak:.0f} MiB")
         print("| " + " | ".join(row) + " |" if self.options.table else " - ".join(row), flush=True)
 
-    def all_at_once(self):
-        service = Service(self.options.service)
+    def all_at_once(self, address_space=None):
+        service = Service(self.options.service, address_space)
         rounds = self.options.rounds
         asked = [(outcome, message) for _ in range(rounds) for _, outcome, message in self.heaviest]
 
@@ -155,13 +160,14 @@ class Run:
             reply = service.frame()
             number = struct.unpack("<Q", reply[:8])[0]
             outcome = verdict(reply)
-            counts[outcome.partition(":")[0]] += 1
             no_memory = outcome == "limitExceeded: the message takes more memory than there is"
+            counts["without memory" if no_memory else outcome.partition(":")[0]] += 1
             self.check(no_memory or outcome == asked[number][0],
                        f"at once: {outcome}, alone: {asked[number][0]}")
         peak = service.memory("VmHWM")
         service.end()
-        print(f"the {len(self.heaviest)} heaviest, {rounds} times at once: {dict(counts)}, "
+        limit = f" in {address_space >> 20} MiB of addresses" if address_space else ""
+        print(f"the {len(self.heaviest)} heaviest, {rounds} times at once{limit}: {dict(counts)}, "
               f"{time.monotonic() - begun:.1f} s, {peak:.0f} MiB", flush=True)
 
     def refusals_leave_nothing(self, count):
@@ -205,6 +211,9 @@ def main():
         if run.options.only in group + ": " + name:
             run.attack(group, name, messages)
     run.all_at_once()
+    if run.options.mebibytes:  # not where a sanitizer maps terabytes
+        for mebibytes in (150, 250):
+            run.all_at_once(mebibytes << 20)
     if run.options.refused:
         run.refusals_leave_nothing(run.options.refused)
     return 1 if run.wrong else 0
