@@ -33,9 +33,7 @@ class Asked final : public client::Request {
  public:
   explicit Asked(std::uint64_t id)
       : Request("R", Data(std::string_view(std::to_string(id)))), id_(id) {}
-  void take(const frames::Reply&) override {}
-  [[nodiscard]] bool taken() const noexcept override { return false; }
-  void deliver() noexcept override {}
+  void give(const frames::Reply&) override {}
   void fail(std::exception_ptr) noexcept override {}
   [[nodiscard]] std::uint64_t id() const noexcept { return id_; }
 

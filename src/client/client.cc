@@ -1,7 +1,7 @@
 #include "ironmoat/client.h"
 
-#include <memory>
 #include <new>
+#include <optional>
 #include <utility>
 
 #include "client/connection.h"
@@ -29,46 +29,40 @@ class RequestFor final : public client::Request {
   }
 
   [[nodiscard]] std::future<R> outcome() { return promise_.get_future(); }
-
-  void take(const frames::Reply& reply) override {
-    switch (reply.status) {
-      case frames::Status::record:
-        return takeRecord(reply.body);
-      case frames::Status::refused:
-        error_ = std::make_exception_ptr(frames::parseRefusal(reply.body));
-        return;
-      case frames::Status::notServed:
-      case frames::Status::failed:
-        error_ = std::make_exception_ptr(
-            ServiceError(ServiceError::Kind::unavailable, frames::parseSentence(reply.body)));
-        return;
-    }
-    throw frames::FrameError("a reply of unknown status");
-  }
-  [[nodiscard]] bool taken() const noexcept override { return record_ || error_; }
-  void deliver() noexcept override {
-    if (error_) return fail(std::move(error_));
-    done_ = true;
-    promise_.set_value(std::move(*record_));
-  }
   void fail(std::exception_ptr error) noexcept override {
     done_ = true;
     promise_.set_exception(std::move(error));
   }
 
+ protected:
+  void give(const frames::Reply& reply) override {
+    switch (reply.status) {
+      case frames::Status::record:
+        return giveRecord(reply.body);
+      case frames::Status::refused:
+        return fail(std::make_exception_ptr(frames::parseRefusal(reply.body)));
+      case frames::Status::notServed:
+      case frames::Status::failed:
+        return fail(std::make_exception_ptr(
+            ServiceError(ServiceError::Kind::unavailable, frames::parseSentence(reply.body))));
+    }
+    throw frames::FrameError("a reply of unknown status");
+  }
+
  private:
-  void takeRecord(const Data& body) {
+  void giveRecord(const Data& body) {
+    std::optional<R> record;
     try {
-      record_.reset(new R(frames::decodeRecord<R>(body)));  // made in place
+      record.emplace(frames::decodeRecord<R>(body));
     } catch (const frames::RecordError&) {
       throw;
     } catch (...) {  // the record's initialiser refused, or memory ran out: no fault of the service
-      error_ = std::current_exception();
+      return fail(std::current_exception());
     }
+    done_ = true;
+    promise_.set_value(std::move(*record));
   }
 
-  std::unique_ptr<R> record_;
-  std::exception_ptr error_;
   std::promise<R> promise_;
   bool done_ = false;
 };

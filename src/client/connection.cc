@@ -210,19 +210,23 @@ std::exception_ptr Connection::collect() noexcept {
   return nullptr;
 }
 
-std::exception_ptr Connection::decode() noexcept {
-  std::size_t good = 0;
-  try {
-    for (; good < answers_.size(); ++good) {
-      const auto& [reply, request, done] = answers_[good];
-      if (request == nullptr || request->taken()) throw frames::FrameError("a reply to no request");
-      request->take(reply);
+/// Newest first: who waits for them in the order of their submission is woken once, when all are
+/// there, and not for each anew.
+std::exception_ptr Connection::resolve() noexcept {
+  std::exception_ptr wrong;
+  for (std::size_t i = answers_.size(); i-- > 0;) {
+    Answer& answer = answers_[i];
+    try {
+      if (answer.request == nullptr || answer.request->isResolved()) {
+        throw frames::FrameError("a reply to no request");
+      }
+      answer.request->resolve(answer.reply);
+    } catch (...) {
+      answer.request = nullptr;
+      wrong = std::current_exception();
     }
-  } catch (...) {
-    answers_.resize(good);
-    return std::current_exception();
   }
-  return nullptr;
+  return wrong;
 }
 
 void Connection::settle(Lock& lock) {
@@ -234,17 +238,16 @@ void Connection::settle(Lock& lock) {
     // They stay where they are without the lock: only the reader takes requests out.
     for (Answer& answer : answers_) answer.request = queue_.owed(answer.reply.id);
     lock.unlock();
-    if (const std::exception_ptr earlier = decode()) wrong = earlier;
+    if (const std::exception_ptr other = resolve()) wrong = other;
     lock.lock();
     const TimePoint now = Clock::now();
     for (Answer& answer : answers_) {
+      if (answer.request == nullptr) continue;
       admission_.leave(answer.request->cost());
       answer.done = queue_.finish(answer.reply.id, now);
     }
     lock.unlock();
-    // Newest first: who waits for them in the order of their submission is woken once, when all are
-    // there, and not for each anew.
-    for (; !answers_.empty(); answers_.pop_back()) answers_.back().done->deliver();
+    answers_.clear();
     if (wrong) std::rethrow_exception(wrong);
     lock.lock();
   }

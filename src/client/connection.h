@@ -74,12 +74,12 @@ class Connection {
   /// Returns why the service is not to be used, if so.
   std::string greet(const Data& body);
   /// Gives out all replies that have come. Throws, without the lock, over one that is wrong, when
-  /// those before it have been given out.
+  /// those beside it have been given out.
   void settle(Lock& lock);
   /// Fills `answers_` with replies; what was wrong with the one behind them, if that is the end.
   std::exception_ptr collect() noexcept;
-  /// Lets the requests take their replies; if one is wrong, it and those behind it are dropped.
-  std::exception_ptr decode() noexcept;
+  /// Gives outcomes to their requests; what was wrong with one of them.
+  std::exception_ptr resolve() noexcept;
 
   // By the connection's thread.
   void run() noexcept;

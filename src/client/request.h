@@ -10,7 +10,7 @@
 
 namespace ironmoat::client {
 
-/// One message on its way to one outcome: either `take` and then `deliver`, or `fail`, once.
+/// One message on its way to one outcome: `resolve` or `fail` takes effect once.
 class Request {
  public:
   Request(std::string_view outputType, Data message)
@@ -25,16 +25,22 @@ class Request {
   /// Bytes that it takes up until its outcome: the message, and about what comes with it.
   [[nodiscard]] std::size_t cost() const noexcept { return message_.size() + 512; }
 
-  /// Takes the outcome that `reply` carries, for `deliver` to give. Throws frames::RecordError or
-  /// frames::FrameError, with nothing taken, when the reply is not what a service would send.
-  virtual void take(const frames::Reply& reply) = 0;
-  [[nodiscard]] virtual bool taken() const noexcept = 0;
-  virtual void deliver() noexcept = 0;
+  /// Gives the outcome that `reply` carries. Throws frames::RecordError or frames::FrameError, with
+  /// no outcome given, when the reply is not what a service would send.
+  void resolve(const frames::Reply& reply) {
+    give(reply);
+    resolved_ = true;
+  }
+  [[nodiscard]] bool isResolved() const noexcept { return resolved_; }
   virtual void fail(std::exception_ptr error) noexcept = 0;
+
+ protected:
+  virtual void give(const frames::Reply& reply) = 0;
 
  private:
   std::string_view outputType_;  // a record type's schemaName
   Data message_;
+  bool resolved_ = false;
 };
 
 }  // namespace ironmoat::client

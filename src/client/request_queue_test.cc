@@ -14,9 +14,7 @@ using namespace std::chrono_literals;
 class Silent final : public Request {
  public:
   explicit Silent(std::string_view text) : Request("R", Data(text)) {}
-  void take(const frames::Reply&) override {}
-  [[nodiscard]] bool taken() const noexcept override { return false; }
-  void deliver() noexcept override {}
+  void give(const frames::Reply&) override {}
   void fail(std::exception_ptr) noexcept override {}
 };
 
