@@ -285,7 +285,7 @@ class Types(InFolder):
             self.assertIn("  c ", text)
 
     def test_auto_takes_the_record_that_got_most(self):
-        everywhere = ["payload", "web-tunnel-response"]
+        everywhere = ["web-tunnel-response", "payload"]
         rows = [
             ({"c": 5}, "command-response", everywhere),
             ({"c": 5, "unknown": 1}, "command-response", everywhere),
@@ -302,7 +302,7 @@ class Types(InFolder):
         self.assertEqual(result.returncode, 0)
         self.assertEqual([(line["type"], line["asWell"]) for line in lines_of(result)],
                          [(kind, as_well) for _, kind, as_well in rows])
-        self.assertIn("0 (command-response; as well: payload, web-tunnel-response)\n",
+        self.assertIn("0 (command-response; as well: web-tunnel-response, payload)\n",
                       unpack("--type=auto", "0").stdout.decode())
 
     def test_auto_when_no_type_fits(self):
@@ -311,9 +311,9 @@ class Types(InFolder):
         error = lines_of(result)[0]["error"]
         self.assertEqual(error["kind"], "noTypeFits")
         self.assertEqual([(each["type"], each["path"], each["message"]) for each in error["types"]],
-                         [("payload", "i", "expected string, found boolean"),
-                          ("command-response", "i", "expected integer, found boolean"),
-                          ("web-tunnel-response", "i", "expected integer, found boolean")])
+                         [("command-response", "i", "expected integer, found boolean"),
+                          ("web-tunnel-response", "i", "expected integer, found boolean"),
+                          ("payload", "i", "expected string, found boolean")])
         for content, kind in ((b"", "malformed"), (xml({"C": 1}), "keyNotFound")):  # all say the same
             error = lines_of(unpack("--type=auto", "--format=json", input=content))[0]["error"]
             self.assertEqual((error["kind"], "types" in error), (kind, False))

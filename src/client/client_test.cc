@@ -126,13 +126,13 @@ TEST_F(ClientTest, TheCulpritFailsAndItsNeighboursDoNot) {
       {"words", "was killed by SIGABRT (last words of it) over this message"},
       {"exit 3", "exited with status 3 over this message"},
       {"close", "closed its connection over this message"},
-      {"nextId", "sent a broken frame: a reply to no request over this message"},
-      {"absurdLength", "sent a broken frame: "},
-      {"badRecord", "sent a broken record: "},
-      {"badStatus", "sent a broken frame: "},
-      {"badText", "sent a broken frame: "},
-      {"greetAgain", "sent a broken frame: "},
-      {"flood", "sent a broken frame: the reply has an unknown status over this message"},
+      {"nextId", "sent a broken frame over this message: a reply to no request"},
+      {"absurdLength", "sent a broken frame over this message: "},
+      {"badRecord", "sent a broken record over this message: "},
+      {"badStatus", "sent a broken frame over this message: "},
+      {"badText", "sent a broken frame over this message: "},
+      {"greetAgain", "sent a broken frame over this message: "},
+      {"flood", "sent a broken frame over this message: the reply has an unknown status"},
   };
   for (const auto& row : rows) {
     Client client(fake());

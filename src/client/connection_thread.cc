@@ -174,7 +174,11 @@ void Connection::lose(Lock& lock, const std::string& what, ServiceError::Kind ki
   }
   const bool late = kind == ServiceError::Kind::timedOut;
   // Made before the culprit is taken out, who would have no outcome if memory ran out here.
-  const std::string sentence = late ? word : "the service " + word + " over this message";
+  const std::size_t reason = byItself ? std::string::npos : word.find(": ");
+  std::string sentence = word;
+  if (!late) {
+    sentence.insert(std::min(reason, word.size()), " over this message").insert(0, "the service ");
+  }
   const std::unique_ptr<Request> culprit = queue_.lose();
   if (culprit == nullptr) return;
   admission_.leave(culprit->cost());

@@ -15,10 +15,6 @@ struct Accepted {
   const RecordType* type;
   std::unique_ptr<UnpackedRecord> record;
   std::size_t values;
-
-  [[nodiscard]] bool isBetterThan(const Accepted& other) const {
-    return values != other.values ? values > other.values : type->fields < other.type->fields;
-  }
 };
 
 Outcome refused(std::vector<Outcome::Refusal> refusals) {
@@ -63,7 +59,7 @@ Outcome outcomeOf(std::span<const Attempt> attempts) {
   if (accepted.empty()) return refused(std::move(refusals));
   auto best = accepted.begin();
   for (auto other = best + 1; other != accepted.end(); ++other) {
-    if (other->isBetterThan(*best)) best = other;
+    if (other->values > best->values) best = other;
   }
   outcome.type = best->type;
   outcome.record = std::move(best->record);

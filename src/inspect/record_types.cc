@@ -55,13 +55,13 @@ PendingRecord submitAs(Client& client, const Data& message) {
 
 template <MessageSchema R>
 constexpr RecordType row(std::string_view name) {
-  return {name, R::Arguments::Fields::count, submitAs<R>, showSchemaOf<R>};
+  return {name, submitAs<R>, showSchemaOf<R>};
 }
 
 constexpr std::array kRecordTypes = {
-    row<DrelUserPayload>("payload"),
     row<VeskCommandResponse>("command-response"),
     row<VeskCommandWebTunnelResponse>("web-tunnel-response"),
+    row<DrelUserPayload>("payload"),
 };
 
 }  // namespace

@@ -32,12 +32,12 @@ using PendingRecord = std::function<std::unique_ptr<UnpackedRecord>()>;
 
 struct RecordType {
   std::string_view name;  ///< as after `--type`
-  std::size_t fields;     ///< of its record, those of records in it not counted
   PendingRecord (*submit)(Client& client, const Data& message);
   void (*showSchema)(Format format, const Colours& colours, std::string& out);
 };
 
-/// All types of record that can be asked for.
+/// All types of record that can be asked for; a message that fits several alike is taken for the
+/// first.
 std::span<const RecordType> recordTypes() noexcept;
 
 /// Null when there is none of that name.
