@@ -212,15 +212,14 @@ def nodes(size):
 
 
 def depths(size):
-    """Chains of containers, parents first and last."""
-    for levels in (511, 512, (size - OVERHEAD) // 8):
-        chain = [array([5 + i + 1]) for i in range(levels - 1)] + [b"\xa0"]
-        yield payload(b"?", array([5]), chain[1:]) if levels == 511 else payload(
-            b"?", array([5]), chain)
-        count = len(chain)
-        yield message([b"\xa0"] + [array([i]) for i in range(count - 1)] +
-                      [dictionary([(count + 1, count + 2), (count + 3, count - 1)]), text(b"c"),
-                       ONE, text(b"?")], root=count)
+    """So many containers inside one another, parents first and last."""
+    for containers in (512, 513, (size - OVERHEAD) // 8):
+        lists = containers - 2
+        yield payload(b"?", array([5]), [array([6 + i]) for i in range(lists - 1)] + [b"\xa0"])
+        lists = containers - 1
+        yield message([b"\xa0"] + [array([i]) for i in range(lists - 1)] +
+                      [dictionary([(lists + 1, lists + 2), (lists + 3, lists - 1)]), text(b"c"),
+                       ONE, text(b"?")], root=lists)
 
 
 def deep_payloads(levels):
@@ -230,7 +229,7 @@ def deep_payloads(levels):
 
 
 def nesting(size):
-    yield "chains of 511, 512, 2 million lists, parents first or last", list(depths(size))
+    yield "512, 513 and 2 million containers inside one another, parents first or last", list(depths(size))
     yield "payloads in payloads, 256 and 257", [
         doubling(255, 1), doubling(256, 1), deep_payloads(256), deep_payloads(257)]
     yield "XML: lists or dictionaries opened by the megabyte", [

@@ -32,10 +32,6 @@ class DocumentBuilder {
   [[nodiscard]] bool inDictionary() noexcept {
     return document_.nodes_[open_.back().node].kind == Kind::dictionary;
   }
-  /// In a dictionary: a key has been given and its value not yet; requires depth() > 0.
-  [[nodiscard]] bool awaitsValue() noexcept {
-    return inDictionary() && ((pending_.size() - open_.back().firstPending) & 1) != 0;
-  }
 
   /// A key is given as a string, like any value.
   void sourceString(std::uint32_t offset, std::uint32_t length) {
