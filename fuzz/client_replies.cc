@@ -4,7 +4,7 @@
 // Oracles: what arrives is what was asked, in frames; a reply is owed for exactly what arrived
 // whole and is not answered; whoever is blamed had its process to itself; what a dead process had
 // been given is not sent together with anything else; each request gets one outcome, also those
-// that are left at the end, from a service that answers.
+// that are left at the end, from a service that answers. (S15)
 
 #include <algorithm>
 #include <array>

@@ -2,6 +2,7 @@
 // connection's bytes, is split into reads.
 //
 // Oracles: how bytes arrive changes nothing, and what parses is appended again as the same bytes.
+// (S14)
 
 #include <algorithm>
 #include <cstdint>

@@ -1,7 +1,7 @@
 // Decoding a reply's record. The first byte chooses the record's type, the rest is the encoded
 // record.
 //
-// Oracle: what decodes is encoded as the same bytes.
+// Oracle: what decodes is encoded as the same bytes. (S14)
 
 #include <cstdint>
 #include <cstdlib>

@@ -1,5 +1,6 @@
 // Servers as processes, looked at from outside: what they report, what the kernel says of them,
-// what they do where they cannot be confined, and how they share their limit of memory.
+// what they do where they cannot be confined, and how they share their limit of memory. (S4, S6,
+// S12)
 
 #include <grp.h>
 #include <gtest/gtest.h>

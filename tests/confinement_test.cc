@@ -1,4 +1,4 @@
-// The confinement tried from inside: children that confine themselves and then do one thing.
+// The confinement tried from inside: children that confine themselves and then do one thing. (S12)
 
 #include "confinement/confinement.h"
 

@@ -4,7 +4,7 @@
 
 PART is a kind of message, generated from the seed; `faults`, each field of each record with each
 wrong kind of value; `extremes`, messages at the limits; or `written`, what WRITE_RECORDS writes.
-By hand, 2000 messages and other seeds find more; FOLDER keeps the messages.
+By hand, 2000 messages and other seeds find more; FOLDER keeps the messages. (S2, S10, S11)
 """
 
 import argparse

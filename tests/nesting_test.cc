@@ -1,4 +1,4 @@
-// The deepest message that is accepted, through every stage, on a stack of one megabyte.
+// The deepest message that is accepted, through every stage, on a stack of one megabyte. (S8)
 
 #include <gtest/gtest.h>
 #include <pthread.h>

@@ -1,5 +1,5 @@
 // The service as a process, spoken to in bytes: what it answers to frames that are right, wrong,
-// cut short or lies, and that it always ends in order.
+// cut short or lies, and that it always ends in order. (S1)
 
 #include <gtest/gtest.h>
 #include <sys/wait.h>

@@ -117,6 +117,7 @@ TEST_F(ClientTest, RepliesFindTheirThreads) {
   EXPECT_EQ(wrong, 0);
 }
 
+// S15.
 TEST_F(ClientTest, TheCulpritFailsAndItsNeighboursDoNot) {
   const struct {
     std::string message;
@@ -155,6 +156,7 @@ TEST_F(ClientTest, ATakenOverServiceHarmsNobodyElse) {
   }
 }
 
+// S14.
 TEST_F(ClientTest, AnyGarbledReplyIsSurvived) {
   Client client(fake(500ms));
   int crashes = 0;

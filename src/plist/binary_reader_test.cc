@@ -192,6 +192,7 @@ TEST(BinaryReaderTest, TrailersThatLieAreRefused) {
             "malformed: unknown version of the binary form at offset 6");
 }
 
+// S8.
 TEST(BinaryReaderTest, EveryWayDownIsMeasuredOnce) {
   // Containers in a row, each `times` in the one before, with parents first or last, which are
   // measured differently; the top one may also hold the last but one, so that what is known of it
@@ -244,6 +245,7 @@ void expectSound(const Document& document, std::size_t nodes) {
   }
 }
 
+// S1, S9.
 TEST(BinaryReaderTest, WhateverIsAcceptedIsSound) {
   const std::string good = BinaryDraft()
                                .dictionary({1, 2}, {3, 4})

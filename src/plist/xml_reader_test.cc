@@ -328,7 +328,7 @@ TEST(XmlReaderTest, RefusesContainersPastTheLimitAndEveryBeginningOfAMessage) {
   }
 }
 
-// Takes minutes when anything is looked at again and again; the test's time limit says so.
+// S3. Takes minutes when anything is looked at again and again; the test's time limit says so.
 TEST(XmlReaderTest, TimeIsLinearInHostileMessages) {
   const auto repeated = [](std::string_view piece) {
     std::string text;

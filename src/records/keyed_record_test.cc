@@ -82,6 +82,7 @@ std::string outcome(const std::string& xml) {
   return outcome(Data(std::string_view("<plist version=\"1.0\">" + xml + "</plist>")));
 }
 
+// S11.
 TEST(KeyedRecordTest, RecordsAndRefusals) {
   const std::string c = "<key>c</key><integer>1</integer>";
   const std::string n = "<key>n</key><string/>";
@@ -205,6 +206,7 @@ TEST(KeyedRecordTest, ContainersDecodeFieldByField) {
   EXPECT_EQ(container.decodeIfPresent<Int>(Keys::of<&Example::number>()), std::nullopt);
 }
 
+// S4.
 TEST(KeyedRecordTest, SharedValuesArePaidForEachTime) {
   const auto references = [](std::size_t count, std::uint64_t object) {
     return std::vector<std::uint64_t>(count, object);
