@@ -131,7 +131,7 @@ TEST(RecordLayoutTest, BytesThatBreakTheRulesAreRefused) {
   }
 }
 
-TEST(RecordLimitsTest, DepthIsNotTheSenders) {
+TEST(RecordLimitsTest, NeitherDepthNorCountsAreTheSenders) {
   DrelUserPayloadArguments outer;
   outer.corvelMessageList.push_back(Payload::with({}));
   const std::string two = encoded(Payload::with(std::move(outer)));
@@ -139,6 +139,9 @@ TEST(RecordLimitsTest, DepthIsNotTheSenders) {
   std::string deep;
   for (std::uint32_t i = 0; i <= limits::nestedContainers; ++i) deep += opening;
   EXPECT_EQ(refusal<Payload>(deep + std::string(1000, '\0')), "records are nested too deeply");
+  std::string announced = two;  // 255 elements, and the bytes of one
+  announced.replace(opening.size() - 4, 4, "\xFF\0\0\0"s);
+  EXPECT_EQ(refusal<Payload>(announced), "a list announces more than there is");
 }
 
 TEST(RecordLimitsTest, ListsAreBoundedByTheMemoryTheyTake) {

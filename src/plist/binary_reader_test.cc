@@ -106,6 +106,10 @@ TEST(BinaryReaderTest, ObjectsThatLieAreRefusedWhereTheyStand) {
     EXPECT_EQ(outcome(BinaryDraft().add(row.object).data()), "malformed: " + row.reason)
         << ::testing::PrintToString(row.object);
   }
+  // A pair is not made with the first bytes of what stands behind the text.
+  EXPECT_EQ(
+      outcome(BinaryDraft().add("\x61\xD8\x3D"s).add("\xDC"s.append(24, '\x02')).ascii("k").data()),
+      "malformed: unpaired surrogate at offset 9");
 }
 
 TEST(BinaryReaderTest, AsciiIsAsciiAtEveryPlace) {
