@@ -50,7 +50,7 @@ class Page:
             if name in self.output_types:
                 kind, = (kind for kind, (_, output) in RECORDS.items() if output == name)
                 parts.append(f"; a message of type `{kind}`")
-            parts.append(f". {len(record['fields'])} fields.\n\n"
+            parts.append(f". {len(record['fields'])} field{'s' * (len(record['fields']) > 1)}.\n\n"
                          "| | field | type | key | in a message | in the record | label |\n"
                          "|---|---|---|---|---|---|---|\n")
             for place, field in enumerate(record["fields"]):

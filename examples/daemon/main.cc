@@ -14,6 +14,7 @@
 #include <cstdio>
 #include <cstring>
 #include <iostream>
+#include <new>
 #include <string>
 #include <string_view>
 #include <syncstream>
@@ -67,10 +68,12 @@ void handle(ironmoat::Client& client, std::string_view datagram) {
                                 << printable(error.path()) << "': " << printable(error.what())
                                 << std::endl;
   } catch (const ironmoat::ServiceError& error) {
-    // `crashed` and `timedOut` are this message's doing, and worth a report; `unavailable` is not,
-    // and a daemon that must not lose messages would keep it for later.
+    // After `crashed` and `timedOut` once more at most; after `unavailable` later, as often as
+    // needed.
     std::osyncstream(std::cout) << "not unpacked: " << nameOf(error.kind()) << ": "
                                 << printable(error.what()) << std::endl;
+  } catch (const std::bad_alloc&) {  // a record may take megabytes more than its message
+    std::fputs("not unpacked: out of memory\n", stderr);
   }
 }
 

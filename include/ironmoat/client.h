@@ -43,6 +43,8 @@ class IRONMOAT_API Client {
     std::chrono::milliseconds deadline{2000};
     /// Bytes of requests without an outcome, with some 500 more for each request. `submit` and
     /// `unpack` wait for room, in the order of the calls; a message that is larger goes alone.
+    /// Records are not counted: a message of 28 KB can become one of 64 MiB (limits.h), so that it
+    /// is the number of futures held that bounds the daemon's memory.
     std::size_t maxBytesInFlight = std::size_t{64} << 20;
   };
 

@@ -16,12 +16,12 @@ inline constexpr std::size_t messageBytes = std::size_t{16} << 20;
 inline constexpr std::uint32_t nestedContainers = 512;
 
 /// Bytes that lists take in wire records (elements × size of one, texts 16 bytes), counted before a
-/// list is allocated. Stops a few
-/// bytes of input (`<dict/>`, or one shared object referenced over and over) from asking for a
-/// whole record of kilobytes each time. Measured: 28,149 tiny payloads of 2,384 bytes fill it, from
-/// 113 KB of message when they are one shared object and 479 KB when each is its own: 54-61 ms and
-/// 127 MiB at the peak, output records included. A list of 100,000 is refused in 0.1 ms shared, in
-/// 1.3 ms distinct, before anything is allocated for it.
+/// list is allocated. Stops a few bytes of input (`<dict/>`, or one shared object referenced over
+/// and over) from asking for a whole record of kilobytes each time. Measured: 28,149 tiny payloads
+/// of 2,384 bytes fill it, from 479 KB of message when each is its own object and from 28 KB when
+/// they are one, under references of one byte each: 54-61 ms and 127 MiB at the peak, output
+/// records included. A list of 100,000 is refused in 0.1 ms shared, in 1.3 ms distinct, before
+/// anything is allocated for it.
 inline constexpr std::size_t recordBytes = std::size_t{64} << 20;
 
 /// Bytes of text and data delivered into fields, counted each time a shared value is used. Stops a

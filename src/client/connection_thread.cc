@@ -169,7 +169,11 @@ void Connection::lose(Lock& lock, const std::string& what, ServiceError::Kind ki
   assembler_.reset();
   lock.lock();
   if (!greeted) {
-    return startFailed(lock, program_ + " " + word + (byItself ? " before it greeted" : ""),
+    return startFailed(lock,
+                       program_ + " " + word + (byItself ? " before it greeted" : "") +
+                           (word.find("SIGSYS") != std::string::npos
+                                ? "; does a filter over this process forbid seccomp?"
+                                : ""),
                        byItself);
   }
   const bool late = kind == ServiceError::Kind::timedOut;
