@@ -2,10 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include <latch>
 #include <string>
-#include <thread>
-#include <vector>
 
 #include "records/message_payload.h"
 
@@ -13,18 +10,6 @@ namespace ironmoat::records {
 namespace {
 
 using Keys = VeskCorvelProtocolPayload::CodingKeys;
-
-TEST(KeyIndexTest, AnswersRightUnderConcurrentFirstUse) {
-  std::latch start(8);
-  std::vector<std::jthread> threads;
-  for (int i = 0; i < 8; ++i) {
-    threads.emplace_back([&] {
-      start.arrive_and_wait();
-      const auto key = Keys::fromStringValue("gdr");
-      EXPECT_EQ(key ? key->stringValue() : "none", "gdr");
-    });
-  }
-}
 
 TEST(KeyIndexTest, AnswersAsTheScanDoes) {
   const KeyScan scan(Table<VeskCorvelProtocolPayload>::rows.keys);
