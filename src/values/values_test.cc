@@ -4,26 +4,11 @@
 
 #include <stdexcept>
 #include <string>
-#include <utility>
 
-#include "values/block_builder.h"
 #include "values/utf8.h"
 
 namespace ironmoat {
 namespace {
-
-TEST(ValuesTest, AbsentEmptyAndPresentStayApart) {
-  Optional<String> text;
-  EXPECT_NE(text, Optional<String>(String()));
-  text = String("");
-  const Optional<String> copy = text;
-  text.reset();
-  EXPECT_TRUE(copy.value().empty());
-  EXPECT_THROW((void)text.value(), std::bad_optional_access);
-  Optional<Data> bytes = Data(std::string_view("\0\xff", 2));
-  const Optional<Data> moved = std::move(bytes);
-  EXPECT_EQ(moved->view(), std::string_view("\0\xff", 2));
-}
 
 TEST(ValuesTest, SlicesOutliveWhoMadeThemAndCanBeDetached) {
   String kept;
@@ -37,20 +22,6 @@ TEST(ValuesTest, SlicesOutliveWhoMadeThemAndCanBeDetached) {
   const String own = kept.detached();
   kept = String();
   EXPECT_EQ(own.view(), "message");
-}
-
-TEST(ValuesTest, BlockBuilderGrowsAndForgets) {
-  BlockBuilder builder;
-  std::string expected;
-  for (int i = 0; i < 5000; ++i) {
-    builder.push(static_cast<char>(i));
-    expected.push_back(static_cast<char>(i));
-  }
-  builder.truncate(4000);
-  builder.append("end");
-  const BlockRef block = builder.finish();
-  EXPECT_EQ(std::string_view(block->bytes(), block->size()), expected.substr(0, 4000) + "end");
-  EXPECT_FALSE(builder.finish());
 }
 
 TEST(ValuesTest, TextIsAlwaysWellFormedUtf8) {
@@ -84,11 +55,6 @@ TEST(ValuesTest, TextIsAlwaysWellFormedUtf8) {
       EXPECT_EQ(validUtf8Prefix(text), at);
       text[at] = 'x';
     }
-  }
-
-  for (const char32_t codePoint : {0x24U, 0x7FFU, 0x800U, 0xFFFFU, 0x10000U, 0x10FFFFU}) {
-    char buffer[4];
-    EXPECT_TRUE(isValidUtf8({buffer, writeUtf8(codePoint, buffer)}));
   }
 }
 
