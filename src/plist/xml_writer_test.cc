@@ -12,7 +12,9 @@ namespace {
 
 TEST(XmlWriterTest, RefusesWhatTheFormOrARecordCannotHold) {
   const std::function<void(DocumentBuilder&)> fills[] = {
-      [](auto& builder) { builder.string({"a\0b", 3}); },
+      [](auto& builder) {
+        builder.string({"a\0b", 3});
+      },
       [](auto& builder) { builder.string("\xEF\xBF\xBF"); },
       [](auto& builder) {
         builder.beginDictionary();
