@@ -94,12 +94,10 @@ TEST(FrameTest, BrokenBodiesAreRefused) {
     std::size_t accepted;  // of the beginnings of the body, itself included
   } rows[] = {
       {hello, kHelloBody, 1},
-      {hello, kHelloBody + "x", 1},
       {hello, "IRONMOAX" + kHelloBody.substr(8), 0},
       {hello, "IRONMOAT\2\0"s + kHelloBody.substr(10), 0},
       {request, kRequestBody, 1 + 5},
       {request, number(1, 8) + "\0rest"s, 0},
-      {request, number(1, 8) + "\xFFshort", 0},
       {reply, kRefusalBody, 1 + refused.size()},
       {reply, number(1, 8) + "\4", 0},
       {refusal, refused, 1 + 3},

@@ -11,7 +11,6 @@
 #include "ironmoat/limits.h"
 #include "ironmoat/user_payload.h"
 #include "ironmoat/web_tunnel_response.h"
-#include "support/generated_records.h"
 #include "support/tight_message.h"
 
 namespace ironmoat {
@@ -33,7 +32,6 @@ namespace frames {
 namespace {
 
 using namespace std::string_literals;
-using testing::RecordGenerator;
 using testing::tightMessage;
 using Response = VeskCommandResponse;
 using Tunnel = VeskCommandWebTunnelResponse;
@@ -56,38 +54,6 @@ std::string refusal(const std::string& body) {
     return error.what();
   } catch (const std::domain_error& error) {  // the initialiser's
     return error.what();
-  }
-}
-
-template <class R>
-class RecordCodecTest : public ::testing::Test {};
-using AllRecords = ::testing::Types<Response, Tunnel, Payload>;
-TYPED_TEST_SUITE(RecordCodecTest, AllRecords);
-
-TYPED_TEST(RecordCodecTest, EveryFieldCrosses) {
-  for (std::uint64_t seed = 0; seed < 40; ++seed) {
-    const double presence = seed == 0 ? 0 : seed == 1 ? 1 : seed % 2 == 0 ? 0.1 : 0.5;
-    const auto record = RecordGenerator(seed, presence).make<TypeParam>(2);
-    const auto again = decodeRecord<TypeParam>(tightMessage(encoded(record)));
-    ASSERT_EQ(testing::difference(record, again), "") << seed;
-  }
-}
-
-TYPED_TEST(RecordCodecTest, NoMutationIsTakenForAnotherRecord) {
-  const std::string good = encoded(RecordGenerator(1, 1).make<TypeParam>(1));
-  const std::size_t step = good.size() / 500 + 1;
-  for (std::size_t i = 0; i < good.size(); i += step) {
-    EXPECT_NE(refusal<TypeParam>(good.substr(0, i)), "") << i;
-    for (int bit = 0; bit < 8; ++bit) {
-      std::string bad = good;
-      bad[i] = static_cast<char>(bad[i] ^ (1 << bit));
-      refusal<TypeParam>(bad);  // or it is what the record is written as
-    }
-    for (const auto& lie : {"\xFF\xFF\xFF\xFF"s, "\0\0\0\x80"s, "\0\0\1\0"s, "\1\0\0\0"s, ""s}) {
-      if (i + 4 > good.size()) continue;
-      refusal<TypeParam>(std::string(good).replace(i, 4, lie));
-      refusal<TypeParam>(std::string(good).insert(i, lie));
-    }
   }
 }
 
