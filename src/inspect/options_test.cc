@@ -24,9 +24,7 @@ TEST(Options, AreUnderstoodInEveryForm) {
       {{"--type", "command-response", "a"}, "command-response", Format::text, "", {"a"}},
       {{"a", "--format=json", "--service=/s", "b"}, "payload", Format::json, "/s", {"a", "b"}},
       {{"--type=auto"}, "auto", Format::text, "", {"-"}},
-      {{"--format", "json", "--format", "text"}, "payload", Format::text, "", {"-"}},
       {{"--", "--type", "-x"}, "payload", Format::text, "", {"--type", "-x"}},
-      {{""}, "payload", Format::text, "", {""}},
   };
   for (const Row& row : rows) {
     const Options options = parseOptions(row.arguments);
@@ -48,7 +46,6 @@ TEST(Options, SayWhatToDoAndWhatToPrint) {
   };
   const Row rows[] = {
       {{"-q", "a"}, Action::unpack, Output::nothing, ""},
-      {{"--quiet", "--quiet"}, Action::unpack, Output::nothing, ""},
       {{"--format=json", "--summary"}, Action::unpack, Output::summary, ""},
       {{"--type=auto", "--schema", "payload"}, Action::showSchema, Output::each, "payload"},
       {{"--self-test"}, Action::selfTest, Output::each, ""},
@@ -67,7 +64,6 @@ TEST(Options, WrongOnesAreNamed) {
   const std::pair<Arguments, std::string> rows[] = {
       {{"--colour"}, "unknown option '--colour'"},
       {{"-x"}, "unknown option '-x'"},
-      {{"--typewriter"}, "unknown option '--typewriter'"},
       {{"--type"}, "option '--type' needs a value"},
       {{"--service="}, "option '--service' needs a program"},
       {{"--format", "xml"}, "unknown format 'xml': text or json"},
@@ -75,8 +71,6 @@ TEST(Options, WrongOnesAreNamed) {
        "unknown type '\\u{1b}[2J': one of command-response, web-tunnel-response, payload, auto"},
       {{"--schema=auto"},
        "unknown type 'auto': one of command-response, web-tunnel-response, payload"},
-      {{"--quiet=1"}, "unknown option '--quiet=1'"},
-      {{"-q", "--summary"}, "options '--quiet' and '--summary' exclude one another"},
       {{"--schema=payload", "--self-test"},
        "options '--schema' and '--self-test' exclude one another"},
       {{"a", "--schema", "payload"}, "option '--schema' goes without files"},

@@ -80,12 +80,12 @@ TEST(TextView, BreaksValuesThatAreWiderThanTheScreen) {
             "        f\"\n");
 }
 
-TEST(TextView, ColoursLabelsAndNothingOfTheSender) {
+TEST(TextView, ColoursLabelsAndNothingOfTheSenderWhoCannotEndQuotes) {
   Whole whole;
-  whole.text = String("\x1B[31mred");
+  whole.text = String("\x1B[31m\" (4 bytes)\\");
   EXPECT_EQ(view(whole, {.colours = Colours::quiet()}),
             "  \033[36mcommand\033[0m  0\n"
-            "  \033[36mtext\033[0m     \"\\u{1b}[31mred\"\n");
+            "  \033[36mtext\033[0m     \"\\u{1b}[31m\\\" (4 bytes)\\\\\"\n");
 }
 
 TEST(Harmless, WritesOutWhatATerminalWouldObey) {
@@ -110,12 +110,6 @@ TEST(Harmless, WritesOutWhatATerminalWouldObey) {
     appendHarmless(out, text);
     EXPECT_EQ(out, expected);
   }
-}
-
-TEST(TextView, QuotedTextCannotEndItsQuotes) {
-  Whole whole;
-  whole.text = String("\" (4 bytes)\\");
-  EXPECT_EQ(view(whole), "  command  0\n  text     \"\\\" (4 bytes)\\\\\"\n");
 }
 
 }  // namespace
