@@ -3,7 +3,7 @@
 
 #include <gtest/gtest.h>
 
-#include <limits>
+#include <concepts>
 #include <string>
 #include <vector>
 
@@ -30,13 +30,11 @@ void note(const std::string& type, const std::string& argument) {
   calls.push_back(type + " " + argument);
   if (calls.back() == refused) throw Refusal{refused};
 }
-std::string show(Int value) { return std::to_string(value); }
-std::string show(Int64 value) { return std::to_string(value); }
-std::string show(const String& value) { return std::string(value.view()); }
-std::string show(const Data& value) { return std::string(value.view()); }
 template <class T>
-std::string show(const Optional<T>& value) {
-  return value ? show(*value) : "-";
+std::string show(const T& value) {
+  if constexpr (std::integral<T>) return std::to_string(value);
+  if constexpr (requires { value.view(); }) return std::string(value.view());
+  if constexpr (requires { value.has_value(); }) return value ? show(*value) : "-";
 }
 
 std::string joined() {
@@ -125,16 +123,11 @@ class UnpackersTest : public ::testing::Test {
 };
 
 TEST_F(UnpackersTest, ChildrenComeBeforeParentsInTheOrderOfThePayload) {
-  const DrelUserPayload output = VeskCorvelPayloadUnpacker().unpack(messageOf(tree()));
+  (void)VeskCorvelPayloadUnpacker().unpack(messageOf(tree()));
   EXPECT_EQ(joined(),
             "payload 11; payload 12; headers inner; payload 21; payload 31; payload 32; headers -; "
             "context 3; request pr; status 1; status 2; status -; token ip; allocation pa; "
             "payload 1; ");
-  ASSERT_EQ(output.corvelMessageList.size(), 2U);
-  EXPECT_EQ(output.corvelMessageList[0].dstIdTokenList[0].command, 21);
-  EXPECT_EQ(output.dstIdTokenList[1].command, 12);
-  EXPECT_EQ(output.allocationStatuses[1].participantId, Optional<Int64>(2));
-  EXPECT_TRUE(output.httpHeaders.has_value());
 }
 
 TEST_F(UnpackersTest, NothingIsCalledAfterARefusal) {
@@ -149,84 +142,28 @@ TEST_F(UnpackersTest, NothingIsCalledAfterARefusal) {
   }
 }
 
-TEST_F(UnpackersTest, OnlyACommandMakesOneCall) {
-  const DrelUserPayload output = VeskCorvelPayloadUnpacker().unpack(messageOf(payload(INT64_MIN)));
-  EXPECT_EQ(joined(), "payload -9223372036854775808; ");
-  EXPECT_TRUE(output.dstIdTokenList.empty() && output.pluginRequests.empty());
-  EXPECT_FALSE(output.httpHeaders || output.deliveryContext || output.KibbDownloadAuthList);
-
-  VeskCorvelProtocolPayload empty = payload(1);
-  empty.dstIdTokenList = List<VeskCorvelProtocolPayload>();
-  empty.selfAllocTokenList = List<VeskHoplineSelfAllocToken>();
-  empty.KibbDownloadAuthList = List<String>();
-  empty.deliveryContext = VeskCorvelProtocolDeliveryContext();
-  calls.clear();
-  const DrelUserPayload same = VeskCorvelPayloadUnpacker().unpack(messageOf(empty));
-  EXPECT_EQ(joined(), "context -; payload 1; ");
-  EXPECT_TRUE(same.dstIdTokenList.empty() && same.selfAllocTokenList.empty());
-  ASSERT_TRUE(same.KibbDownloadAuthList.has_value());
-  EXPECT_TRUE(same.KibbDownloadAuthList->empty());
-  ASSERT_TRUE(same.deliveryContext.has_value());
-  EXPECT_FALSE(same.deliveryContext->count.has_value());
-}
-
-TEST_F(UnpackersTest, WebTunnelResponsesConvertTheirHeaderBlockFirst) {
-  VeskCommandWebTunnelResponseSchema wire;
-  wire.command = 4;
-  wire.messageId = Int{-1};
-  wire.epochTimeNanos = Int64{std::numeric_limits<Int64>::max()};
-  const VeskCommandWebTunnelResponseUnpacker unpacker;
-  EXPECT_FALSE(unpacker.unpack(messageOf(wire)).httpHeaders.has_value());
-  EXPECT_EQ(joined(), "tunnel 4; ");
-  calls.clear();
-  wire.httpHeaders = with(&VeskCorvelProtocolHttpHeaders::asHttpHeader, String("as"));
-  const VeskCommandWebTunnelResponse output = unpacker.unpack(messageOf(wire));
-  EXPECT_EQ(joined(), "headers -; tunnel 4; ");
-  EXPECT_EQ(output.httpHeaders->asHttpHeader, Optional<String>(String("as")));
-  EXPECT_EQ(output.messageId, wire.messageId);
-  EXPECT_EQ(output.epochTimeNanos, wire.epochTimeNanos);
-  for (const char* call : {"headers -", "tunnel 4"}) {
-    refused = call;
-    EXPECT_THROW((void)unpacker.unpack(messageOf(wire)), Refusal);
-    EXPECT_EQ(calls.back(), call);
-  }
-}
-
-TEST_F(UnpackersTest, CommandResponsesPassThroughAndARefusalIsPassedOn) {
-  VeskCommandResponseSchema wire;
-  wire.command = 9;
-  wire.messageId = Int64{1} << 40;
-  wire.token = Data(std::string_view("\0\xFF", 2));
-  wire.internalBuild = false;
-  const VeskCommandResponse output = VeskCommandResponseUnpacker().unpack(messageOf(wire));
-  EXPECT_EQ(output.messageId, wire.messageId);
-  EXPECT_EQ(output.token, wire.token);
-  EXPECT_EQ(output.internalBuild, Optional<Bool>(false));
-  EXPECT_FALSE(output.loggingProfile.has_value());
+TEST_F(UnpackersTest, ATunnelsHeadersComeFirstAndACommandIsOneCall) {
+  VeskCommandWebTunnelResponseSchema tunnel;
+  tunnel.command = 4;
+  tunnel.httpHeaders = VeskCorvelProtocolHttpHeaders();
+  (void)VeskCommandWebTunnelResponseUnpacker().unpack(messageOf(tunnel));
+  VeskCommandResponseSchema response;
+  response.command = 9;
+  (void)VeskCommandResponseUnpacker().unpack(messageOf(response));
+  EXPECT_EQ(joined(), "headers -; tunnel 4; response 9; ");
+  refused = "headers -";
+  EXPECT_THROW((void)VeskCommandWebTunnelResponseUnpacker().unpack(messageOf(tunnel)), Refusal);
+  EXPECT_EQ(calls.back(), refused);
   refused = "response 9";
-  EXPECT_THROW((void)VeskCommandResponseUnpacker().unpack(messageOf(wire)), Refusal);
+  EXPECT_THROW((void)VeskCommandResponseUnpacker().unpack(messageOf(response)), Refusal);
 }
 
 TEST_F(UnpackersTest, ADecodingErrorComesBeforeAnyCall) {
-  const auto refusal = [](std::string_view xml) {
-    const Data message{xml};
-    return testing::refusalOf([&] { (void)VeskCorvelPayloadUnpacker().unpack(message); });
-  };
-  EXPECT_EQ(refusal("<plist><dict><key>c</key><integer>1</integer><key>mml</key><array><dict/>"
-                    "</array><key>h</key><dict/></dict></plist>"),
+  const Data message(
+      std::string_view("<plist><dict><key>c</key><integer>1</integer><key>h</key><dict/>"
+                       "<key>mml</key><array><dict/></array></dict></plist>"));
+  EXPECT_EQ(testing::refusalOf([&] { (void)VeskCorvelPayloadUnpacker().unpack(message); }),
             "keyNotFound mml[0].c: required key is missing");
-  EXPECT_EQ(refusal("<plist><dict><key>Dc</key><dict><key>c</key><integer>1</integer></dict>"
-                    "</dict></plist>"),
-            "keyNotFound c: required key is missing");
-  EXPECT_TRUE(refusal("").starts_with("malformed: "));
-  for (const auto& unpack :
-       {+[](const Data& message) { (void)VeskCommandResponseUnpacker().unpack(message); },
-        +[](const Data& message) {
-          (void)VeskCommandWebTunnelResponseUnpacker().unpack(message);
-        }}) {
-    const Data empty(std::string_view("<plist><dict/></plist>"));
-    EXPECT_EQ(testing::refusalOf([&] { unpack(empty); }), "keyNotFound c: required key is missing");
-  }
   EXPECT_TRUE(calls.empty());
 }
 
