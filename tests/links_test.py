@@ -24,7 +24,7 @@ def broken(page):
 def main():
     pages = [page for folder in (".", "doc", "tests/vectors", "examples", "packaging")
              for page in (ROOT / folder).glob("*.md")]
-    sys.exit("\n".join(link for page in pages for link in broken(page)))
+    sys.exit("\n".join(link for page in pages for link in broken(page)) or 0)
 
 
 if __name__ == "__main__":
