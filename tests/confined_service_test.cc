@@ -1,6 +1,6 @@
 // Servers as processes, looked at from outside: what they report, what the kernel says of them,
-// what they do where they cannot be confined, and how they share their limit of memory. (S4, S6,
-// S12)
+// what they do where they cannot be confined and with frames that lie, and how they share their
+// limit of memory. (S1, S4, S6, S12)
 
 #include <grp.h>
 #include <gtest/gtest.h>
@@ -166,6 +166,50 @@ TEST_F(FullyConfinedService, MemoryIsSharedAndRefusedToWhoWantsItAllAlone) {
   }
   server.endInput();
   EXPECT_EQ(server.end(), 0);
+}
+
+/// All that comes back for `input`, by its id, from the hello to the end in order.
+std::map<std::uint64_t, frames::Reply> replies(std::string_view input) {
+  SpokenTo service(runService);
+  EXPECT_TRUE(service.receive());
+  service.send(input);
+  service.endInput();
+  std::map<std::uint64_t, frames::Reply> all;
+  while (const auto body = service.receive()) {
+    const frames::Reply reply = frames::parseReply(*body);
+    EXPECT_TRUE(all.emplace(reply.id, reply).second) << "a second reply to " << reply.id;
+  }
+  EXPECT_FALSE(service.midFrame());
+  EXPECT_EQ(service.end(), 0);
+  return all;
+}
+std::string request(std::uint64_t id, std::string_view type = VeskCommandResponse::schemaName) {
+  BlockBuilder out;
+  frames::appendRequest(out, id, type,
+                        "<plist><dict><key>c</key><integer>1</integer></dict></plist>");
+  return {out.bytes(), out.size()};
+}
+
+TEST(ConfinedService, BadRequestsGetAnErrorAndTheNextIsServed) {
+  std::string lyingName = request(8);
+  lyingName[12] = '\xFF';                            // longer than the frame
+  const std::string tiny("\x03\x00\x00\x00xyz", 7);  // too short for an id
+  const auto all = replies(request(5, "NoSuchType") + lyingName + tiny + request(9));
+  ASSERT_EQ(all.size(), 4U);
+  for (const std::uint64_t id : {5, 8, 0}) EXPECT_EQ(all.at(id).status, Status::notServed) << id;
+  EXPECT_EQ(frames::parseSentence(all.at(5).body), "no unpacker for this type");
+  EXPECT_EQ(all.at(9).status, Status::record);
+}
+
+TEST(ConfinedService, OverLongAndCutFramesEndTheConnectionInOrder) {
+  const std::string whole = request(1);
+  const std::string tooLong = std::string(4, '\xFF') + std::string(100'000, 'x');
+  const auto all = replies(whole + tooLong + request(2));
+  EXPECT_EQ(all.size(), 2U);
+  EXPECT_TRUE(all.contains(0) && all.contains(1));
+  for (const std::size_t length : {std::size_t{1}, std::size_t{4}, whole.size() - 1}) {
+    EXPECT_EQ(replies(whole + whole.substr(0, length)).size(), 1U);
+  }
 }
 
 /// Sent at once, so that one thread reads them all.
