@@ -12,12 +12,10 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
-#include <random>
 #include <string>
 #include <string_view>
 #include <thread>
 #include <utility>
-#include <vector>
 
 #include "frames/confinement_bits.h"
 #include "frames/frame.h"
@@ -44,10 +42,9 @@ void write(BlockBuilder& frames) { write({frames.bytes(), frames.size()}); }
   for (;;) ::pause();
 }
 
-void answer(std::uint64_t id, Int number, std::size_t tokenBytes = 0) {
+void answer(std::uint64_t id, Int number) {
   VeskCommandResponseArguments arguments;
   arguments.command = number;
-  if (tokenBytes != 0) arguments.token = Data(std::string(tokenBytes, 't'));
   BlockBuilder out;
   const std::size_t start = frames::beginReply(out, id, frames::Status::record);
   frames::encodeRecord(VeskCommandResponse::with(std::move(arguments)), out);
@@ -72,8 +69,6 @@ Int inheritedThings() {
   return things;
 }
 
-std::vector<std::pair<std::uint64_t, Int>> held;
-
 void serve(const frames::Request& request) {
   static bool takenOver = false;
   if (takenOver) std::_Exit(66);
@@ -94,13 +89,9 @@ void serve(const frames::Request& request) {
     frames::appendRefusal(out, id, error);
   } else if (verb == "notServed") {
     frames::appendSentence(out, id, frames::Status::notServed, "nobody unpacks this");
-  } else if (verb == "large") {  // a reply of so many bytes
-    answer(id, number, static_cast<std::size_t>(number));
   } else if (verb == "slow") {  // so many milliseconds
     std::this_thread::sleep_for(std::chrono::milliseconds(number));
     answer(id, number);
-  } else if (verb == "last") {  // answered after what came with it, the last one first
-    held.emplace_back(id, number);
   } else if (verb == "inherited") {
     answer(id, inheritedThings());
   } else if (verb == "signal") {
@@ -149,19 +140,6 @@ void serve(const frames::Request& request) {
       write(".");
       std::this_thread::sleep_for(1ms);
     }
-  } else if (verb == "garble") {  // a good reply with a few bytes changed
-    frames::appendRefusal(out, id, {DecodingError::Kind::malformed, "a.b", "broken", 7});
-    const std::size_t start = frames::beginReply(out, id, frames::Status::record);
-    VeskCommandResponseArguments arguments;
-    arguments.applicationId = String("application");
-    frames::encodeRecord(VeskCommandResponse::with(std::move(arguments)), out);
-    frames::endReply(out, start);
-    std::mt19937 random(static_cast<unsigned>(number));
-    const std::size_t first = number % 2 == 0 ? 0 : start;  // garble the refusal, or the record
-    const std::size_t size = (number % 2 == 0 ? start : out.size()) - first;
-    for (int i = 0; i < 2; ++i) out.bytes()[first + random() % size] = static_cast<char>(random());
-    write({out.bytes() + first, size});
-    std::_Exit(0);
   } else if (verb == "unasked") {  // bytes when nothing is owed
     answer(id, number);
     write(std::string_view("\x20\0\0\0", 4));
@@ -193,6 +171,5 @@ int main(int, char** arguments) {
     if (count <= 0) return 0;
     assembler.commit(static_cast<std::size_t>(count));
     while (const auto body = assembler.next()) serve(frames::parseRequest(*body));
-    for (; !held.empty(); held.pop_back()) answer(held.back().first, held.back().second);
   }
 }
