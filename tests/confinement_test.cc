@@ -14,20 +14,14 @@
 #include <array>
 #include <atomic>
 #include <cerrno>
-#include <condition_variable>
 #include <csignal>
 #include <cstdio>
-#include <cstdlib>
 #include <cstring>
-#include <exception>
 #include <functional>
 #include <map>
-#include <mutex>
 #include <ostream>
-#include <stdexcept>
 #include <string>
 #include <thread>
-#include <vector>
 
 namespace ironmoat::confinement {
 namespace {
@@ -218,59 +212,6 @@ TEST_F(ConfinementTest, ThreadsStartedBeforeAreConfined) {
               return 0L;
             }),
             "SIGSYS");
-}
-
-TEST_F(ConfinementTest, WhatThreadsOfAServerDoSurvives) {
-  const auto busy = [] {
-    prepareMemory();
-    std::mutex mutex;
-    std::condition_variable changed;
-    int turn = -1;
-    std::atomic<int> running = 0;
-    std::vector<std::thread> threads;
-    for (int i = 0; i < 4; ++i) {
-      threads.emplace_back([&, i] {
-        ++running;
-        std::unique_lock lock(mutex);
-        for (int round = 0; round < 50; ++round) {
-          changed.wait(lock, [&] { return turn == round * 4 + i; });
-          ++turn;
-          changed.notify_all();
-          lock.unlock();
-          std::vector<std::string> memory;
-          try {
-            for (std::size_t size = 100; size < 2 << 20; size *= 2) memory.emplace_back(size, 'x');
-            if (i % 2 == 0) static_cast<void>(memory.at(1000));
-            static_cast<void>(new char[std::size_t{1} << 40]);
-          } catch (const std::out_of_range&) {
-          } catch (const std::bad_alloc&) {
-          }
-          lock.lock();
-        }
-      });
-    }
-    while (running < 4) std::this_thread::yield();
-    confine();
-    {
-      const std::lock_guard lock(mutex);
-      turn = 0;
-      changed.notify_all();
-    }
-    for (std::thread& thread : threads) thread.join();
-    return turn == 200 ? 0L : -1L;
-  };
-  EXPECT_EQ(outcomeOf(busy), "returned");
-}
-
-TEST_F(ConfinementTest, AbortingIsToldFromAForbiddenCall) {
-  const auto outcome = [](const std::function<void()>& end) {
-    return confinedOutcomeOf([&] {
-      end();
-      return 0L;
-    });
-  };
-  EXPECT_EQ(outcome([] { std::abort(); }), "SIGABRT");
-  EXPECT_EQ(outcome([] { std::terminate(); }), "SIGABRT");
 }
 
 TEST_F(ConfinementTest, TheLastWordNamesAForbiddenCall) {
