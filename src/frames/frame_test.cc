@@ -43,42 +43,19 @@ const std::string kHelloBody = "IRONMOAT\1\0\5\0\0\0\x08\x07\x06\x05\x04\x03\x02
 const std::string kRequestBody = "\x2A\0\0\0\0\0\0\x80\x05Type1<msg>"s;
 const std::string kRefusalBody = "\x07\0\0\0\0\0\0\0\1\2\x34\x12\0\0\0\0\0\0\x08\0mml[1].Uwhy"s;
 
-TEST(FrameTest, FramesAreLaidOutAsDescribed) {
+TEST(FrameTest, WhatIsParsedIsWhatWasAppended) {
   const Hello hello{1, 5, 0x0102030405060708, 2, 3, 4, 512};
   EXPECT_EQ(written([&](auto& out) { appendHello(out, hello); }), frame(kHelloBody));
   EXPECT_EQ(parseHello(tightMessage(kHelloBody)), hello);
-
-  const std::uint64_t id = 0x800000000000002A;
-  EXPECT_EQ(written([&](auto& out) { appendRequest(out, id, "Type1", "<msg>"); }),
-            frame(kRequestBody));
   const Data body = tightMessage(kRequestBody);
-  const Request request = parseRequest(body);
-  EXPECT_EQ(request.id, id);
-  EXPECT_EQ(request.outputType, "Type1");
-  EXPECT_EQ(request.message.view(), "<msg>");
-  EXPECT_EQ(request.message.slice().block(), body.slice().block());
+  EXPECT_EQ(parseRequest(body).message.slice().block(), body.slice().block());  // not a copy
 
   const DecodingError refusal(Kind::typeMismatch, "mml[1].U", "why", 0x1234);
   EXPECT_EQ(written([&](auto& out) { appendRefusal(out, 7, refusal); }), frame(kRefusalBody));
-  const Reply reply = parseReply(tightMessage(kRefusalBody));
-  EXPECT_EQ(reply.id, 7U);
-  EXPECT_EQ(reply.status, Status::refused);
-  const DecodingError error = parseRefusal(reply.body);
-  EXPECT_EQ(error.kind(), refusal.kind());
-  EXPECT_EQ(error.path(), refusal.path());
-  EXPECT_EQ(error.offset(), refusal.offset());
-  EXPECT_STREQ(error.what(), refusal.what());
+  EXPECT_EQ(carried(refusal).offset(), 0x1234U);
   EXPECT_FALSE(carried(DecodingError(Kind::keyNotFound, "", "")).offset().has_value());
-
   EXPECT_EQ(written([](auto& out) { appendSentence(out, 1, Status::failed, "why"); }),
             frame(number(1, 8) + "\3why"));
-  EXPECT_EQ(written([](auto& out) {
-              out.append("before");
-              const std::size_t start = beginReply(out, 2, Status::record);
-              out.append("fields");
-              endReply(out, start);
-            }),
-            "before" + frame(number(2, 8) + "\0fields"s));
 }
 
 TEST(FrameTest, BrokenBodiesAreRefused) {
