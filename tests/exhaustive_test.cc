@@ -14,20 +14,14 @@
 #include "records/command_response.h"
 #include "records/message_payload.h"
 #include "records/web_tunnel.h"
-#include "support/generated_records.h"
 #include "support/refusal.h"
 #include "support/tight_message.h"
+#include "support/wire_fields.h"
 #include "unpackers/command_response_unpacker.h"
 #include "unpackers/corvel_payload_unpacker.h"
 #include "unpackers/web_tunnel_response_unpacker.h"
 
 namespace ironmoat {
-
-template <class R>
-requires requires { typename R::CodingKeys; }
-struct testing::FieldsOf<R> {
-  using List = typename std::remove_const_t<decltype(records::Table<R>::rows)>::template Fields<R>;
-};
 
 namespace {
 

@@ -12,22 +12,15 @@
 #include <iterator>
 #include <string>
 #include <string_view>
-#include <type_traits>
 #include <utility>
 
 #include "plist/encoder.h"
 #include "records/command_response.h"
 #include "records/message_payload.h"
 #include "records/web_tunnel.h"
-#include "support/generated_records.h"
+#include "support/wire_fields.h"
 
 namespace ironmoat {
-
-template <class R>
-requires requires { typename R::CodingKeys; }
-struct testing::FieldsOf<R> {
-  using List = typename std::remove_const_t<decltype(records::Table<R>::rows)>::template Fields<R>;
-};
 
 namespace {
 
