@@ -2,14 +2,15 @@
 // copy of them: the fields of the wire records in decoding order, the arguments of the output
 // records' initialisers in label order, and the limits that a message meets.
 
-#include <array>
 #include <concepts>
 #include <cstdlib>
 #include <iomanip>
 #include <iostream>
+#include <sstream>
 #include <string>
 #include <string_view>
 #include <type_traits>
+#include <utility>
 
 #include "ironmoat/command_response.h"
 #include "ironmoat/limits.h"
@@ -52,90 +53,73 @@ struct TypeOf<Optional<T>> {
   static std::string name() { return TypeOf<T>::name(); }
 };
 
-/// The members of an array or object, each on a line of its own.
-class Lines {
- public:
-  explicit Lines(int indent) : indent_(indent) {}
-  std::ostream& next() {
-    if (!first_) std::cout << ',';
-    first_ = false;
-    return std::cout << '\n' << std::string(static_cast<std::size_t>(indent_), ' ');
-  }
-
- private:
-  int indent_;
-  bool first_ = true;
-};
-
-template <class T>
-void printType() {
-  std::cout << "\"type\": " << std::quoted(TypeOf<T>::name())
-            << ", \"optional\": " << (TypeOf<T>::optional ? "true" : "false");
+/// The fields, each with what `more` prints of its name and place.
+template <class Fields, class More>
+std::string fields(More more) {
+  std::ostringstream out;
+  std::size_t place = 0;
+  Fields::forEach([&](auto field) {
+    using F = decltype(field);
+    using Type = TypeOf<typename F::Type>;
+    out << (place == 0 ? "\n" : ",\n") << "{\"type\": " << std::quoted(Type::name())
+        << ", \"optional\": " << (Type::optional ? "true" : "false");
+    more(out, F::name, place++);
+    out << '}';
+  });
+  return out.str();
 }
 
 template <class R>
-void printWireRecord(Lines& records) {
+std::string wireRecord() {
   constexpr const auto& rows = records::Table<R>::rows;
-  records.next() << "{\"name\": " << std::quoted(className<R>()) << ", \"bytes\": " << sizeof(R)
-                 << ", \"fields\": [";
-  Lines lines(6);
-  std::size_t place = 0;
-  std::remove_cvref_t<decltype(rows)>::template Fields<R>::forEach([&](auto field) {
-    using F = decltype(field);
-    lines.next() << "{\"name\": " << std::quoted(F::name) << ", ";
-    printType<typename F::Type>();
-    std::cout << ", \"key\": " << std::quoted(rows.keys[place++]) << '}';
+  std::ostringstream out;
+  out << "{\"name\": " << std::quoted(className<R>()) << ", \"bytes\": " << sizeof(R)
+      << ", \"fields\": [";
+  using Fields = typename std::remove_cvref_t<decltype(rows)>::template Fields<R>;
+  out << fields<Fields>([](std::ostream& to, std::string_view name, std::size_t place) {
+    to << ", \"name\": " << std::quoted(name) << ", \"key\": " << std::quoted(rows.keys[place]);
   });
-  std::cout << "]}";
+  return out.str() + "]}";
 }
 
-/// The label of an initialiser's argument: the first is labelled `with`, every other one has its
-/// field's name.
-std::string_view argumentLabel(std::size_t position, std::string_view fieldName) {
-  return position == 0 ? "with" : fieldName;
-}
-
+/// The first argument is labelled `with`, every other one has its field's name.
 template <class R>
-void printOutputRecord(Lines& records) {
-  records.next() << "{\"name\": " << std::quoted(className<R>()) << ", \"arguments\": [";
-  Lines lines(6);
-  std::size_t place = 0;
-  R::Arguments::Fields::forEach([&](auto field) {
-    using F = decltype(field);
-    lines.next() << "{\"label\": " << std::quoted(argumentLabel(place++, F::name)) << ", ";
-    printType<typename F::Type>();
-    std::cout << '}';
-  });
-  std::cout << "]}";
+std::string outputRecord() {
+  std::ostringstream out;
+  out << "{\"name\": " << std::quoted(className<R>()) << ", \"arguments\": [";
+  out << fields<typename R::Arguments::Fields>(
+      [](std::ostream& to, std::string_view name, std::size_t place) {
+        to << ", \"label\": " << std::quoted(place == 0 ? "with" : name);
+      });
+  return out.str() + "]}";
 }
 
 template <class... R>
 void printWireRecords() {
-  Lines records(4);
-  (printWireRecord<R>(records), ...);
+  const char* separator = "";
+  ((std::cout << std::exchange(separator, ",\n") << wireRecord<R>()), ...);
 }
-
 template <class... R>
 void printOutputRecords() {
-  Lines records(4);
-  (printOutputRecord<R>(records), ...);
+  const char* separator = "";
+  ((std::cout << std::exchange(separator, ",\n") << outputRecord<R>()), ...);
 }
 
 void printTables() {
-  std::cout << "{\n  \"limits\": {\"messageBytes\": " << limits::messageBytes
+  std::cout << "{\"limits\": {\"messageBytes\": " << limits::messageBytes
             << ", \"nestedContainers\": " << limits::nestedContainers
             << ", \"recordBytes\": " << limits::recordBytes
-            << ", \"deliveredBytes\": " << limits::deliveredBytes << "},\n  \"wireRecords\": [";
+            << ", \"deliveredBytes\": " << limits::deliveredBytes << "},\n\"wireRecords\": [";
   printWireRecords<
       VeskCommandResponseSchema, VeskCommandWebTunnelResponseSchema, VeskCorvelProtocolPayload,
       VeskCorvelProtocolHttpHeaders, VeskCorvelProtocolDeliveryContext, VeskHoplinePluginRequest,
       VeskHoplineAllocationStatus, VeskHoplineSelfAllocToken, VeskHoplinePluginAllocation>();
-  std::cout << "],\n  \"outputRecords\": [";
+  std::cout << "],\n\"outputRecords\": [";
   printOutputRecords<VeskCommandResponse, VeskCommandWebTunnelResponse, DrelUserPayload,
                      DrelUserPayloadHttpHeaders, DrelUserPayloadDeliveryContext,
                      DrelHoplinePluginRequest, DrelHoplineAllocationStatus,
                      DrelHoplineSelfAllocToken, DrelHoplinePluginAllocation>();
-  std::cout << "]\n}\n";
+  std::cout << "]}\n";
 }
 
 }  // namespace

@@ -1,5 +1,6 @@
 #include <gtest/gtest.h>
 
+#include <array>
 #include <initializer_list>
 #include <string>
 #include <string_view>
@@ -42,48 +43,31 @@ std::string inUtf16(std::string_view utf8, bool bigEndian) {
   return bytes;
 }
 
-struct Row {
-  std::string_view text;
-  std::string_view expected;
-};
-
 /// Each body, in all encodings, gives the tree.
-void expectTrees(std::initializer_list<Row> rows) {
-  for (const Row& row : rows) {
-    const std::string message = inPlist(row.text);
-    EXPECT_EQ(outcome(message), row.expected) << row.text;
-    EXPECT_EQ(outcome(inUtf16(message, false)), row.expected) << row.text;
-    EXPECT_EQ(outcome(inUtf16(message, true)), row.expected) << row.text;
+void expectTrees(std::initializer_list<std::array<std::string_view, 2>> rows) {
+  for (const auto& [text, tree] : rows) {
+    const std::string message = inPlist(text);
+    for (const std::string& all : {message, inUtf16(message, false), inUtf16(message, true)}) {
+      EXPECT_EQ(outcome(all), tree) << text;
+    }
   }
 }
 
-TEST(XmlReaderTest, ReadsEveryElement) {
+// How else values can be spelled is the model's; here is what it does not write.
+TEST(XmlReaderTest, ReadsOddSpellings) {
   expectTrees({
       {" <array\n>\t<true/><false /> <true></true><false\t></false\r\n></array > ",
        "[true, false, true, false]"},
       {"<dict><key>a</key><dict></dict><key/><string/><key></key><array><dict/></array><key>a</key>"
        "<string></string></dict>",
        R"({"a": {}, "": "", "": [{}], "a": ""})"},
-      {"<array><data/><data> \n </data><data>QUI=</data><data>\r\n\tQ U\r\nJD\r\n</data></array>",
-       R"([data "", data "", data "AB", data "ABC"])"},
       {"<!-- - --><?a?><array><!----><?b c?d?><true/><?ab-1 <x>?></array><!--<x>&y;]]>-->",
        "[true]"},
-  });
-}
-
-TEST(XmlReaderTest, ReadsText) {
-  expectTrees({
-      {"<string>\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80\x7F</string>",
-       "\"\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80\x7F\""},
-      {"<string> a &lt;&gt;&amp;&quot;&apos; </string>", R"(" a <>&\"' ")"},
-      {"<string>&#65;&#x42;&#x00000000000000000063;&#xe9;&#x1F600;</string>",
-       "\"ABc\xC3\xA9\xF0\x9F\x98\x80\""},
-      {"<string>a<!-- b -->c<?d e?>f</string>", R"("acf")"},
-      {"<string><!-- only --></string>", R"("")"},
+      {"<string>&#65;&#x00000000000000000063;&#x1F600;\x7F</string>", "\"Ac\xF0\x9F\x98\x80\x7F\""},
       {"<string>] ]] ]>]&gt;]</string>", R"("] ]] ]>]>]")"},
       {"<string>a<![CDATA[<b>&amp;]]]]><![CDATA[>]]>c<![CDATA[]]></string>", R"("a<b>&amp;]]>c")"},
-      {"<string>a\r\nb\rc\r\r\nd&#13;&#xD;\n</string>", "\"a\nb\nc\n\nd\r\r\n\""},
-      {"<string><![CDATA[a\r\nb\rc\r]]>\n</string>", "\"a\nb\nc\n\n\""},
+      {"<string>a\r\nb\rc\r\r\nd&#13;\n<![CDATA[a\r\nb\r]]>\n</string>",
+       "\"a\nb\nc\n\nd\r\na\nb\n\n\""},
       {"<dict><key>&lt;</key><string>x</string><key>\r</key><string>&gt;</string></dict>",
        "{\"<\": \"x\", \"\n\": \">\"}"},
       {"<array><data>QU<!-- -->JD</data><data>Q&#x55;I=</data><data><![CDATA[QQ==]]></data>"
@@ -109,10 +93,8 @@ TEST(XmlReaderTest, ReadsNumbersAndDates) {
     std::string text;
     std::string_view expected;  // empty: refused
   } rows[] = {
-      {"integer", " \t\r\n-17\n", "-17"},
       {"integer", "+" + zeros + "9", "9"},
       {"integer", "-0", "0"},
-      {"integer", "9223372036854775807", "9223372036854775807"},
       {"integer", "9223372036854775808", "unsigned 9223372036854775808"},
       {"integer", "18446744073709551615", "unsigned 18446744073709551615"},
       {"integer", "18446744073709551616", ""},
@@ -121,11 +103,9 @@ TEST(XmlReaderTest, ReadsNumbersAndDates) {
       {"integer", "-0X8000000000000000", "-9223372036854775808"},
       {"integer", "0x" + zeros + "ffffffffffffFFFF", "unsigned 18446744073709551615"},
       {"integer", "-", ""},
-      {"integer", "+-1", ""},
       {"integer", "0x", ""},
       {"integer", "1.0", ""},
       {"real", " -12.5e+3 ", "real"},
-      {"real", "+inf", "real"},
       {"real", "1e+", ""},
       {"date", " 2024-02-29T23:59:60Z\n", "date"},
       {"date", "2024-01-32T00:00:00Z", ""},
