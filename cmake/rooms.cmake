@@ -2,8 +2,8 @@
 #
 #   ironmoat_room(<room> SOURCES file... [LINKS room...] [LIBRARIES target...] [TESTS file...])
 #
-# LINKS are the rooms whose headers it may include. A room sees only their folders, so an include
-# along an arrow that is not drawn here does not compile. TESTS (x_test.cc beside x.cc) become one
+# LINKS are the rooms whose headers it may include, and with them those that they link. A room sees
+# only their folders, so an include against the arrows does not compile. TESTS (x_test.cc beside x.cc) become one
 # program <room>_test.
 
 set(IRONMOAT_ROOMS_DIR ${CMAKE_BINARY_DIR}/rooms)

@@ -11,7 +11,9 @@
 
 namespace ironmoat {
 
-/// A message was refused. The same bytes give the same error, always: retrying is useless.
+/// A message was refused. The same bytes give the same error, always: retrying is useless. The one
+/// exception is a `limitExceeded` for want of memory, where that is scarcer than the limits suppose
+/// (doc/faults.md).
 ///
 /// `what()` is a sentence for people. A service as it should be never repeats the sender's text in
 /// it or in `path()`; one that was taken over may say anything: escape both for a terminal or a

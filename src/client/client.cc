@@ -56,8 +56,11 @@ class RequestFor final : public client::Request {
       record.emplace(frames::decodeRecord<R>(body));
     } catch (const frames::RecordError&) {
       throw;
-    } catch (...) {  // the record's initialiser refused, or memory ran out: no fault of the service
+    } catch (const std::bad_alloc&) {
       return fail(std::current_exception());
+    } catch (const std::exception& refusal) {  // of the record's initialiser
+      return fail(
+          std::make_exception_ptr(ServiceError(ServiceError::Kind::unavailable, refusal.what())));
     }
     done_ = true;
     promise_.set_value(std::move(*record));

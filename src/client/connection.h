@@ -24,10 +24,10 @@ namespace ironmoat::client {
 ///
 /// A thread of its own, started with the first request, starts, watches and replaces the process.
 /// Bytes are sent under the mutex, by that thread or by a submitting one, or together with others'
-/// by the reader, when it is about to look. They are read by one
-/// reader at a time: a thread that waits for its own reply if it can be, since that saves waking
-/// another one for each, and the connection's thread otherwise. Nobody waits in anything but poll,
-/// and the socket never blocks, so that neither direction can hold up the other.
+/// by the reader, when it is about to look. They are read by one reader at a time: a thread that
+/// waits for its own reply if it can be, since that saves waking another one for each, and the
+/// connection's thread otherwise. Nobody waits in anything but poll, and the socket never blocks,
+/// so that neither direction can hold up the other.
 class Connection {
  public:
   explicit Connection(Client::Options options);

@@ -120,8 +120,7 @@ int Connection::readerTimeout(TimePoint now) noexcept {
   return attentive_ ? std::min(wait, kAttentive) : wait;
 }
 
-/// With nothing in flight it wakes before anything submitted
-/// meanwhile can be late.
+/// With nothing in flight it wakes before anything submitted meanwhile can be late.
 int Connection::waitMilliseconds(TimePoint now) const noexcept {
   TimePoint until = now + std::min<Clock::duration>(deadline_, kReadOn);
   if (state_ == State::greeting) {

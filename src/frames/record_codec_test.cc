@@ -98,13 +98,22 @@ TEST(RecordLayoutTest, BytesThatBreakTheRulesAreRefused) {
 }
 
 TEST(RecordLimitsTest, NeitherDepthNorCountsAreTheSenders) {
-  DrelUserPayloadArguments outer;
-  outer.corvelMessageList.push_back(Payload::with({}));
-  const std::string two = encoded(Payload::with(std::move(outer)));
-  const std::string opening = two.substr(0, two.find(encoded(Payload::with({})), 1));
+  const auto nested = [](std::uint32_t levels) {
+    Payload record = Payload::with({});
+    while (--levels > 0) {
+      DrelUserPayloadArguments outer;
+      outer.corvelMessageList.push_back(std::move(record));
+      record = Payload::with(std::move(outer));
+    }
+    return encoded(record);
+  };
+  EXPECT_EQ(refusal<Payload>(nested(limits::nestedContainers)), "");
+  EXPECT_THROW(static_cast<void>(nested(limits::nestedContainers + 1)), RecordError);
+  const std::string two = nested(2);
+  const std::string opening = two.substr(0, two.find(nested(1), 1));
   std::string deep;
-  for (std::uint32_t i = 0; i <= limits::nestedContainers; ++i) deep += opening;
-  EXPECT_EQ(refusal<Payload>(deep + std::string(1000, '\0')), "records are nested too deeply");
+  for (std::uint32_t i = 0; i < limits::nestedContainers; ++i) deep += opening;
+  EXPECT_EQ(refusal<Payload>(deep + nested(1)), "records are nested too deeply");
   std::string announced = two;  // 255 elements, and the bytes of one
   announced.replace(opening.size() - 4, 4, "\xFF\0\0\0"s);
   EXPECT_EQ(refusal<Payload>(announced), "a list announces more than there is");

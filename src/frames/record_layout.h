@@ -81,6 +81,7 @@ struct Layout<A, FieldList<A, Members...>> {
   static constexpr std::uint8_t unusedInLast =
       sizeof...(Members) % 8 == 0 ? 0 : static_cast<std::uint8_t>(0xFF << (sizeof...(Members) % 8));
 };
+
 [[noreturn, gnu::cold, gnu::noinline]] inline void refuse(const char* sentence) {
   throw RecordError(sentence);
 }
