@@ -7,9 +7,6 @@
 #include <string>
 #include <vector>
 
-#include "plist/encoder.h"
-#include "records/command_response.h"
-#include "records/message_payload.h"
 #include "support/refusal.h"
 #include "unpackers/command_response_unpacker.h"
 #include "unpackers/corvel_payload_unpacker.h"
@@ -73,45 +70,33 @@ void admit(const DrelUserPayloadArguments& arguments) { note("payload", show(arg
 
 namespace {
 
-template <class R>
-Data messageOf(const R& record) {
-  return plist::PropertyListEncoder(plist::Form::binary).encode(record);
+Data message(const std::string& entries) {
+  return Data(std::string_view("<plist><dict>" + entries + "</dict></plist>"));
 }
-/// A record with one field present.
-template <class R, class T>
-R with(Optional<T> R::*field, T value) {
-  R record;
-  record.*field = std::move(value);
-  return record;
+std::string list(const std::string& key, const std::vector<std::string>& elements) {
+  std::string all = "<key>" + key + "</key><array>";
+  for (const std::string& entries : elements) all.append("<dict>" + entries + "</dict>");
+  return all + "</array>";
 }
-VeskCorvelProtocolPayload payload(Int command) {
-  VeskCorvelProtocolPayload record;
-  record.command = command;
-  return record;
+std::string text(const std::string& key, const std::string& value) {
+  return "<key>" + key + "</key><string>" + value + "</string>";
+}
+std::string number(const std::string& key, int value) {
+  return "<key>" + key + "</key><integer>" + std::to_string(value) + "</integer>";
+}
+std::string payload(int command, const std::string& entries = "") {
+  return number("c", command) + entries;
 }
 
-/// Payload 1 with everything nested in it, down to payloads in payloads.
-VeskCorvelProtocolPayload tree() {
-  VeskCorvelProtocolPayload inner = payload(21);
-  inner.httpHeaders = with(&VeskCorvelProtocolHttpHeaders::adhocServiceOverride, String("inner"));
-  VeskCorvelProtocolPayload first = payload(31);
-  first.dstIdTokenList = List<VeskCorvelProtocolPayload>{inner};
-  VeskCorvelProtocolPayload top = payload(1);
-  top.corvelMessageList = List<VeskCorvelProtocolPayload>{first, payload(32)};
-  top.dstIdTokenList = List<VeskCorvelProtocolPayload>{payload(11), payload(12)};
-  top.httpHeaders = VeskCorvelProtocolHttpHeaders();
-  top.deliveryContext = with(&VeskCorvelProtocolDeliveryContext::count, Int{3});
-  top.pluginAllocations = List<VeskHoplinePluginAllocation>{
-      with(&VeskHoplinePluginAllocation::pluginName, String("pa"))};
-  top.selfAllocTokenList =
-      List<VeskHoplineSelfAllocToken>{with(&VeskHoplineSelfAllocToken::relayIp, Data("ip"))};
-  top.allocationStatuses =
-      List<VeskHoplineAllocationStatus>{with(&VeskHoplineAllocationStatus::participantId, Int64{1}),
-                                        with(&VeskHoplineAllocationStatus::participantId, Int64{2}),
-                                        {}};
-  top.pluginRequests =
-      List<VeskHoplinePluginRequest>{with(&VeskHoplinePluginRequest::pluginName, String("pr"))};
-  return top;
+/// Payload 1 with everything nested in it, down to payloads in payloads, last things first.
+Data tree() {
+  const std::string inner = payload(21, "<key>h</key><dict>" + text("aS", "inner") + "</dict>");
+  return message(
+      list("qpla", {text("qpln", "pa")}) + list("qsatv", {"<key>qrip</key><data>aXA=</data>"}) +
+      list("qal", {number("qri", 1), number("qri", 2), ""}) + list("qplr", {text("qpln", "pr")}) +
+      "<key>Dc</key><dict>" + number("c", 3) + "</dict><key>h</key><dict/>" +
+      list("mml", {payload(31, list("dtl", {inner})), payload(32)}) +
+      list("dtl", {payload(11), payload(12)}) + payload(1));
 }
 
 class UnpackersTest : public ::testing::Test {
@@ -123,7 +108,7 @@ class UnpackersTest : public ::testing::Test {
 };
 
 TEST_F(UnpackersTest, ChildrenComeBeforeParentsInTheOrderOfThePayload) {
-  (void)VeskCorvelPayloadUnpacker().unpack(messageOf(tree()));
+  (void)VeskCorvelPayloadUnpacker().unpack(tree());
   EXPECT_EQ(joined(),
             "payload 11; payload 12; headers inner; payload 21; payload 31; payload 32; headers -; "
             "context 3; request pr; status 1; status 2; status -; token ip; allocation pa; "
@@ -131,7 +116,7 @@ TEST_F(UnpackersTest, ChildrenComeBeforeParentsInTheOrderOfThePayload) {
 }
 
 TEST_F(UnpackersTest, NothingIsCalledAfterARefusal) {
-  const Data message = messageOf(tree());
+  const Data message = tree();
   (void)VeskCorvelPayloadUnpacker().unpack(message);
   const std::vector<std::string> all = calls;
   for (std::size_t i = 0; i < all.size(); ++i) {
@@ -143,26 +128,21 @@ TEST_F(UnpackersTest, NothingIsCalledAfterARefusal) {
 }
 
 TEST_F(UnpackersTest, ATunnelsHeadersComeFirstAndACommandIsOneCall) {
-  VeskCommandWebTunnelResponseSchema tunnel;
-  tunnel.command = 4;
-  tunnel.httpHeaders = VeskCorvelProtocolHttpHeaders();
-  (void)VeskCommandWebTunnelResponseUnpacker().unpack(messageOf(tunnel));
-  VeskCommandResponseSchema response;
-  response.command = 9;
-  (void)VeskCommandResponseUnpacker().unpack(messageOf(response));
+  const Data tunnel = message(payload(4, "<key>h</key><dict/>"));
+  const Data response = message(payload(9));
+  (void)VeskCommandWebTunnelResponseUnpacker().unpack(tunnel);
+  (void)VeskCommandResponseUnpacker().unpack(response);
   EXPECT_EQ(joined(), "headers -; tunnel 4; response 9; ");
   refused = "headers -";
-  EXPECT_THROW((void)VeskCommandWebTunnelResponseUnpacker().unpack(messageOf(tunnel)), Refusal);
+  EXPECT_THROW((void)VeskCommandWebTunnelResponseUnpacker().unpack(tunnel), Refusal);
   EXPECT_EQ(calls.back(), refused);
   refused = "response 9";
-  EXPECT_THROW((void)VeskCommandResponseUnpacker().unpack(messageOf(response)), Refusal);
+  EXPECT_THROW((void)VeskCommandResponseUnpacker().unpack(response), Refusal);
 }
 
 TEST_F(UnpackersTest, ADecodingErrorComesBeforeAnyCall) {
-  const Data message(
-      std::string_view("<plist><dict><key>c</key><integer>1</integer><key>h</key><dict/>"
-                       "<key>mml</key><array><dict/></array></dict></plist>"));
-  EXPECT_EQ(testing::refusalOf([&] { (void)VeskCorvelPayloadUnpacker().unpack(message); }),
+  const Data wrong = message(payload(1, "<key>h</key><dict/>" + list("mml", {""})));
+  EXPECT_EQ(testing::refusalOf([&] { (void)VeskCorvelPayloadUnpacker().unpack(wrong); }),
             "keyNotFound mml[0].c: required key is missing");
   EXPECT_TRUE(calls.empty());
 }
