@@ -4,12 +4,12 @@
 #include <pthread.h>
 
 #include <functional>
+#include <string>
 
 #include "frames/record_codec.h"
 #include "ironmoat/limits.h"
-#include "plist/encoder.h"
-#include "plist/property_list_decoder.h"
-#include "records/message_payload.h"
+#include "plist/reader.h"
+#include "plist/writer.h"
 #include "unpackers/corvel_payload_unpacker.h"
 
 namespace ironmoat {
@@ -36,42 +36,31 @@ void onSmallStack(std::function<void()> act) {
 }
 
 /// Payloads within payloads, `levels` of them, each an element of the one before.
-VeskCorvelProtocolPayload nested(std::size_t levels) {
-  VeskCorvelProtocolPayload payload;
-  payload.command = static_cast<Int>(levels);
-  for (std::size_t level = levels - 1; level > 0; --level) {
-    VeskCorvelProtocolPayload outer;
-    outer.command = static_cast<Int>(level);
-    auto& list = level % 2 == 0 ? outer.corvelMessageList : outer.dstIdTokenList;
-    list = List<VeskCorvelProtocolPayload>();
-    list->push_back(std::move(payload));
-    payload = std::move(outer);
+std::string nested(std::size_t levels) {
+  std::string start;
+  std::string end;
+  for (std::size_t level = 1; level <= levels; ++level) {
+    start += "<dict><key>c</key><integer>" + std::to_string(level) + "</integer>";
+    if (level < levels) start += level % 2 == 0 ? "<key>mml</key><array>" : "<key>dtl</key><array>";
+    end += level > 1 ? "</array></dict>" : "</dict>";
   }
-  return payload;
+  return "<plist>" + start + end + "</plist>";
 }
 
-constexpr std::size_t kLevels = limits::nestedContainers / 2;  // a list and a dictionary each
+std::string reply(const DrelUserPayload& record) {
+  BlockBuilder out;
+  frames::encodeRecord(record, out);
+  return {out.bytes(), out.size()};
+}
 
 TEST(NestingTest, TheDeepestPayloadFitsInAMegabyteOfStack) {
   onSmallStack([] {
-    for (const plist::Form form : {plist::Form::binary, plist::Form::xml}) {
-      const Data message = plist::PropertyListEncoder(form).encode(nested(kLevels));
-      const DrelUserPayload output = VeskCorvelPayloadUnpacker().unpack(message);
-      BlockBuilder reply;
-      frames::encodeRecord(output, reply);
-      const BlockRef block = reply.finish();
-      const Data body(detail::Slice(block.get(), 0, block->size()));
-      const auto again = frames::decodeRecord<DrelUserPayload>(body);
-      std::size_t depth = 1;
-      const DrelUserPayload* at = &again;
-      while (true) {
-        const auto& list = at->dstIdTokenList.empty() ? at->corvelMessageList : at->dstIdTokenList;
-        if (list.empty()) break;
-        at = &list[0];
-        ++depth;
-      }
-      EXPECT_EQ(depth, kLevels);
-      EXPECT_EQ(at->command, static_cast<Int>(kLevels));
+    const Data xml(nested(limits::nestedContainers / 2));  // a list and a dictionary each
+    plist::Document document;
+    plist::readXml(xml, document);
+    for (const Data& message : {xml, writeBinary(document)}) {
+      const std::string carried = reply(VeskCorvelPayloadUnpacker().unpack(message));
+      EXPECT_EQ(reply(frames::decodeRecord<DrelUserPayload>(Data(carried))), carried);
     }
   });
 }
