@@ -37,9 +37,10 @@ class IRONMOAT_API Client {
     /// installed; the shared one first in its own installation, wherever that was moved to, when
     /// nobody but root and this process's user can change what is there.
     std::string program;
-    /// How long the service may work on one message, from 1 ms to a day. A request that is past it
-    /// is tried again, alone, and a second time when another had been served before it, before it
-    /// fails with `timedOut`; waiting for other requests does not count.
+    /// How long the service may work on one message, from 1 ms to a day (others are taken as the
+    /// nearest). A request that is past it is tried again, alone, and a second time when another
+    /// had been served before it, before it fails with `timedOut`; waiting for other requests does
+    /// not count.
     std::chrono::milliseconds deadline{2000};
     /// Bytes of requests without an outcome, with some 500 more for each request. `submit` and
     /// `unpack` wait for room, in the order of the calls; a message that is larger goes alone.
@@ -58,8 +59,8 @@ class IRONMOAT_API Client {
 
   /// Waits for the record: R is VeskCommandResponse, VeskCommandWebTunnelResponse or
   /// DrelUserPayload. Throws DecodingError when the message is refused, ServiceError when no answer
-  /// could be had, std::bad_alloc. The constructor does
-  /// not look for the service: a missing one is `unavailable` here.
+  /// could be had, std::bad_alloc. The constructor does not look for the service: a missing one is
+  /// `unavailable` here.
   template <MessageSchema R>
   R unpack(const Data& message) {
     return start<R>(message, true).get();

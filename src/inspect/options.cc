@@ -44,6 +44,7 @@ void setOutput(Options& options, Output output) {
 void setType(Options& options, std::string_view name) {
   if (name != kAutoType && recordType(name) == nullptr) refuseType(name, ", auto");
   options.type = name;
+  options.typeGiven = true;
 }
 
 void setSchema(Options& options, std::string_view name) {

@@ -21,6 +21,7 @@ inline constexpr std::string_view kAutoType = "auto";
 struct Options {
   Action action = Action::unpack;
   std::string type = "payload";
+  bool typeGiven = false;
   std::string schema;  ///< of which type to show it
   Format format = Format::text;
   Output output = Output::each;

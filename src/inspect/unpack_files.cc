@@ -51,6 +51,10 @@ class Run {
     while (!underWay_.empty()) finishOldest();
     report_->finish();
     terminal_.flush();
+    if (status_ == someRefused && !options_.typeGiven && options_.output == Output::each &&
+        options_.format == Format::text) {
+      terminal_.lastWords("(taken for " + options_.type + "; --type has others, and auto)\n");
+    }
     return status_;
   }
 
