@@ -9,18 +9,11 @@
 #include "ironmoat/errors.h"
 #include "plist/decoder.h"
 #include "plist/document.h"
-#include "records/keyed_record.h"
-#include "support/generated_records.h"
+#include "support/wire_fields.h"
 
 /// Decoding once more, in the plainest way: each field looks its key up by itself and is written
 /// down as text. No container, no index, no record is involved.
 namespace ironmoat {
-
-template <class R>
-requires requires { typename R::CodingKeys; }
-struct testing::FieldsOf<R> {
-  using List = typename std::remove_const_t<decltype(records::Table<R>::rows)>::template Fields<R>;
-};
 
 namespace fuzz {
 

@@ -4,10 +4,7 @@
 #include <type_traits>
 #include <vector>
 
-#include "records/command_response.h"
-#include "records/message_payload.h"
-#include "records/payload_parts.h"
-#include "records/web_tunnel.h"
+#include "records/all_records.h"
 
 namespace ironmoat::fuzz {
 
@@ -37,21 +34,14 @@ void addKeysOf(std::vector<WireKey>& keys) {
   });
 }
 
-template <class... R>
-std::vector<WireKey> keysOf() {
-  std::vector<WireKey> keys;
-  (addKeysOf<R>(keys), ...);
-  return keys;
-}
-
 }  // namespace
 
 std::span<const WireKey> wireKeys() {
-  static const std::vector<WireKey> keys =
-      keysOf<VeskCorvelProtocolPayload, VeskCommandResponseSchema,
-             VeskCommandWebTunnelResponseSchema, VeskCorvelProtocolHttpHeaders,
-             VeskCorvelProtocolDeliveryContext, VeskHoplinePluginRequest,
-             VeskHoplineAllocationStatus, VeskHoplineSelfAllocToken, VeskHoplinePluginAllocation>();
+  static const std::vector<WireKey> keys = [] {
+    std::vector<WireKey> all;
+    records::forEachRecord([&]<class Output, class Wire> { addKeysOf<Wire>(all); });
+    return all;
+  }();
   return keys;
 }
 

@@ -57,8 +57,8 @@ struct Outcome {
 };
 
 /// Waits for all `attempts`, of which there is one at least. Of several records the one with the
-/// most values is taken, of equals the first. That the service
-/// failed over an attempt is the outcome, whatever came of the others: nothing is known of it.
+/// most values is taken, of equals the first. That the service failed over an attempt is the
+/// outcome, whatever came of the others: nothing is known of it.
 Outcome outcomeOf(std::span<const Attempt> attempts);
 
 }  // namespace ironmoat::inspect

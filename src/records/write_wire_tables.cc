@@ -8,20 +8,15 @@
 #include <string_view>
 #include <type_traits>
 
-#include "ironmoat/command_response.h"
-#include "ironmoat/user_payload.h"
-#include "ironmoat/web_tunnel_response.h"
-#include "records/command_response.h"
-#include "records/message_payload.h"
-#include "records/payload_parts.h"
-#include "records/web_tunnel.h"
+#include "records/all_records.h"
 
 namespace ironmoat {
 namespace {
 
 /// An argument's key is that of the wire field of its name.
 template <class Output, class Wire>
-void write(std::ostream& out, std::string_view name) {
+void write(std::ostream& out) {
+  constexpr std::string_view name = records::className<Output>();
   constexpr const auto& rows = records::Table<Wire>::rows;
   using Fields = typename std::remove_cvref_t<decltype(rows)>::template Fields<Wire>;
   using Arguments = typename Output::Arguments::Fields;
@@ -38,18 +33,8 @@ void write(std::ostream& out, std::string_view name) {
   out << "  };\n};\n";
 }
 
-#define WRITE(Output, Wire) write<Output, Wire>(out, #Output)
-
 void writeAll(std::ostream& out) {
-  WRITE(VeskCommandResponse, VeskCommandResponseSchema);
-  WRITE(VeskCommandWebTunnelResponse, VeskCommandWebTunnelResponseSchema);
-  WRITE(DrelUserPayload, VeskCorvelProtocolPayload);
-  WRITE(DrelUserPayloadHttpHeaders, VeskCorvelProtocolHttpHeaders);
-  WRITE(DrelUserPayloadDeliveryContext, VeskCorvelProtocolDeliveryContext);
-  WRITE(DrelHoplinePluginRequest, VeskHoplinePluginRequest);
-  WRITE(DrelHoplineAllocationStatus, VeskHoplineAllocationStatus);
-  WRITE(DrelHoplineSelfAllocToken, VeskHoplineSelfAllocToken);
-  WRITE(DrelHoplinePluginAllocation, VeskHoplinePluginAllocation);
+  records::forEachRecord([&]<class Output, class Wire> { write<Output, Wire>(out); });
 }
 
 }  // namespace

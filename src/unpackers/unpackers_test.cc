@@ -4,9 +4,13 @@
 #include <gtest/gtest.h>
 
 #include <concepts>
+#include <stdexcept>
 #include <string>
 #include <vector>
 
+#include "frames/frame.h"
+#include "frames/record_codec.h"
+#include "host/server.h"
 #include "support/refusal.h"
 #include "unpackers/command_response_unpacker.h"
 #include "unpackers/corvel_payload_unpacker.h"
@@ -15,8 +19,8 @@
 namespace ironmoat {
 namespace {
 
-struct Refusal {
-  std::string call;
+struct Refusal : std::runtime_error {
+  using runtime_error::runtime_error;
 };
 
 std::vector<std::string> calls;
@@ -25,7 +29,7 @@ std::string refused;  // the call that the host refuses
 /// A call as "type argument", where the argument is the first one.
 void note(const std::string& type, const std::string& argument) {
   calls.push_back(type + " " + argument);
-  if (calls.back() == refused) throw Refusal{refused};
+  if (calls.back() == refused) throw Refusal(refused);
 }
 template <class T>
 std::string show(const T& value) {
@@ -138,6 +142,26 @@ TEST_F(UnpackersTest, ATunnelsHeadersComeFirstAndACommandIsOneCall) {
   EXPECT_EQ(calls.back(), refused);
   refused = "response 9";
   EXPECT_THROW((void)VeskCommandResponseUnpacker().unpack(response), Refusal);
+}
+
+TEST_F(UnpackersTest, WhatTheHostRefusesIsAReplyAndARecordThatComesBackIsAskedForAgain) {
+  IronmoatServer server(IronmoatServer::Confine::no);
+  server.registerUnpacker<VeskCommandResponse>(VeskCommandResponseUnpacker());
+  const auto served = [&] {
+    BlockBuilder request;
+    const Data bytes = message(payload(9));
+    frames::appendRequest(request, 5, VeskCommandResponse::schemaName, bytes.view());
+    BlockBuilder reply;
+    server.serve(Data(std::string_view(request.bytes(), request.size()).substr(4)), reply);
+    return frames::parseReply(Data(std::string_view(reply.bytes(), reply.size()).substr(4)));
+  };
+  const frames::Reply accepted = served();
+  refused = "response 9";
+  const frames::Reply failed = served();
+  EXPECT_EQ(failed.id, 5U);
+  EXPECT_EQ(failed.status, frames::Status::failed);
+  EXPECT_EQ(frames::parseSentence(failed.body), "response 9");
+  EXPECT_THROW((void)frames::decodeRecord<VeskCommandResponse>(accepted.body), Refusal);
 }
 
 TEST_F(UnpackersTest, ADecodingErrorComesBeforeAnyCall) {

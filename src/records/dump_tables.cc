@@ -10,27 +10,14 @@
 #include <string>
 #include <string_view>
 #include <type_traits>
-#include <utility>
 
-#include "ironmoat/command_response.h"
 #include "ironmoat/limits.h"
-#include "ironmoat/user_payload.h"
-#include "ironmoat/web_tunnel_response.h"
-#include "records/command_response.h"
-#include "records/message_payload.h"
-#include "records/payload_parts.h"
-#include "records/web_tunnel.h"
+#include "records/all_records.h"
 
 namespace ironmoat {
 namespace {
 
-template <class Named>
-constexpr std::string_view className() {
-  const std::string_view pretty = __PRETTY_FUNCTION__;  // ...Named = Scope::Class] or ...; ...]
-  const std::size_t end = pretty.find_first_of(";]", pretty.find("Named = "));
-  const std::size_t start = pretty.find_last_of(": ", end - 1) + 1;
-  return pretty.substr(start, end - start);
-}
+using records::className;
 
 template <class T>
 struct TypeOf {
@@ -94,32 +81,19 @@ std::string outputRecord() {
   return out.str() + "]}";
 }
 
-template <class... R>
-void printWireRecords() {
-  const char* separator = "";
-  ((std::cout << std::exchange(separator, ",\n") << wireRecord<R>()), ...);
-}
-template <class... R>
-void printOutputRecords() {
-  const char* separator = "";
-  ((std::cout << std::exchange(separator, ",\n") << outputRecord<R>()), ...);
-}
-
 void printTables() {
+  std::string wireRecords;
+  std::string outputRecords;
+  records::forEachRecord([&]<class Output, class Wire> {
+    const char* const separator = wireRecords.empty() ? "" : ",\n";
+    wireRecords.append(separator).append(wireRecord<Wire>());
+    outputRecords.append(separator).append(outputRecord<Output>());
+  });
   std::cout << "{\"limits\": {\"messageBytes\": " << limits::messageBytes
             << ", \"nestedContainers\": " << limits::nestedContainers
             << ", \"recordBytes\": " << limits::recordBytes
-            << ", \"deliveredBytes\": " << limits::deliveredBytes << "},\n\"wireRecords\": [";
-  printWireRecords<
-      VeskCommandResponseSchema, VeskCommandWebTunnelResponseSchema, VeskCorvelProtocolPayload,
-      VeskCorvelProtocolHttpHeaders, VeskCorvelProtocolDeliveryContext, VeskHoplinePluginRequest,
-      VeskHoplineAllocationStatus, VeskHoplineSelfAllocToken, VeskHoplinePluginAllocation>();
-  std::cout << "],\n\"outputRecords\": [";
-  printOutputRecords<VeskCommandResponse, VeskCommandWebTunnelResponse, DrelUserPayload,
-                     DrelUserPayloadHttpHeaders, DrelUserPayloadDeliveryContext,
-                     DrelHoplinePluginRequest, DrelHoplineAllocationStatus,
-                     DrelHoplineSelfAllocToken, DrelHoplinePluginAllocation>();
-  std::cout << "]}\n";
+            << ", \"deliveredBytes\": " << limits::deliveredBytes << "},\n\"wireRecords\": ["
+            << wireRecords << "],\n\"outputRecords\": [" << outputRecords << "]}\n";
 }
 
 }  // namespace
