@@ -1,9 +1,12 @@
-// What the service would be if unpacking were free: as confined, reads requests through the same
-// assembler and answers each with the reply that a typical message gets.
+// What the service would be if unpacking were free: as confined, waits as it does, reads requests
+// through the same assembler and answers each with the reply that a typical message gets.
 
+#include <fcntl.h>
+#include <sys/select.h>
 #include <sys/uio.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <csignal>
 #include <cstring>
 #include <optional>
@@ -11,6 +14,7 @@
 #include <string>
 
 #include "confinement/confinement.h"
+#include "frames/brief_wait.h"
 #include "frames/frame.h"
 #include "frames/frame_assembler.h"
 #include "frames/record_codec.h"
@@ -21,20 +25,47 @@ namespace {
 
 using namespace ironmoat;
 
+// Calls that confinement allows, on a socket that does not block.
+void waitFor(int descriptor, bool toRead) {
+  fd_set only;
+  FD_ZERO(&only);
+  FD_SET(descriptor, &only);
+  ::pselect(descriptor + 1, toRead ? &only : nullptr, toRead ? nullptr : &only, nullptr, nullptr,
+            nullptr);
+}
+
 bool writeAll(std::string_view bytes) {
   while (!bytes.empty()) {
     const iovec piece = {const_cast<char*>(bytes.data()), bytes.size()};
-    const ssize_t count = ::writev(STDOUT_FILENO, &piece, 1);  // what confinement allows
+    const ssize_t count = ::writev(STDOUT_FILENO, &piece, 1);
+    if (count < 0 && errno == EAGAIN) {
+      waitFor(STDOUT_FILENO, false);
+      continue;
+    }
     if (count <= 0) return false;
     bytes.remove_prefix(static_cast<std::size_t>(count));
   }
   return true;
 }
 
+ssize_t readSome(std::span<char> room) {
+  static frames::BriefWait wait;
+  ssize_t count = -1;
+  while (count < 0) {
+    const auto look = [&] {
+      count = ::read(STDIN_FILENO, room.data(), room.size());
+      return count >= 0;
+    };
+    wait(look, [] { waitFor(STDIN_FILENO, true); });
+  }
+  return count;
+}
+
 }  // namespace
 
 int main() {
   std::signal(SIGPIPE, SIG_IGN);
+  ::fcntl(STDIN_FILENO, F_SETFL, O_NONBLOCK);
   confinement::prepareMemory();
   BlockBuilder body;
   frames::encodeRecord(VeskCorvelPayloadUnpacker().unpack(
@@ -50,7 +81,7 @@ int main() {
     std::optional<Data> request = assembler.next();
     while (!request) {
       const std::span<char> room = assembler.room();
-      const ssize_t count = ::read(STDIN_FILENO, room.data(), room.size());
+      const ssize_t count = readSome(room);
       if (count <= 0) return 0;
       assembler.commit(static_cast<std::size_t>(count));
       request = assembler.next();

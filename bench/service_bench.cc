@@ -64,7 +64,7 @@ void pipelined(benchmark::State& state, const char* program) {
   static std::unique_ptr<Client> client;
   if (state.thread_index() == 0) client = std::make_unique<Client>(options(program));
   const Data message = typicalMessage();
-  std::deque<std::future<DrelUserPayload>> inFlight;
+  std::deque<Pending<DrelUserPayload>> inFlight;
   for (auto _ : state) {
     if (inFlight.size() == kInFlight) {
       benchmark::DoNotOptimize(inFlight.front().get().command);

@@ -34,14 +34,14 @@ class Asked final : public client::Request {
   explicit Asked(std::uint64_t id)
       : Request("R", Data(std::string_view(std::to_string(id)))), id_(id) {}
   void give(const frames::Reply&) override {}
-  void fail(std::exception_ptr) noexcept override {}
+  void giveError(std::exception_ptr) noexcept override {}
   [[nodiscard]] std::uint64_t id() const noexcept { return id_; }
 
  private:
   std::uint64_t id_;
 };
 
-std::uint64_t idOf(const std::unique_ptr<client::Request>& request) {
+std::uint64_t idOf(const std::shared_ptr<client::Request>& request) {
   return static_cast<const Asked&>(*request).id();
 }
 

@@ -2,20 +2,16 @@
 
 #include <chrono>
 #include <cstddef>
-#include <future>
 #include <memory>
 #include <string>
 
 #include "ironmoat/api.h"
 #include "ironmoat/errors.h"
 #include "ironmoat/message_schema.h"
+#include "ironmoat/pending.h"
 #include "ironmoat/values.h"
 
 namespace ironmoat {
-
-namespace client {
-class Connection;
-}
 
 /// Hands messages to a service process of its own and gets records back.
 ///
@@ -45,7 +41,7 @@ class IRONMOAT_API Client {
     /// Bytes of requests without an outcome, with some 500 more for each request. `submit` and
     /// `unpack` wait for room, in the order of the calls; a message that is larger goes alone.
     /// Records are not counted: a message of 28 KB can become one of 64 MiB (limits.h), so that it
-    /// is the number of futures held that bounds the daemon's memory.
+    /// is the number of outcomes held that bounds the daemon's memory.
     std::size_t maxBytesInFlight = std::size_t{64} << 20;
   };
 
@@ -66,18 +62,18 @@ class IRONMOAT_API Client {
     return start<R>(message, true).get();
   }
 
-  /// The same without waiting for the outcome; the future throws what `unpack` would. `message` is
-  /// shared, not copied. Records wait in their futures, in the memory of whoever holds these.
+  /// The same without waiting for the outcome, whose `get` throws what `unpack` would. `message` is
+  /// shared, not copied. Records wait in their outcomes, in the memory of whoever holds these.
   template <MessageSchema R>
-  std::future<R> submit(const Data& message) {
+  Pending<R> submit(const Data& message) {
     return start<R>(message, false);
   }
 
  private:
   template <MessageSchema R>
-  std::future<R> start(const Data& message, bool waits);
+  Pending<R> start(const Data& message, bool waits);
 
-  std::unique_ptr<client::Connection> connection_;
+  std::shared_ptr<client::Connection> connection_;
 };
 
 }  // namespace ironmoat

@@ -1,7 +1,10 @@
 #include "ironmoat/client.h"
 
+#include <exception>
+#include <memory>
 #include <new>
 #include <optional>
+#include <string>
 #include <utility>
 
 #include "client/connection.h"
@@ -20,30 +23,24 @@ template <MessageSchema R>
 class RequestFor final : public client::Request {
  public:
   explicit RequestFor(const Data& message) : Request(R::schemaName, message) {}
-  RequestFor(const RequestFor&) = delete;
-  RequestFor& operator=(const RequestFor&) = delete;
-  /// Only for want of memory is a request dropped that has no outcome. The promise would break
-  /// then, and make the error for that of memory that there may not be.
-  ~RequestFor() override {
-    if (!done_) fail(std::make_exception_ptr(std::bad_alloc()));
-  }
 
-  [[nodiscard]] std::future<R> outcome() { return promise_.get_future(); }
-  void fail(std::exception_ptr error) noexcept override {
-    done_ = true;
-    promise_.set_exception(std::move(error));
+  /// The outcome, once; requires that there is one.
+  R take() {
+    if (error_ != nullptr) std::rethrow_exception(std::move(error_));
+    return *std::move(record_);
   }
 
  protected:
+  void giveError(std::exception_ptr error) noexcept override { error_ = std::move(error); }
   void give(const frames::Reply& reply) override {
     switch (reply.status) {
       case frames::Status::record:
         return giveRecord(reply.body);
       case frames::Status::refused:
-        return fail(std::make_exception_ptr(frames::parseRefusal(reply.body)));
+        return giveError(std::make_exception_ptr(frames::parseRefusal(reply.body)));
       case frames::Status::notServed:
       case frames::Status::failed:
-        return fail(std::make_exception_ptr(
+        return giveError(std::make_exception_ptr(
             ServiceError(ServiceError::Kind::unavailable, frames::parseSentence(reply.body))));
     }
     throw frames::FrameError("a reply of unknown status");
@@ -51,23 +48,26 @@ class RequestFor final : public client::Request {
 
  private:
   void giveRecord(const Data& body) {
-    std::optional<R> record;
     try {
-      record.emplace(frames::decodeRecord<R>(body));
+      record_.emplace(InPlace{body});
     } catch (const frames::RecordError&) {
       throw;
     } catch (const std::bad_alloc&) {
-      return fail(std::current_exception());
+      giveError(std::current_exception());
     } catch (const std::exception& refusal) {  // of the record's initialiser
-      return fail(
+      giveError(
           std::make_exception_ptr(ServiceError(ServiceError::Kind::unavailable, refusal.what())));
     }
-    done_ = true;
-    promise_.set_value(std::move(*record));
   }
 
-  std::promise<R> promise_;
-  bool done_ = false;
+  /// Becomes the record where that is to stand, which spares the largest one a move of 2 KB.
+  struct InPlace {
+    const Data& body;
+    operator R() const { return frames::decodeRecord<R>(body); }  // NOLINT(*-explicit-*)
+  };
+
+  std::optional<R> record_;
+  std::exception_ptr error_;
 };
 
 }  // namespace
@@ -76,19 +76,23 @@ Client::Client() : Client(Options()) {}
 
 Client::Client(Options options) {
   if (options.program.empty()) options.program = client::defaultProgram();
-  connection_ = std::make_unique<client::Connection>(std::move(options));
+  connection_ = std::make_shared<client::Connection>(std::move(options));
 }
 
 Client::~Client() {
-  // Everything below would act on the parent's service.
-  if (connection_->inForkedChild()) static_cast<void>(connection_.release());
+  if (connection_->inForkedChild()) {
+    // Everything that its end would do acts on the parent's service: it is never to end.
+    static_cast<void>(new (std::nothrow) std::shared_ptr(connection_));
+  } else {
+    connection_->stop();
+  }
 }
 
 template <MessageSchema R>
-std::future<R> Client::start(const Data& message, bool waits) {
+Pending<R> Client::start(const Data& message, bool waits) {
   using Then = client::Connection::Then;
-  auto request = std::make_unique<RequestFor<R>>(message);
-  std::future<R> outcome = request->outcome();
+  auto request = std::make_shared<RequestFor<R>>(message);
+  Pending<R> outcome(request, connection_);
   if (message.size() > limits::messageBytes) {
     request->fail(std::make_exception_ptr(
         DecodingError(DecodingError::Kind::limitExceeded, "",
@@ -100,9 +104,26 @@ std::future<R> Client::start(const Data& message, bool waits) {
   return outcome;
 }
 
-// One line for each record that the service serves.
-template std::future<VeskCommandResponse> Client::start(const Data&, bool);
-template std::future<VeskCommandWebTunnelResponse> Client::start(const Data&, bool);
-template std::future<DrelUserPayload> Client::start(const Data&, bool);
+template <MessageSchema R>
+std::future_status Pending<R>::waitUntil(Clock::time_point until) const {
+  return request_->isDone() || connection_->await(*request_, until) ? std::future_status::ready
+                                                                    : std::future_status::timeout;
+}
+
+template <MessageSchema R>
+R Pending<R>::get() {
+  wait();
+  connection_.reset();
+  const std::shared_ptr<client::Request> request = std::move(request_);
+  return static_cast<RequestFor<R>&>(*request).take();
+}
+
+// Two lines for each record that the service serves.
+template Pending<VeskCommandResponse> Client::start(const Data&, bool);
+template Pending<VeskCommandWebTunnelResponse> Client::start(const Data&, bool);
+template Pending<DrelUserPayload> Client::start(const Data&, bool);
+template class Pending<VeskCommandResponse>;
+template class Pending<VeskCommandWebTunnelResponse>;
+template class Pending<DrelUserPayload>;
 
 }  // namespace ironmoat

@@ -21,7 +21,7 @@ namespace ironmoat {
 namespace {
 
 using namespace std::chrono_literals;
-using Pending = std::future<VeskCommandResponse>;
+using Pending = ironmoat::Pending<ironmoat::VeskCommandResponse>;
 
 Client::Options options(std::string program, std::chrono::milliseconds deadline) {
   Client::Options all;
@@ -166,6 +166,41 @@ TEST_F(ClientTest, BytesInFlightAreBounded) {
   EXPECT_EQ(submitted, 5);
 }
 
+TEST_F(ClientTest, OutcomesComeWhoeverWaitsForThem) {
+  Client::Options all = fake();
+  all.maxBytesInFlight = 3000;
+  std::vector<Pending> waiting;
+  auto client = std::make_unique<Client>(all);
+  std::vector<Pending> unheard = submitEchoes(*client, 50);  // beyond the room: the client reads
+  Pending slow = submit(*client, "slow 100");
+  EXPECT_EQ(slow.wait_for(1ms), std::future_status::timeout);
+  while (slow.wait_for(0s) != std::future_status::ready) {
+  }
+  EXPECT_EQ(outcome(slow), "100");
+  EXPECT_FALSE(slow.valid());
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([&client, t] {
+      std::vector<Pending> own = submitEchoes(*client, 20);
+      Pending last = submit(*client, "slow 20");
+      EXPECT_EQ(last.wait_for(t * 1ms), std::future_status::timeout);
+      EXPECT_EQ(outcome(last), "20");
+      expectEchoes(own);
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+
+  for (int i = 0; i < 3; ++i) waiting.push_back(submit(*client, "ignore"));
+  for (Pending& each : waiting) {
+    threads.emplace_back(
+        [&each] { EXPECT_EQ(outcome(each), "unavailable: the client was destroyed"); });
+  }
+  std::this_thread::sleep_for(20ms);
+  client.reset();
+  for (std::size_t t = 4; t < threads.size(); ++t) threads[t].join();
+  expectEchoes(unheard);
+}
+
 TEST_F(ClientTest, WhatCannotServeIsUnavailable) {
   const struct {
     std::string program;
@@ -238,14 +273,17 @@ TEST_F(ClientTest, AForkedChildNeitherUsesNorKeepsTheService) {
   ASSERT_EQ(::pipe(done), 0);
   auto client = std::make_unique<Client>(fake());
   EXPECT_EQ(outcome(*client, "echo 1"), "1");
+  Pending begun = submit(*client, "slow 200");
   const pid_t child = ::fork();
   if (child == 0) {
-    const bool refused = outcome(*client, "echo 2").starts_with("unavailable: ");
+    const bool refused = outcome(*client, "echo 2").starts_with("unavailable: ") &&
+                         outcome(begun).starts_with("unavailable: ");
     client.reset();
     char byte = 0;
     // Lives on with copies of the client's descriptors until the parent's client is gone.
     std::_Exit(::read(done[0], &byte, 1) == 1 && refused ? 0 : 1);
   }
+  EXPECT_EQ(outcome(begun), "200");
   EXPECT_EQ(outcome(*client, "exit 1").substr(0, 8), "crashed:");
   EXPECT_EQ(outcome(*client, "echo 4"), "4");
   client.reset();

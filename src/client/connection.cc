@@ -21,9 +21,15 @@ namespace ironmoat::client {
 using namespace std::chrono_literals;
 
 namespace {
+
 constexpr int kWritesInARow = 4;                 // before replies are looked at again
 constexpr std::size_t kAtOnce = 64;              // replies given out together, at most
 constexpr std::size_t kMostParts = 2 * kAtOnce;  // of a write: two for each request
+
+std::exception_ptr unavailable(const std::string& why) {
+  return std::make_exception_ptr(ServiceError(ServiceError::Kind::unavailable, why));
+}
+
 }  // namespace
 
 Connection::Connection(Client::Options options)
@@ -34,52 +40,115 @@ Connection::Connection(Client::Options options)
   answers_.reserve(kAtOnce);
 }
 
-Connection::~Connection() {
+void Connection::stop() noexcept {
   {
     const Lock lock(mutex_);
     stopping_ = true;
     admission_.stop();
+    if (reader_ == Reader::caller && socket_ >= 0) ::shutdown(socket_, SHUT_RDWR);
     if (wake_) wake();
   }
   if (thread_.joinable()) thread_.join();
 }
 
-void Connection::submit(std::unique_ptr<Request> request, Then then) {
-  const auto refuse = [&](const std::string& why) {
-    request->fail(std::make_exception_ptr(ServiceError(ServiceError::Kind::unavailable, why)));
-  };
-  if (inForkedChild()) return refuse("this client belongs to the process that forked this one");
+void Connection::submit(std::shared_ptr<Request> request, Then then) {
+  if (inForkedChild()) {
+    return request->fail(unavailable("this client belongs to the process that forked this one"));
+  }
   Lock lock(mutex_);
   try {
     if (!thread_.joinable()) startThread();
   } catch (const std::system_error& error) {
-    return refuse(std::string("cannot start the client's thread: ") + error.what());
+    return request->fail(
+        unavailable(std::string("cannot start the client's thread: ") + error.what()));
   }
   const std::size_t cost = request->cost();
-  if (!admission_.enter(lock, cost)) return refuse("the client is being destroyed");
-  const bool othersFirst = queue_.hasUnsent();
+  if (!admission_.enter(lock, cost)) {
+    return request->fail(unavailable("the client is being destroyed"));
+  }
+  const bool first = queue_.empty();
   const bool wasBlocked = blocked_;
   const TimePoint now = Clock::now();
-  std::uint64_t id = 0;
   try {
-    id = queue_.push(std::move(request), now);
+    queue_.push(std::move(request), now);
   } catch (...) {
     admission_.leave(cost);
     throw;
   }
-  if (then == Then::returns) lastSubmit_ = now;
-  // Others may follow it: held back for a moment, many are sent with one system call, by whoever
-  // submits the last of them or by the reader, as soon as a reply comes.
-  const bool held =
-      then == Then::returns && attentive_ && reader_ != Reader::nobody && !queue_.isWorthSending();
-  if (state_ == State::ready && !blocked_ && !held) flush();
-
-  const bool stuck = state_ != State::ready || blocked_;
-  if (then == Then::waits && reader_ == Reader::nobody && !stuck && !trouble_) {
-    return readUntilAnswered(lock, id);
+  if (then == Then::returns) {
+    lastSubmit_ = now;
+    stirred_ = true;
+    if (first) callersTurn_ = true;
   }
-  const bool news = state_ == State::ready ? blocked_ && !wasBlocked : !othersFirst;
-  if (waiting_ && (news || reader_ == Reader::nobody)) wake();
+  // Others may follow it: held back for a moment, many are sent with one system call, by whoever
+  // submits the last of them or is about to wait for one.
+  const bool held = then == Then::returns && attentive_ && !queue_.isWorthSending();
+  if (state_ == State::ready && !blocked_ && !held) flush();
+  const bool news = state_ == State::ready ? blocked_ && !wasBlocked : first;
+  const bool unread = then == Then::returns && reader_ == Reader::nobody && !attentive_;
+  if (waiting_ && (news || unread)) wake();
+}
+
+bool Connection::await(Request& request, TimePoint until) {
+  if (inForkedChild()) {
+    request.fail(unavailable("this client belongs to the process that forked this one"));
+    return true;
+  }
+  Lock lock(mutex_);
+  while (!request.isDone()) {
+    const TimePoint now = Clock::now();
+    if (callerMayRead(now)) {
+      readUntilDone(lock, request, until);
+    } else if (now < until) {
+      sleep(lock, request, until);
+    }
+    if (!request.isDone() && Clock::now() >= until) {
+      if (reader_ == Reader::nobody) findReader();  // who was waiting may have been called to read
+      return false;
+    }
+  }
+  return true;
+}
+
+bool Connection::isOverdue(TimePoint now) const noexcept {
+  const auto expiry = queue_.expiry();
+  return expiry && now >= *expiry;
+}
+
+/// What is out of order is the thread's.
+bool Connection::callerMayRead(TimePoint now) const noexcept {
+  return reader_ == Reader::nobody && state_ == State::ready && !trouble_ && !unwritable_ &&
+         !stopping_ && !isOverdue(now);
+}
+
+void Connection::findReader() noexcept {
+  if (callerMayRead(Clock::now())) {
+    const auto next = std::find_if(sleepers_.begin(), sleepers_.end(),
+                                   [](const Request* each) { return !each->isDone(); });
+    if (next != sleepers_.end()) return (*next)->sleeper->notify_one();
+    if (attentive_ || (queue_.empty() && watchesEnd_)) return;
+  }
+  if (waiting_) wake();
+}
+
+void Connection::sleep(Lock& lock, Request& request, TimePoint until) {
+  struct Registration {  // ends also when the calling thread is cancelled
+    Registration(std::vector<Request*>& among, Request& request) : all(among), sleepsFor(request) {
+      all.push_back(&request);
+      request.sleeper = &woken;
+    }
+    Registration(const Registration&) = delete;
+    Registration& operator=(const Registration&) = delete;
+    ~Registration() {
+      sleepsFor.sleeper = nullptr;
+      all.erase(std::find(all.begin(), all.end(), &sleepsFor));
+    }
+    std::vector<Request*>& all;
+    Request& sleepsFor;
+    std::condition_variable woken;
+  };
+  Registration registered(sleepers_, request);
+  registered.woken.wait_until(lock, until);
 }
 
 void Connection::startThread() {
@@ -112,60 +181,67 @@ void Connection::flush() {
 }
 
 /// Leaves everything but replies that are in order to the connection's thread.
-void Connection::readUntilAnswered(Lock& lock, std::uint64_t id) {
+void Connection::readUntilDone(Lock& lock, const Request& request, TimePoint until) {
   struct Turn {  // ends also when the calling thread is cancelled
     Turn(Connection& of, Lock& held) : connection(of), lock(held) {
       connection.reader_ = Reader::caller;
     }
+    Turn(const Turn&) = delete;
+    Turn& operator=(const Turn&) = delete;
     ~Turn() {
       if (!lock.owns_lock()) lock.lock();
       connection.reader_ = Reader::nobody;
-      if (!orderly || !connection.queue_.empty() || !connection.watchesEnd_) connection.wake();
+      if (connection.stopping_) connection.readerLeft_.notify_all();
+      connection.findReader();
     }
     Connection& connection;
     Lock& lock;
-    bool orderly = false;
   };
-  Turn turn(*this, lock);
-  while (!stopping_ && queue_.owed(id) != nullptr) {
-    std::array<pollfd, 2> fds = {
-        {{process_->socket(), POLLIN, 0}, {process_->endedFd(), POLLIN, 0}}};
-    const auto expiry = queue_.expiry().value_or(TimePoint::max());
-    const int timeout = readerTimeout(Clock::now());
-    const bool lookedOut = attentive_;
-    lock.unlock();
-    const int count = ::poll(fds.data(), fds.size(), timeout);
-    const int error = errno;
-    lock.lock();
-    if (count < 0 && error == EINTR) continue;
-    if (count > 0 && (fds[0].revents & POLLIN) != 0) {
-      attentive_ = true;
-      trouble_ = receive(lock);
-      if (trouble_ || Clock::now() >= expiry) return;
-    } else if (count != 0 || !lookedOut) {
-      return;
-    }
+  const Turn turn(*this, lock);
+  do {
     flush();
     if (blocked_ && waiting_) wake();
-  }
-  turn.orderly = true;
+    const TimePoint soonest = std::min(until, queue_.expiry().value_or(TimePoint::max()));
+    lock.unlock();
+    Came came = Came::nothing;
+    bool ended = false;
+    callersWait_([&] { return (came = readSome()) != Came::nothing; },
+                 [&] { ended = waitForReplies(soonest); });
+    if (came == Came::nothing && !ended) came = readSome();
+    lock.lock();
+    callersTurn_ = true;
+    if (came != Came::nothing || ended) trouble_ = take(lock, came);
+  } while (!request.isDone() && !trouble_ && !unwritable_ && !stopping_ &&
+           Clock::now() < std::min(until, queue_.expiry().value_or(TimePoint::max())));
 }
 
-std::optional<std::string> Connection::receive(Lock& lock) {
-  lock.unlock();
-  const std::span<char> room = assembler_->room();
+bool Connection::waitForReplies(TimePoint until) const noexcept {
+  std::array<pollfd, 2> fds = {{{process_->socket(), POLLIN, 0}, {process_->endedFd(), POLLIN, 0}}};
+  const auto left = std::chrono::ceil<std::chrono::milliseconds>(until - Clock::now());
+  const auto wait = std::clamp<std::chrono::milliseconds>(left, 0ms, 1h);
+  return ::poll(fds.data(), fds.size(), static_cast<int>(wait.count())) > 0 && fds[0].revents == 0;
+}
+
+Connection::Came Connection::readSome() noexcept {
+  std::span<char> room;
+  try {
+    room = assembler_->room();
+  } catch (const std::bad_alloc&) {
+    return Came::tooMuch;
+  }
   const ssize_t count = ::recv(process_->socket(), room.data(), room.size(), 0);
   if (count <= 0) {
-    const int error = errno;
-    lock.lock();
-    if (count < 0 && (error == EAGAIN || error == EINTR)) return std::nullopt;
-    return "";
+    return count < 0 && (errno == EAGAIN || errno == EINTR) ? Came::nothing : Came::end;
   }
   assembler_->commit(static_cast<std::size_t>(count));
-  stirred_ = true;
+  return Came::bytes;
+}
+
+std::optional<std::string> Connection::take(Lock& lock, Came came) {
+  if (came == Came::nothing || came == Came::end) return "";
   std::optional<std::string> violation;
   try {
-    lock.lock();
+    if (came == Came::tooMuch) throw std::bad_alloc();
     if (state_ == State::greeting) {
       if (const std::optional<Data> body = assembler_->next()) {
         const std::string objection = greet(*body);
@@ -210,20 +286,17 @@ std::exception_ptr Connection::collect() noexcept {
   return nullptr;
 }
 
-/// Newest first: who waits for them in the order of their submission is woken once, when all are
-/// there, and not for each anew.
 std::exception_ptr Connection::resolve() noexcept {
   std::exception_ptr wrong;
-  for (std::size_t i = answers_.size(); i-- > 0;) {
-    Answer& answer = answers_[i];
+  for (Answer& answer : answers_) {
     try {
-      if (answer.request == nullptr || answer.request->isResolved()) {
+      if (answer.request == nullptr || answer.request->isDone()) {
         throw frames::FrameError("a reply to no request");
       }
       answer.request->resolve(answer.reply);
     } catch (...) {
       answer.request = nullptr;
-      wrong = std::current_exception();
+      if (!wrong) wrong = std::current_exception();
     }
   }
   return wrong;
@@ -232,23 +305,25 @@ std::exception_ptr Connection::resolve() noexcept {
 void Connection::settle(Lock& lock) {
   for (bool more = true; more;) {
     lock.unlock();
-    std::exception_ptr wrong = collect();
+    const std::exception_ptr broken = collect();
     more = answers_.size() == kAtOnce;
     lock.lock();
     // They stay where they are without the lock: only the reader takes requests out.
     for (Answer& answer : answers_) answer.request = queue_.owed(answer.reply.id);
     lock.unlock();
-    if (const std::exception_ptr other = resolve()) wrong = other;
+    const std::exception_ptr wrong = resolve();
     lock.lock();
     const TimePoint now = Clock::now();
     for (Answer& answer : answers_) {
       if (answer.request == nullptr) continue;
       admission_.leave(answer.request->cost());
       answer.done = queue_.finish(answer.reply.id, now);
+      if (answer.done->sleeper != nullptr) answer.done->sleeper->notify_one();
     }
     lock.unlock();
     answers_.clear();
     if (wrong) std::rethrow_exception(wrong);
+    if (broken) std::rethrow_exception(broken);
     lock.lock();
   }
 }

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <condition_variable>
 #include <cstdint>
 #include <exception>
 #include <memory>
@@ -15,6 +16,7 @@
 #include "client/fork_mark.h"
 #include "client/request_queue.h"
 #include "client/service_process.h"
+#include "frames/brief_wait.h"
 #include "frames/frame_assembler.h"
 #include "ironmoat/client.h"
 
@@ -24,53 +26,68 @@ namespace ironmoat::client {
 ///
 /// A thread of its own, started with the first request, starts, watches and replaces the process.
 /// Bytes are sent under the mutex, by that thread or by a submitting one, or together with others'
-/// by the reader, when it is about to look. They are read by one reader at a time: a thread that
-/// waits for its own reply if it can be, since that saves waking another one for each, and the
-/// connection's thread otherwise. Nobody waits in anything but poll, and the socket never blocks,
-/// so that neither direction can hold up the other.
+/// by who is about to wait for replies. They are read by one reader at a time. A thread that waits
+/// for an outcome is the reader if it can be, since that saves waking another one for each; others
+/// that wait sleep, and one of them follows when the reader leaves. Where nobody waits, or has not
+/// for a tick, the connection's thread reads. Nobody waits in anything but poll, and the socket
+/// never blocks, so that neither direction can hold up the other.
 class Connection {
  public:
+  using Clock = RequestQueue::Clock;
+  using TimePoint = RequestQueue::TimePoint;
+
   explicit Connection(Client::Options options);
   Connection(const Connection&) = delete;
   Connection& operator=(const Connection&) = delete;
-  ~Connection();
+  ~Connection() { stop(); }
 
   enum class Then : std::uint8_t { returns, waits };
   /// Waits while too many bytes are in flight. Every outcome goes to the request. `waits` says that
-  /// the caller is going to wait for this one's: it may then have its outcome on return.
-  void submit(std::unique_ptr<Request> request, Then then);
+  /// the caller is going to `await` it at once.
+  void submit(std::shared_ptr<Request> request, Then then);
+  /// Whether the request, which was submitted here, is done; waits for that until `until`. In a
+  /// forked child it fails.
+  bool await(Request& request, TimePoint until);
+  /// All without an outcome fail; leaves no process and no thread. Once, and not in a forked child.
+  void stop() noexcept;
 
   /// This process is a copy of the one that uses the connection: nothing here may be touched, not
   /// even the mutex.
   [[nodiscard]] bool inForkedChild() const noexcept { return forkMark_.inCopy(); }
 
  private:
-  using Clock = RequestQueue::Clock;
-  using TimePoint = RequestQueue::TimePoint;
   using Lock = std::unique_lock<std::mutex>;
   enum class State : std::uint8_t { absent, greeting, ready };
   enum class Reader : std::uint8_t { nobody, caller, thread };
+  enum class Came : std::uint8_t { nothing, bytes, tooMuch, end };
 
   // By any thread, under the mutex.
   void startThread();
   void wake() noexcept;
   void flush();
+  [[nodiscard]] bool callerMayRead(TimePoint now) const noexcept;
+  /// Sees to it that somebody reads, now that nobody does.
+  void findReader() noexcept;
+  void sleep(Lock& lock, Request& request, TimePoint until);
+  [[nodiscard]] bool isOverdue(TimePoint now) const noexcept;
 
   /// A reply, the request that it answers, and that request taken out of the queue.
   struct Answer {
     frames::Reply reply;
     Request* request = nullptr;
-    std::unique_ptr<Request> done;
+    std::shared_ptr<Request> done;
   };
 
   // By the reader. `lock` is held on entry and exit, and not while waiting or decoding.
-  void readUntilAnswered(Lock& lock, std::uint64_t id);
-  /// How long the reader's poll may sleep; settles whether that is attentive.
-  int readerTimeout(TimePoint now) noexcept;
-  [[nodiscard]] int waitMilliseconds(TimePoint now) const noexcept;
-  /// Reads once and gives out what came. Returns what the service did that no service does; empty
-  /// when it has ended; nothing when all is well.
-  std::optional<std::string> receive(Lock& lock);
+  void readUntilDone(Lock& lock, const Request& request, TimePoint until);
+  /// Reads once, without the lock.
+  Came readSome() noexcept;
+  /// Without the lock: sleeps until there is something to read, it is time, or the process has
+  /// ended with nothing to read: then true.
+  [[nodiscard]] bool waitForReplies(TimePoint until) const noexcept;
+  /// Gives out what came. Returns what the service did that no service does; empty when it has
+  /// ended; nothing when all is well.
+  std::optional<std::string> take(Lock& lock, Came came);
   /// Returns why the service is not to be used, if so.
   std::string greet(const Data& body);
   /// Gives out all replies that have come. Throws, without the lock, over one that is wrong, when
@@ -85,11 +102,16 @@ class Connection {
   void run() noexcept;
   void turn(Lock& lock);
   void chooseReader(TimePoint now) noexcept;
+  /// How long it may sleep; settles whether that is attentive.
+  int timeout(TimePoint now) noexcept;
+  [[nodiscard]] int waitMilliseconds(TimePoint now) const noexcept;
   void start(Lock& lock);
   void startFailed(Lock& lock, const std::string& why, bool passing);
-  /// Replaces the process. `what` as from `receive`.
+  /// Replaces the process. `what` as from `take`.
   void lose(Lock& lock, const std::string& what, ServiceError::Kind kind);
   void failAll(Lock& lock, std::string_view why) noexcept;
+  /// For a request that was taken out of the queue.
+  void giveUp(Request& request, std::exception_ptr error) noexcept;
 
   const std::string program_;
   const Clock::duration deadline_;
@@ -100,13 +122,16 @@ class Connection {
   RequestQueue queue_;
   State state_ = State::absent;
   Reader reader_ = Reader::nobody;
-  std::optional<std::string> trouble_;  // what `receive` returned, for the thread to act on
+  std::vector<Request*> sleepers_;      // requests that somebody sleeps for
+  std::condition_variable readerLeft_;  // for `failAll`
+  std::optional<std::string> trouble_;  // what `take` returned, for the thread to act on
   TimePoint lastSubmit_{};              // by a caller who did not wait
   int socket_ = -1;                     // of a process that is ready
   bool unwritable_ = false;
-  bool blocked_ = false;    // more was to be sent than could be
-  bool stirred_ = false;    // something has come since the reader last waited
-  bool attentive_ = false;  // the reader looks for what is unsent within a millisecond
+  bool blocked_ = false;      // more was to be sent than could be
+  bool stirred_ = false;      // a caller who did not wait has submitted since the thread last slept
+  bool callersTurn_ = false;  // a caller has read since then, or is given the time to
+  bool attentive_ = false;    // the thread looks for what is unsent or unread within a tick
   bool stopping_ = false;
   bool waiting_ = false;     // the thread is in poll
   bool watchesEnd_ = false;  // ... and will hear of the process's end
@@ -117,10 +142,13 @@ class Connection {
   std::optional<ServiceProcess> process_;
   std::optional<frames::FrameAssembler> assembler_;
   std::vector<Answer> answers_;
+  frames::BriefWait callersWait_;
 
   // The thread's own.
   TimePoint greetBy_{};
   TimePoint nextStart_{};
+  TimePoint unreadSince_{};  // nobody has read what is in flight
+  bool ended_ = false;       // the process has; what it said is to be read
   unsigned startFailures_ = 0;
 };
 

@@ -26,6 +26,7 @@ constexpr unsigned kStartAttempts = 5;  // in 150 ms
 constexpr auto kGraceToEnd = 100ms;     // from a closed socket to a process that has ended
 constexpr auto kGraceToReadUp = 100ms;  // past a deadline, while replies wait to be read
 constexpr auto kReadOn = 100ms;         // after the last submit
+constexpr auto kTick = 1ms;             // that callers are given to read by themselves
 
 std::exception_ptr serviceError(ServiceError::Kind kind, std::string_view message) noexcept {
   try {
@@ -48,6 +49,7 @@ void Connection::run() noexcept {
       if (reader_ != Reader::caller) failAll(lock, error.what());
     }
   }
+  readerLeft_.wait(lock, [&] { return reader_ != Reader::caller; });
   failAll(lock, "the client was destroyed");
 }
 
@@ -67,12 +69,10 @@ void Connection::turn(Lock& lock) {
   if (socket.events != 0) socket.fd = reads ? process_->socket() : socket_;
   watchesEnd_ = reader_ != Reader::caller && state_ != State::absent;
   if (watchesEnd_) ended.fd = process_->endedFd();
-  const int timeout = reads && unwritable_        ? 0
-                      : reader_ == Reader::thread ? readerTimeout(Clock::now())
-                                                  : -1;
+  const int most = timeout(Clock::now());
   waiting_ = true;
   lock.unlock();
-  const int count = ::poll(fds.data(), fds.size(), timeout);
+  const int count = ::poll(fds.data(), fds.size(), most);
   lock.lock();
   waiting_ = false;
   if (count < 0) return;  // interrupted
@@ -82,13 +82,15 @@ void Connection::turn(Lock& lock) {
   }
   if (stopping_) return;
   if (!reads) {
-    if (ended.revents != 0 && reader_ == Reader::nobody) trouble_ = "";
+    ended_ = ended.revents != 0 && reader_ == Reader::nobody;
     return;
   }
-  attentive_ = true;
   const bool readable = (socket.revents & POLLIN) != 0;
   if (readable) {
-    trouble_ = receive(lock);
+    lock.unlock();
+    const Came came = readSome();
+    lock.lock();
+    if (came != Came::nothing) trouble_ = take(lock, came);
   } else if (socket.revents & (POLLHUP | POLLERR) || ended.revents != 0 || unwritable_) {
     trouble_ = "";
   }
@@ -105,19 +107,31 @@ void Connection::turn(Lock& lock) {
   }
 }
 
-/// Reads on for a while after a submit: another is likely, and need not wake the thread then.
+/// The thread reads what is out of order, and what no caller has read for a tick. It leaves that to
+/// the first who waits; until then it reads on, for a while also with nothing in flight: another
+/// submit is likely, and need not wake it then.
 void Connection::chooseReader(TimePoint now) noexcept {
   if (reader_ == Reader::caller) return;
-  const bool busy = state_ == State::greeting || !queue_.empty() || trouble_ ||
-                    now - lastSubmit_ < std::min<Clock::duration>(deadline_, kReadOn);
-  reader_ = busy ? Reader::thread : Reader::nobody;
+  if (state_ != State::ready || trouble_ || unwritable_ || ended_ || isOverdue(now)) {
+    const bool idle = state_ == State::absent && queue_.empty() && !trouble_;
+    reader_ = idle ? Reader::nobody : Reader::thread;
+    return;
+  }
+  if (std::exchange(callersTurn_, false)) unreadSince_ = now;
+  const bool reads = std::exchange(reader_, Reader::nobody) == Reader::thread;
+  if (!sleepers_.empty()) return findReader();
+  const bool goesOn = reads && now - lastSubmit_ < std::min<Clock::duration>(deadline_, kReadOn);
+  const bool isLeft = !queue_.empty() && (reads || now - unreadSince_ >= kTick);
+  if (goesOn || isLeft) reader_ = Reader::thread;
 }
 
-int Connection::readerTimeout(TimePoint now) noexcept {
-  constexpr int kAttentive = 1;
-  attentive_ = std::exchange(stirred_, false);
-  const int wait = waitMilliseconds(now);
-  return attentive_ ? std::min(wait, kAttentive) : wait;
+int Connection::timeout(TimePoint now) noexcept {
+  const bool unread = state_ == State::ready && reader_ == Reader::nobody && !queue_.empty();
+  attentive_ = std::exchange(stirred_, false) || unread;
+  if (reader_ == Reader::thread && state_ != State::absent && unwritable_) return 0;
+  const int wait = reader_ == Reader::thread ? waitMilliseconds(now) : -1;
+  constexpr int tick = kTick / 1ms;
+  return attentive_ && (wait < 0 || wait > tick) ? tick : wait;
 }
 
 /// With nothing in flight it wakes before anything submitted meanwhile can be late.
@@ -158,7 +172,7 @@ void Connection::startFailed(Lock& lock, const std::string& why, bool passing) {
 
 void Connection::lose(Lock& lock, const std::string& what, ServiceError::Kind kind) {
   const bool greeted = std::exchange(state_, State::absent) == State::ready;
-  unwritable_ = false;
+  unwritable_ = ended_ = false;
   socket_ = -1;
   lock.unlock();
   // The process is gone before anyone hears of it.
@@ -182,27 +196,29 @@ void Connection::lose(Lock& lock, const std::string& what, ServiceError::Kind ki
   if (!late) {
     sentence.insert(std::min(reason, word.size()), " over this message").insert(0, "the service ");
   }
-  const std::unique_ptr<Request> culprit = queue_.lose();
-  if (culprit == nullptr) return;
-  admission_.leave(culprit->cost());
-  culprit->fail(serviceError(kind, sentence));
+  const std::shared_ptr<Request> culprit = queue_.lose();
+  if (culprit != nullptr) giveUp(*culprit, serviceError(kind, sentence));
+}
+
+void Connection::giveUp(Request& request, std::exception_ptr error) noexcept {
+  admission_.leave(request.cost());
+  request.fail(std::move(error));
+  if (request.sleeper != nullptr) request.sleeper->notify_one();
 }
 
 void Connection::failAll(Lock& lock, std::string_view why) noexcept {
   state_ = State::absent;
-  unwritable_ = false;
+  unwritable_ = ended_ = false;
   socket_ = -1;
   trouble_.reset();
   lock.unlock();
   process_.reset();
   assembler_.reset();
   lock.lock();
-  const std::exception_ptr error = serviceError(ServiceError::Kind::unavailable, why);
   auto request = queue_.lose();
   for (; request != nullptr || !queue_.empty(); request.reset()) {
     if (request == nullptr) request = queue_.takeFront();
-    admission_.leave(request->cost());
-    request->fail(error);
+    giveUp(*request, serviceError(ServiceError::Kind::unavailable, why));
   }
 }
 

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <atomic>
+#include <condition_variable>
 #include <cstddef>
 #include <exception>
 #include <string_view>
@@ -10,7 +12,8 @@
 
 namespace ironmoat::client {
 
-/// One message on its way to one outcome: `resolve` or `fail` takes effect once.
+/// One message on its way to one outcome: `resolve` or `fail` takes effect once. Shared by who
+/// brings the outcome and who waits for it; what the outcome is, is the latter's once `isDone`.
 class Request {
  public:
   Request(std::string_view outputType, Data message)
@@ -29,18 +32,26 @@ class Request {
   /// no outcome given, when the reply is not what a service would send.
   void resolve(const frames::Reply& reply) {
     give(reply);
-    resolved_ = true;
+    done_.store(true, std::memory_order_release);
   }
-  [[nodiscard]] bool isResolved() const noexcept { return resolved_; }
-  virtual void fail(std::exception_ptr error) noexcept = 0;
+  void fail(std::exception_ptr error) noexcept {
+    giveError(std::move(error));
+    done_.store(true, std::memory_order_release);
+  }
+  [[nodiscard]] bool isDone() const noexcept { return done_.load(std::memory_order_acquire); }
+
+  /// Who sleeps until it is done or there is something for him to do, if anybody does. Under the
+  /// mutex of the connection.
+  std::condition_variable* sleeper = nullptr;
 
  protected:
   virtual void give(const frames::Reply& reply) = 0;
+  virtual void giveError(std::exception_ptr error) noexcept = 0;
 
  private:
   std::string_view outputType_;  // a record type's schemaName
   Data message_;
-  bool resolved_ = false;
+  std::atomic<bool> done_ = false;
 };
 
 }  // namespace ironmoat::client

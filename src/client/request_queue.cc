@@ -5,7 +5,7 @@
 
 namespace ironmoat::client {
 
-std::uint64_t RequestQueue::push(std::unique_ptr<Request> request, TimePoint now) {
+std::uint64_t RequestQueue::push(std::shared_ptr<Request> request, TimePoint now) {
   slots_.push_back({std::move(request), {}});
   if (ready_ && slots_.size() == 1) runClocks(front_ + 1, now);
   return end() - 1;
@@ -80,8 +80,8 @@ Request* RequestQueue::owed(std::uint64_t id) noexcept {
   return id >= front_ && id < next_ ? slot(id).request.get() : nullptr;
 }
 
-std::unique_ptr<Request> RequestQueue::finish(std::uint64_t id, TimePoint now) {
-  std::unique_ptr<Request> request = std::move(slot(id).request);
+std::shared_ptr<Request> RequestQueue::finish(std::uint64_t id, TimePoint now) {
+  std::shared_ptr<Request> request = std::move(slot(id).request);
   --owedCount_;
   runClocks(id, now);
   dropFinished();
@@ -107,9 +107,9 @@ std::optional<RequestQueue::TimePoint> RequestQueue::expiry() const noexcept {
   return slots_.front().clock + deadline_;
 }
 
-std::unique_ptr<Request> RequestQueue::lose() noexcept {
+std::shared_ptr<Request> RequestQueue::lose() noexcept {
   const std::uint64_t begunEnd = next_ + (sentOfNext_ > 0 ? 1 : 0);
-  std::unique_ptr<Request> culprit;
+  std::shared_ptr<Request> culprit;
   if (begun_ == 1 && begunEnd > front_) {
     // The one that was begun is the front: whatever stood before it has had its outcome.
     culprit = std::move(slots_.front().request);
@@ -124,8 +124,8 @@ std::unique_ptr<Request> RequestQueue::lose() noexcept {
   return culprit;
 }
 
-std::unique_ptr<Request> RequestQueue::takeFront() noexcept {
-  std::unique_ptr<Request> request = std::move(slots_.front().request);
+std::shared_ptr<Request> RequestQueue::takeFront() noexcept {
+  std::shared_ptr<Request> request = std::move(slots_.front().request);
   dropFinished();
   return request;
 }

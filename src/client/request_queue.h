@@ -40,7 +40,7 @@ class RequestQueue {
   explicit RequestQueue(Clock::duration deadline) : deadline_(deadline) {}
 
   /// Returns its id.
-  std::uint64_t push(std::unique_ptr<Request> request, TimePoint now);
+  std::uint64_t push(std::shared_ptr<Request> request, TimePoint now);
   [[nodiscard]] bool empty() const noexcept { return slots_.empty(); }
 
   /// A fresh process is ready: sending starts over.
@@ -61,19 +61,19 @@ class RequestQueue {
   [[nodiscard]] Request* owed(std::uint64_t id) noexcept;
   [[nodiscard]] bool owesAny() const noexcept { return owedCount_ != 0 || sentOfNext_ != 0; }
   /// Takes a request with an outcome out.
-  std::unique_ptr<Request> finish(std::uint64_t id, TimePoint now);
+  std::shared_ptr<Request> finish(std::uint64_t id, TimePoint now);
 
   /// When the front's time is up; nothing while no clock runs.
   [[nodiscard]] std::optional<TimePoint> expiry() const noexcept;
 
   /// The process is gone. Returns the request to blame, taken out, if there is one.
-  std::unique_ptr<Request> lose() noexcept;
+  std::shared_ptr<Request> lose() noexcept;
   /// Takes the first request out. Requires that there is one and that no process is.
-  std::unique_ptr<Request> takeFront() noexcept;
+  std::shared_ptr<Request> takeFront() noexcept;
 
  private:
   struct Slot {
-    std::unique_ptr<Request> request;  // none: it has its outcome
+    std::shared_ptr<Request> request;  // none: it has its outcome
     TimePoint clock{};
   };
 

@@ -15,7 +15,7 @@ class Silent final : public Request {
  public:
   explicit Silent(std::string_view text) : Request("R", Data(text)) {}
   void give(const frames::Reply&) override {}
-  void fail(std::exception_ptr) noexcept override {}
+  void giveError(std::exception_ptr) noexcept override {}
 };
 
 /// A queue, a clock set by hand, and the receiving end of what is sent.

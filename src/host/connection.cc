@@ -1,6 +1,8 @@
 #include "host/connection.h"
 
+#include <fcntl.h>
 #include <sys/select.h>
+#include <sys/stat.h>
 #include <sys/uio.h>
 #include <unistd.h>
 
@@ -37,8 +39,15 @@ bool waitOut(int descriptor, Readiness readiness) {
 
 }  // namespace
 
+/// A socket is ours alone, so that it can be made one that does not block: anything else could be
+/// other programs' as well, a terminal for one.
 RequestSource::RequestSource(int descriptor)
-    : descriptor_(descriptor), assembler_(frames::kMaxRequestBody, Sharing::oneThread) {}
+    : descriptor_(descriptor), assembler_(frames::kMaxRequestBody, Sharing::oneThread) {
+  struct stat what = {};
+  if (fstat(descriptor, &what) == 0 && S_ISSOCK(what.st_mode)) {
+    static_cast<void>(fcntl(descriptor, F_SETFL, O_NONBLOCK));
+  }
+}
 
 std::optional<Data> RequestSource::next(const std::function<void()>& beforeWaiting) {
   Lock lock(mutex_);
@@ -86,12 +95,19 @@ std::optional<Data> RequestSource::take() {
   return body;
 }
 
-std::size_t RequestSource::readSome(std::span<char> room) const noexcept {
-  ssize_t count = 0;
-  do {
-    count = read(descriptor_, room.data(), room.size());
-  } while (count < 0 && waitOut(descriptor_, Readiness::toRead));
-  return count > 0 ? static_cast<std::size_t>(count) : 0;
+std::size_t RequestSource::readSome(std::span<char> room) noexcept {
+  for (;;) {
+    ssize_t count = 0;
+    bool slept = false;
+    wait_(
+        [&] {
+          count = read(descriptor_, room.data(), room.size());
+          return count >= 0 || errno != EAGAIN;
+        },
+        [&] { slept = waitOut(descriptor_, Readiness::toRead); });
+    if (count >= 0) return static_cast<std::size_t>(count);
+    if (!slept && errno != EINTR) return 0;
+  }
 }
 
 bool RequestSource::watch(Lock& lock) {

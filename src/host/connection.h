@@ -12,6 +12,7 @@
 #include <span>
 #include <vector>
 
+#include "frames/brief_wait.h"
 #include "frames/frame_assembler.h"
 #include "ironmoat/block.h"
 #include "ironmoat/values.h"
@@ -42,7 +43,7 @@ class RequestSource {
 
   std::optional<Data> take();
   /// How many bytes came; none at the end of input.
-  std::size_t readSome(std::span<char> room) const noexcept;
+  std::size_t readSome(std::span<char> room) noexcept;
   /// Waits until there may be something to do. True: it is another thread's, who takes too long.
   bool watch(Lock& lock);
   void end() noexcept;
@@ -52,6 +53,7 @@ class RequestSource {
   frames::FrameAssembler assembler_;  // the reading thread's, while there is one
   bool ended_ = false;
   bool reading_ = false;
+  frames::BriefWait wait_;   // the reading thread's
   std::uint64_t taken_ = 0;  // requests
   bool watching_ = false;    // there is a watcher,
   bool asleep_ = false;      // ... and it looks up only when it is called

@@ -31,7 +31,7 @@ std::size_t valuesIn(const T& value) {
 template <MessageSchema R>
 class RecordOf : public UnpackedRecord {
  public:
-  explicit RecordOf(std::future<R>& pending) : record_(pending.get()) {}
+  explicit RecordOf(Pending<R>& pending) : record_(pending.get()) {}
 
   [[nodiscard]] std::size_t values() const override { return valuesIn(record_); }
   void show(Format format, const Style& style, std::string& out) const override {
@@ -48,7 +48,7 @@ class RecordOf : public UnpackedRecord {
 
 template <MessageSchema R>
 PendingRecord submitAs(Client& client, const Data& message) {
-  return [pending = std::make_shared<std::future<R>>(client.submit<R>(message))] {
+  return [pending = std::make_shared<Pending<R>>(client.submit<R>(message))] {
     return std::make_unique<RecordOf<R>>(*pending);
   };
 }

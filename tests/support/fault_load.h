@@ -28,7 +28,7 @@ namespace ironmoat::testing {
 
 using namespace std::chrono_literals;
 using Clock = std::chrono::steady_clock;
-using Pending = std::future<VeskCommandResponse>;
+using Pending = ironmoat::Pending<ironmoat::VeskCommandResponse>;
 
 /// `--full` was given: minutes by hand instead of seconds in CI.
 inline bool fullSize = false;
@@ -67,7 +67,7 @@ struct Tally {
   std::atomic<int> wrong = 0;
 
   /// Counts the one outcome of `number`. Only a SIGKILL and the client's end may be in the way.
-  void count(int number, Pending& pending) {
+  void count(int number, auto& pending) {
     if (pending.wait_for(60s) != std::future_status::ready) return complain("hangs");
     try {
       const VeskCommandResponse record = pending.get();
@@ -111,7 +111,7 @@ class Load {
             } catch (...) {
               promise.set_exception(std::current_exception());
             }
-            Pending outcome = promise.get_future();
+            std::future<VeskCommandResponse> outcome = promise.get_future();
             tally_.count(number, outcome);
           } else {
             pending.emplace_back(number, client.submit<VeskCommandResponse>(message(number)));
