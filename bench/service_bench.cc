@@ -34,7 +34,7 @@ Data typicalMessage() { return Data(messageOf(typicalPayload(0), plist::Form::bi
 void inProcess(benchmark::State& state) {
   const Data message = messageOf(typicalPayload(0), plist::Form::binary);
   for (auto _ : state) {
-    benchmark::DoNotOptimize(VeskCorvelPayloadUnpacker().unpack(message).command);
+    benchmark::DoNotOptimize(VeskCorvelPayloadUnpacker().unpack(message)->command);
   }
 }
 

@@ -38,28 +38,29 @@ Outcome refused(const DecodingError& error) {
 /// The reply's body, or the refusal in words.
 template <class Unpacker>
 Outcome unpack(const Data& message) {
-  try {
-    BlockBuilder out;
-    frames::encodeRecord(Unpacker().unpack(message), out);
-    const BlockRef block = out.finish();
-    return {true, {block->bytes(), block->size()}};
-  } catch (const DecodingError& error) {
-    require(error.offset().value_or(0) <= message.size());
-    return refused(error);
+  const auto unpacked = Unpacker().unpack(message);
+  if (!unpacked) {
+    require(unpacked.refusal().offset().value_or(0) <= message.size());
+    return refused(unpacked.refusal());
   }
+  BlockBuilder out;
+  frames::encodeRecord(*unpacked, out);
+  const BlockRef block = out.finish();
+  return {true, {block->bytes(), block->size()}};
 }
 
 /// The record in the slow decoder's words, or the refusal; `left` is what the budget still has.
 template <class Wire>
 Outcome decode(const plist::Document& document, plist::Budget& left) {
-  try {
-    const Wire record = Wire::decode(plist::Decoder(document, left));
-    Outcome outcome{true, {}};
-    fuzz::describe(outcome.text, record);
-    return outcome;
-  } catch (const DecodingError& error) {
-    return refused(error);
-  }
+  plist::Decoding decoding{.document = document, .budget = left};
+  Wire record;
+  const bool accepted = record.decode(plist::Decoder(decoding));
+  left = decoding.budget;
+  require(accepted != decoding.refusal.has_value());
+  if (!accepted) return refused(*decoding.refusal);
+  Outcome outcome{true, {}};
+  fuzz::describe(outcome.text, record);
+  return outcome;
 }
 
 template <class Unpacker, class Wire>
@@ -107,7 +108,8 @@ void unpackAs(const Data& message, const plist::Document& document) {
           form);
     }
     if (first.accepted) {
-      const Wire wire = plist::PropertyListDecoder().decode<Wire>(message);
+      Wire wire;
+      require(!plist::PropertyListDecoder().decode(message, wire));
       check([&](plist::Form as) { return plist::PropertyListEncoder(as).encode(wire); }, form);
     }
   }

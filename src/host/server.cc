@@ -43,8 +43,10 @@ void IronmoatServer::answer(const Data& request, BlockBuilder& reply) const {
       return frames::appendSentence(reply, id, Status::notServed, "no unpacker for this type");
     }
     const std::size_t frame = frames::beginReply(reply, id, Status::record);
-    found->handler(parsed.message, reply);
-    return frames::endReply(reply, frame);
+    const std::optional<DecodingError> refusal = found->handler(parsed.message, reply);
+    if (!refusal) return frames::endReply(reply, frame);
+    reply.truncate(start);
+    frames::appendRefusal(reply, id, *refusal);
   } catch (const std::bad_alloc&) {
     reply.truncate(start);
     throw;

@@ -3,6 +3,8 @@
 #include <cstdint>
 #include <cstring>
 #include <limits>
+#include <optional>
+#include <utility>
 
 #include "ironmoat/errors.h"
 #include "ironmoat/limits.h"
@@ -20,7 +22,8 @@ namespace ironmoat::plist {
 using binary::Marker;
 
 /// Three passes, each linear in the message: every object of the table becomes a node; keys are
-/// checked to be text; the graph is measured, and refused when it is cyclic or too deep.
+/// checked to be text; the graph is measured, and refused when it is cyclic or too deep. What can
+/// refuse the message returns whether it did not; nothing is done with it afterwards.
 class BinaryReader {
  public:
   BinaryReader(const Data& message, Document& document)
@@ -38,17 +41,12 @@ class BinaryReader {
     }
   }
 
-  void read() {
-    readTrailer();
-    readObjects();
-    checkKeys();
-    if (parentsFirst_) {
-      measureBackwards();
-    } else {
-      measureFromRoot();
-    }
+  /// Why the message is refused; none: the document is complete.
+  std::optional<DecodingError> read() {
+    if (!readTrailer() || !readObjects() || !checkKeys() || !measure()) return std::move(refusal_);
     document_.root_ = root_;
     document_.side_ = side_.finish();
+    return std::nullopt;
   }
 
  private:
@@ -67,43 +65,52 @@ class BinaryReader {
   static constexpr std::uint16_t kTooDeep = limits::nestedContainers + 1;
   static constexpr std::uint16_t kOpen = std::numeric_limits<std::uint16_t>::max();
 
-  void readTrailer() {
+  [[gnu::cold, gnu::noinline]] bool refuse(DecodingError refusal) {
+    refusal_ = std::move(refusal);
+    return false;
+  }
+  [[gnu::cold, gnu::noinline]] bool refuse(std::string_view reason, std::uint64_t offset) {
+    return refuse(malformed(reason, offset));
+  }
+
+  [[nodiscard]] bool readTrailer() {
     constexpr std::size_t kSmallest = binary::kHeader.size() + 1 + 1 + binary::kTrailerSize;
-    if (size_ < kSmallest) throw malformed("binary property list cut short", size_);
+    if (size_ < kSmallest) return refuse("binary property list cut short", size_);
     if (!std::equal(binary::kHeader.begin(), binary::kHeader.end(), bytes_)) {
-      throw malformed("unknown version of the binary form", 6);
+      return refuse("unknown version of the binary form", 6);
     }
     const std::size_t trailer = size_ - binary::kTrailerSize;
     offsetSize_ = bytes_[trailer + 6];
     referenceSize_ = bytes_[trailer + 7];
     if (offsetSize_ < 1 || offsetSize_ > binary::kMaxSize) {
-      throw malformed("impossible size of offsets", trailer + 6);
+      return refuse("impossible size of offsets", trailer + 6);
     }
     if (referenceSize_ < 1 || referenceSize_ > binary::kMaxSize) {
-      throw malformed("impossible size of references", trailer + 7);
+      return refuse("impossible size of references", trailer + 7);
     }
     const std::uint64_t count = bigEndian(bytes_ + trailer + 8, 8);
     const std::uint64_t root = bigEndian(bytes_ + trailer + 16, 8);
     const std::uint64_t table = bigEndian(bytes_ + trailer + 24, 8);  // the message's last bytes
     if (table <= binary::kHeader.size() || table >= trailer) {
-      throw malformed("offset table out of bounds", trailer + 24);
+      return refuse("offset table out of bounds", trailer + 24);
     }
     // The table fills the room up to the trailer exactly. Dividing keeps the product from wrapping.
     if (count != (trailer - table) / offsetSize_ || (trailer - table) % offsetSize_ != 0) {
-      throw malformed("offset table does not fit the object count", trailer + 8);
+      return refuse("offset table does not fit the object count", trailer + 8);
     }
     // Each object takes a byte of a room in which they may not overlap: bounds what is allocated
     // for them by the bytes that are there.
     if (count > table - binary::kHeader.size()) {
-      throw malformed("more objects than bytes for them", trailer + 8);
+      return refuse("more objects than bytes for them", trailer + 8);
     }
-    if (root >= count) throw malformed("top object is not in the table", trailer + 16);
+    if (root >= count) return refuse("top object is not in the table", trailer + 16);
     objectsEnd_ = static_cast<std::size_t>(table);
     objectCount_ = static_cast<std::size_t>(count);
     root_ = static_cast<NodeIndex>(root);
+    return true;
   }
 
-  void readObjects() {
+  [[nodiscard]] bool readObjects() {
     Node* const nodes = nodes_.extend(objectCount_);
     // Copies, which the compiler need not load again for each object.
     const unsigned char* const bytes = bytes_;
@@ -118,7 +125,7 @@ class BinaryReader {
     for (std::size_t i = 0; i < count; ++i, entry += offsetSize) {
       const std::uint64_t offset = bigEndian(bytes + entry, offsetSize);
       if (offset - binary::kHeader.size() >= end - binary::kHeader.size()) {  // below it, too
-        throw malformed("object offset out of bounds", entry);
+        return refuse("object offset out of bounds", entry);
       }
       const std::size_t start = static_cast<std::size_t>(offset);
       const std::uint8_t marker = bytes[start];
@@ -148,15 +155,18 @@ class BinaryReader {
       }
       if (size == 0) {
         current_ = static_cast<NodeIndex>(i);
-        size = readObject(start, nodes[i]) - start;
+        std::size_t objectEnd = 0;
+        if (!readObject(start, nodes[i], objectEnd)) return false;
+        size = objectEnd - start;
       }
-      if (size > room) throw malformed("objects overlap", start);
+      if (size > room) return refuse("objects overlap", start);
       room -= size;
     }
+    return true;
   }
 
-  /// Reads the object at `at`, which is inside the object area; returns where it ends.
-  std::size_t readObject(std::size_t at, Node& node) {
+  /// Reads the object at `at`, which is inside the object area, and finds where it ends.
+  [[nodiscard]] bool readObject(std::size_t at, Node& node, std::size_t& end) {
     const std::uint8_t marker = bytes_[at];
     const std::uint8_t low = marker & 0x0F;
     const std::size_t body = at + 1;
@@ -165,46 +175,49 @@ class BinaryReader {
       case Marker::simple:
         if (marker != binary::kFalse && marker != binary::kTrue) break;
         node.payload = marker == binary::kTrue ? 1 : 0;
-        return body;
+        end = body;
+        return true;
       case Marker::integer:
         if (low > 4) break;
-        return readInteger(at, std::size_t{1} << low, node);
+        return readInteger(at, std::size_t{1} << low, node, end);
       case Marker::real:
         if (low != 2 && low != 3) break;
         node.kind = Kind::real;
-        return need(body, std::size_t{1} << low, at);
+        return need(body, std::size_t{1} << low, at, end);
       case Marker::date:
         if (low != 3) break;
         node.kind = Kind::date;
-        return need(body, 8, at);
+        return need(body, 8, at, end);
       case Marker::uid:
         node.kind = Kind::uid;
-        return need(body, low + std::size_t{1}, at);
+        return need(body, low + std::size_t{1}, at, end);
       case Marker::data:
       case Marker::ascii:
-        return readBytes(at, node);
+        return readBytes(at, node, end);
       case Marker::utf16:
-        return readUtf16(at, node);
+        return readUtf16(at, node, end);
       case Marker::array:
       case Marker::dictionary:
-        return readContainer(at, node);
+        return readContainer(at, node, end);
     }
-    throw malformed("unknown kind of object", at);
+    return refuse("unknown kind of object", at);
   }
 
-  /// `start + count`, proven to lie inside the object area.
-  [[nodiscard]] std::size_t need(std::size_t start, std::uint64_t count, std::size_t object) const {
-    if (count > objectsEnd_ - start) throw malformed("object runs out of bounds", object);
-    return start + static_cast<std::size_t>(count);
+  /// Sets `end` to `start + count`, proven to lie inside the object area.
+  [[nodiscard]] bool need(std::size_t start, std::uint64_t count, std::size_t object,
+                          std::size_t& end) {
+    if (count > objectsEnd_ - start) return refuse("object runs out of bounds", object);
+    end = start + static_cast<std::size_t>(count);
+    return true;
   }
 
-  std::size_t readInteger(std::size_t at, std::size_t size, Node& node) const {
-    const std::size_t end = need(at + 1, size, at);
+  [[nodiscard]] bool readInteger(std::size_t at, std::size_t size, Node& node, std::size_t& end) {
+    if (!need(at + 1, size, at, end)) return false;
     const unsigned char* bytes = bytes_ + at + 1;
     node.kind = Kind::integer;
     if (size <= 8) {
       node.payload = bigEndian(bytes, size);  // 8 bytes: two's complement already
-      return end;
+      return true;
     }
     const std::uint64_t high = bigEndian(bytes, 8);
     node.payload = bigEndian(bytes + 8, 8);
@@ -212,41 +225,42 @@ class BinaryReader {
     if (high == 0) {
       if (topBit) node.kind = Kind::unsignedInteger;
     } else if (high != std::numeric_limits<std::uint64_t>::max() || !topBit) {
-      throw malformed("integer wider than 64 bits", at);
+      return refuse("integer wider than 64 bits", at);
     }
-    return end;
+    return true;
   }
 
-  /// The length of the object at `at` and, in `body`, where what it counts begins.
-  [[nodiscard]] std::uint64_t readLength(std::size_t at, std::size_t& body) const {
+  /// The length of the object at `at`, and where what it counts begins.
+  [[nodiscard]] bool readLength(std::size_t at, std::uint64_t& length, std::size_t& body) {
     body = at + 1;
-    const std::uint8_t low = bytes_[at] & 0x0F;
-    if (low != binary::kLengthFollows) return low;
+    length = bytes_[at] & 0x0F;
+    if (length != binary::kLengthFollows) return true;
     const std::size_t marker = body;
-    body = need(marker, 1, at);
+    if (!need(marker, 1, at, body)) return false;
     if (bytes_[marker] < 0x10 || bytes_[marker] > 0x13) {
-      throw malformed("length is not an integer", marker);
+      return refuse("length is not an integer", marker);
     }
     const std::size_t size = std::size_t{1} << (bytes_[marker] & 0x0F);
     const std::size_t digits = body;
-    body = need(digits, size, at);
-    return bigEndian(bytes_ + digits, size);  // a negative one is huge, and does not fit
+    if (!need(digits, size, at, body)) return false;
+    length = bigEndian(bytes_ + digits, size);  // a negative one is huge, and does not fit
+    return true;
   }
 
-  std::size_t readBytes(std::size_t at, Node& node) const {
+  [[nodiscard]] bool readBytes(std::size_t at, Node& node, std::size_t& end) {
     std::size_t body = 0;
-    const std::uint64_t length = readLength(at, body);
-    const std::size_t end = need(body, length, at);
+    std::uint64_t length = 0;
+    if (!readLength(at, length, body) || !need(body, length, at, end)) return false;
     node.kind = Kind::data;
     node.count = static_cast<std::uint32_t>(length);
     node.payload = base_ + body;
     if (static_cast<Marker>(bytes_[at] >> 4) == Marker::ascii) {
       node.kind = Kind::string;
       if (!isAscii(textAt(node))) {
-        throw malformed("ASCII text is not ASCII", body + asciiPrefix(textAt(node)));
+        return refuse("ASCII text is not ASCII", body + asciiPrefix(textAt(node)));
       }
     }
-    return end;
+    return true;
   }
 
   [[nodiscard]] std::string_view textAt(const Node& node) const {
@@ -267,11 +281,12 @@ class BinaryReader {
     return isAscii({reinterpret_cast<const char*>(text), length});
   }
 
-  std::size_t readUtf16(std::size_t at, Node& node) {
+  [[nodiscard]] bool readUtf16(std::size_t at, Node& node, std::size_t& end) {
     std::size_t body = 0;
-    const std::uint64_t units = readLength(at, body);
-    if (units > objectsEnd_ / 2) throw malformed("object runs out of bounds", at);
-    const std::size_t end = need(body, units * 2, at);
+    std::uint64_t units = 0;
+    if (!readLength(at, units, body)) return false;
+    if (units > objectsEnd_ / 2) return refuse("object runs out of bounds", at);
+    if (!need(body, units * 2, at, end)) return false;
     const std::size_t start = side_.size();
     // A unit takes at most 3 bytes of UTF-8; a pair takes 4.
     char* out = side_.extend(static_cast<std::size_t>(units) * 3);
@@ -280,7 +295,7 @@ class BinaryReader {
       char32_t unit = static_cast<char32_t>(bytes_[i] << 8 | bytes_[i + 1]);
       if (unit >= 0xD800 && unit <= 0xDFFF) {
         const bool pair = unit < 0xDC00 && end - i >= 4 && (bytes_[i + 2] & 0xFC) == 0xDC;
-        if (!pair) throw malformed("unpaired surrogate", i);
+        if (!pair) return refuse("unpaired surrogate", i);
         const auto low = static_cast<char32_t>(bytes_[i + 2] << 8 | bytes_[i + 3]);
         unit = 0x10000 + ((unit - 0xD800) << 10) + (low - 0xDC00);
         i += 2;
@@ -289,26 +304,27 @@ class BinaryReader {
     }
     side_.truncate(start + static_cast<std::size_t>(out - first));
     node = {Kind::string, true, 0, static_cast<std::uint32_t>(out - first), start};
-    return end;
+    return true;
   }
 
-  std::size_t readContainer(std::size_t at, Node& node) {
+  [[nodiscard]] bool readContainer(std::size_t at, Node& node, std::size_t& end) {
     containers_.push(current_);
     const bool dictionary = static_cast<Marker>(bytes_[at] >> 4) == Marker::dictionary;
     std::size_t body = 0;
-    const std::uint64_t count = readLength(at, body);
+    std::uint64_t count = 0;
+    if (!readLength(at, count, body)) return false;
     // Each element takes a byte at least, so that neither product can wrap.
-    if (count > objectsEnd_) throw malformed("object runs out of bounds", at);
+    if (count > objectsEnd_) return refuse("object runs out of bounds", at);
     const std::size_t references = static_cast<std::size_t>(count) * (dictionary ? 2 : 1);
-    const std::size_t end = need(body, references * referenceSize_, at);
+    if (!need(body, references * referenceSize_, at, end)) return false;
     node.kind = dictionary ? Kind::dictionary : Kind::array;
     node.count = static_cast<std::uint32_t>(count);
     node.payload = children_.size();
-    takeReferences(bytes_ + body, references, children_.extend(references));
-    return end;
+    return takeReferences(bytes_ + body, references, children_.extend(references));
   }
 
-  void takeReferences(const unsigned char* from, std::size_t count, NodeIndex* children) {
+  [[nodiscard]] bool takeReferences(const unsigned char* from, std::size_t count,
+                                    NodeIndex* children) {
     std::uint64_t lowest = objectCount_;
     std::uint64_t highest = 0;
     for (std::size_t i = 0; i < count; ++i) {
@@ -317,32 +333,36 @@ class BinaryReader {
       lowest = std::min(lowest, reference);
       highest = std::max(highest, reference);
     }
-    if (highest >= objectCount_) throw strayReference(from, count);
-    if (lowest > current_) return;
+    if (highest >= objectCount_) return refuseStray(from, count);
+    if (lowest > current_) return true;
     // Scalars may be shared from anywhere: they close no cycle and their height is known.
     for (std::size_t i = 0; i < count; ++i) {
       if (children[i] <= current_ && isContainer(nodes_[children[i]])) parentsFirst_ = false;
     }
+    return true;
   }
 
-  [[nodiscard]] DecodingError strayReference(const unsigned char* from, std::size_t count) const {
+  bool refuseStray(const unsigned char* from, std::size_t count) {
     std::size_t i = 0;
     while (i + 1 < count && bigEndian(from + i * referenceSize_, referenceSize_) < objectCount_)
       ++i;
-    return malformed("reference is not in the table",
-                     static_cast<std::size_t>(from - bytes_) + i * referenceSize_);
+    return refuse("reference is not in the table",
+                  static_cast<std::size_t>(from - bytes_) + i * referenceSize_);
   }
 
-  void checkKeys() const {
+  [[nodiscard]] bool checkKeys() {
     for (const NodeIndex i : containers_.span(0, containers_.size())) {
       if (nodes_[i].kind != Kind::dictionary) continue;
       for (const NodeIndex key : document_.keys(nodes_[i])) {
         if (nodes_[key].kind != Kind::string) {
-          throw malformed("dictionary key is not text", offsetOf(i));
+          return refuse("dictionary key is not text", offsetOf(i));
         }
       }
     }
+    return true;
   }
+
+  [[nodiscard]] bool measure() { return parentsFirst_ ? measureBackwards() : measureFromRoot(); }
 
   /// Values or elements; requires a container.
   [[nodiscard]] std::span<const NodeIndex> childrenOf(const Node& node) const {
@@ -355,7 +375,7 @@ class BinaryReader {
 
   /// What most writers produce: parents stand before their children, hence no cycle, and from the
   /// last object to the first every height is known before it is asked for.
-  void measureBackwards() {
+  [[nodiscard]] bool measureBackwards() {
     for (std::size_t i = containers_.size(); i-- > 0;) {
       Node& node = nodes_[containers_[i]];
       std::uint16_t height = 0;
@@ -363,18 +383,19 @@ class BinaryReader {
         height = std::max(height, nodes_[child].height);
       node.height = std::min<std::uint16_t>(height + 1, kTooDeep);
     }
-    if (nodes_[root_].height == kTooDeep) throw tooDeep();
+    if (nodes_[root_].height == kTooDeep) return refuse(tooDeep());
+    return true;
   }
 
   /// Any graph: depth first from the root, each container entered once, however often it is shared.
   /// A height of 0 is a container not yet seen, kOpen one that is being walked.
-  void measureFromRoot() {
+  [[nodiscard]] bool measureFromRoot() {
     struct Step {
       NodeIndex node;
       std::uint32_t nextChild;
       std::uint16_t height;
     };
-    if (!isContainer(nodes_[root_])) return;
+    if (!isContainer(nodes_[root_])) return true;
     ScratchArray<Step, limits::nestedContainers> way;
     const auto enter = [&](NodeIndex index) {
       nodes_[index].height = kOpen;
@@ -388,17 +409,17 @@ class BinaryReader {
         const auto height = static_cast<std::uint16_t>(step.height + 1);
         nodes_[step.node].height = height;
         way.shrinkTo(way.size() - 1);
-        if (way.empty()) return;
+        if (way.empty()) return true;
         way.back().height = std::max(way.back().height, height);
         continue;
       }
       const NodeIndex child = children[step.nextChild++];
       const Node& node = nodes_[child];
       if (!isContainer(node)) continue;
-      if (node.height == kOpen) throw malformed("container inside itself", offsetOf(child));
+      if (node.height == kOpen) return refuse("container inside itself", offsetOf(child));
       // The child's own container counts even where its height is not yet known.
       if (way.size() + std::max<std::size_t>(node.height, 1) > limits::nestedContainers) {
-        throw tooDeep();
+        return refuse(tooDeep());
       }
       if (node.height == 0) {
         enter(child);
@@ -428,8 +449,11 @@ class BinaryReader {
   NodeIndex root_ = 0;
   NodeIndex current_ = 0;
   bool parentsFirst_ = true;  // no reference to a container that stands earlier
+  std::optional<DecodingError> refusal_;
 };
 
-void readBinary(const Data& message, Document& document) { BinaryReader(message, document).read(); }
+std::optional<DecodingError> readBinary(const Data& message, Document& document) {
+  return BinaryReader(message, document).read();
+}
 
 }  // namespace ironmoat::plist

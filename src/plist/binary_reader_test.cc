@@ -19,13 +19,9 @@ using ironmoat::testing::tightMessage;
 
 /// The tree that a message holds, or what it is refused with.
 std::string outcome(const Data& message, bool shown = true) {
-  std::string tree = "accepted";
-  const std::string verdict = ironmoat::testing::refusalOf([&] {
-    Document document;
-    read(message, document);
-    if (shown) tree = show(document);
-  });
-  return verdict == "accepted" ? tree : verdict;
+  Document document;
+  if (const auto refusal = read(message, document)) return ironmoat::testing::inWords(*refusal);
+  return shown ? show(document) : "accepted";
 }
 
 const std::string kMost = bigEndianBytes(UINT64_MAX, 8);

@@ -17,88 +17,85 @@
 
 namespace ironmoat::plist {
 
-/// What the decoders of one message share: what it may still cost, see ironmoat/limits.h, and its
-/// bytes, in which errors name a place.
+/// What a message may still cost, see ironmoat/limits.h.
 struct Budget {
   std::size_t recordBytes = limits::recordBytes;
   std::size_t deliveredBytes = limits::deliveredBytes;
   std::size_t scannedEntries = limits::scannedEntries;
-  const Data* message = nullptr;  ///< none: errors have no offset
 };
 
-template <class Keys>
-class KeyedDecodingContainer;
+/// What the decoders of one message share.
+struct Decoding {
+  const Document& document;
+  const Data* message = nullptr;  ///< in whose bytes a refusal names a place; none: in no bytes
+  Budget budget = {};
+  std::optional<DecodingError> refusal = {};  ///< once a decoder has refused the message
+};
 
 /// A decoder positioned on one value of a document. Lives on the stack, below its parent's; knows
-/// the way from the top, so that an error can name it.
+/// the way from the top, so that a refusal can name it.
+///
+/// Whatever decodes returns whether it did. If it did not, the message is refused, the reason is in
+/// `Decoding::refusal`, and what was decoded so far is useless.
 class Decoder {
  public:
-  Decoder(const Document& document, Budget& budget) noexcept
-      : document_(document), budget_(budget), node_(document.root()) {}
+  explicit Decoder(Decoding& decoding) noexcept
+      : document_(decoding.document), decoding_(decoding), node_(decoding.document.root()) {}
   /// The value under `key`, which must outlive the decoder, or the element at `index`.
   Decoder(const Decoder& parent, const std::string_view& key, NodeIndex node) noexcept
       : document_(parent.document_),
-        budget_(parent.budget_),
+        decoding_(parent.decoding_),
         parent_(&parent),
         key_(&key),
         node_(node) {}
   Decoder(const Decoder& parent, std::uint32_t index, NodeIndex node) noexcept
       : document_(parent.document_),
-        budget_(parent.budget_),
+        decoding_(parent.decoding_),
         parent_(&parent),
         index_(index),
         node_(node) {}
   Decoder(const Decoder&) = delete;
   Decoder& operator=(const Decoder&) = delete;
 
-  /// The current value's entries under the record's keys; throws `typeMismatch` when the value is
-  /// no dictionary.
-  template <class Keys>
-  [[nodiscard]] KeyedDecodingContainer<Keys> container() const {
-    return KeyedDecodingContainer<Keys>(*this);
-  }
-
   [[nodiscard]] const Document& document() const noexcept { return document_; }
   [[nodiscard]] const Node& node() const noexcept { return document_.node(node_); }
 
-  /// The current node; throws `typeMismatch` when it is of another kind.
-  const Node& expect(Kind kind) const {
-    const Node& node = this->node();
-    if (node.kind != kind) failMismatch(kind);
-    return node;
+  /// The current node is of this kind.
+  [[nodiscard]] bool expect(Kind kind) const { return node().kind == kind || refuseMismatch(kind); }
+  [[nodiscard]] bool chargeRecords(std::size_t count, std::size_t size) const {
+    return charge(decoding_.budget.recordBytes, count * size,
+                  "lists take more memory than the limit of ", limits::recordBytes, " bytes");
   }
-  void chargeRecords(std::size_t count, std::size_t size) const {
-    charge(budget_.recordBytes, count * size, "lists take more memory than the limit of ",
-           limits::recordBytes, " bytes");
+  [[nodiscard]] bool chargeDelivered(std::size_t bytes) const {
+    return charge(decoding_.budget.deliveredBytes, bytes,
+                  "text and data come to more than the limit of ", limits::deliveredBytes,
+                  " bytes");
   }
-  void chargeDelivered(std::size_t bytes) const {
-    charge(budget_.deliveredBytes, bytes, "text and data come to more than the limit of ",
-           limits::deliveredBytes, " bytes");
-  }
-  void chargeScanned(std::size_t entries) const {
-    charge(budget_.scannedEntries, entries, "shared dictionaries come to more than the limit of ",
-           limits::scannedEntries, " entries");
+  [[nodiscard]] bool chargeScanned(std::size_t entries) const {
+    return charge(decoding_.budget.scannedEntries, entries,
+                  "shared dictionaries come to more than the limit of ", limits::scannedEntries,
+                  " entries");
   }
 
-  [[noreturn]] void failMismatch(Kind expected) const;
-  [[noreturn]] void failOutOfRange() const;
-  [[noreturn]] void failMissing(std::string_view key) const;
+  // Each returns false.
+  [[gnu::cold]] bool refuseMismatch(Kind expected) const;
+  [[gnu::cold]] bool refuseOutOfRange() const;
+  [[gnu::cold]] bool refuseMissing(const std::string_view& key) const;
 
  private:
-  void charge(std::size_t& left, std::size_t amount, const char* what, std::size_t limit,
+  bool charge(std::size_t& left, std::size_t amount, const char* what, std::size_t limit,
               const char* unit) const {
-    if (amount > left) failLimit(what, limit, unit);
+    if (amount > left) return refuseLimit(what, limit, unit);
     left -= amount;
+    return true;
   }
-  [[noreturn]] void failLimit(const char* what, std::size_t limit, const char* unit) const;
-  [[nodiscard]] DecodingError mismatch(Kind expected) const;
-  [[nodiscard]] DecodingError outOfRange() const;
-  [[nodiscard]] DecodingError missing(std::string_view key) const;
+  [[gnu::cold]] bool refuseLimit(const char* what, std::size_t limit, const char* unit) const;
+  bool refuse(DecodingError::Kind kind, const std::string& sentence) const;
   [[nodiscard]] std::string path() const;
   [[nodiscard]] std::optional<std::uint64_t> offset() const;
 
   const Document& document_;
-  Budget& budget_;
+  Decoding& decoding_;
   const Decoder* parent_ = nullptr;
   const std::string_view* key_ = nullptr;
   std::uint32_t index_ = 0;
@@ -109,35 +106,53 @@ template <class T>
 concept Scalar = std::same_as<T, Int> || std::same_as<T, Int64> || std::same_as<T, Bool> ||
     std::same_as<T, String> || std::same_as<T, Data>;
 
-/// The current value as a field of type T.
+/// The current value is one for a field of type T, and is paid for.
 template <Scalar T>
-T decodeScalar(const Decoder& decoder) {
+[[nodiscard]] bool admitsScalar(const Decoder& decoder) {
   if constexpr (std::same_as<T, Bool>) {
-    return decoder.expect(Kind::boolean).payload != 0;
+    return decoder.expect(Kind::boolean);
   } else if constexpr (std::same_as<T, String> || std::same_as<T, Data>) {
-    const Node& node = decoder.expect(std::same_as<T, String> ? Kind::string : Kind::data);
-    decoder.chargeDelivered(node.count);
+    return decoder.expect(std::same_as<T, String> ? Kind::string : Kind::data) &&
+           decoder.chargeDelivered(decoder.node().count);
+  } else {
+    if (decoder.node().kind == Kind::unsignedInteger) return decoder.refuseOutOfRange();
+    return decoder.expect(Kind::integer);
+  }
+}
+/// The value; requires that it was admitted.
+template <Scalar T>
+T scalar(const Decoder& decoder) {
+  const Node& node = decoder.node();
+  if constexpr (std::same_as<T, Bool>) {
+    return node.payload != 0;
+  } else if constexpr (std::same_as<T, String> || std::same_as<T, Data>) {
     return T(decoder.document().slice(node));
   } else {
-    if (decoder.node().kind == Kind::unsignedInteger) decoder.failOutOfRange();
-    return static_cast<T>(decoder.expect(Kind::integer).payload);
+    return static_cast<T>(node.payload);
   }
 }
 
-/// The same into a value that is there already. Records bring an overload of their own.
+/// The current value into a field that is there already.
 template <Scalar T>
-void decodeInto(const Decoder& decoder, T& value) {
-  value = decodeScalar<T>(decoder);
+[[nodiscard]] bool decodeInto(const Decoder& decoder, T& value) {
+  if (!admitsScalar<T>(decoder)) return false;
+  value = scalar<T>(decoder);
+  return true;
 }
+template <class R>
+requires requires(const Decoder& decoder, R& record) { record.decode(decoder); }
+[[nodiscard]] bool decodeInto(const Decoder& decoder, R& record) { return record.decode(decoder); }
 template <class T>
-void decodeInto(const Decoder& decoder, List<T>& list) {
-  const Node& array = decoder.expect(Kind::array);
-  decoder.chargeRecords(array.count, sizeof(T));
+[[nodiscard]] bool decodeInto(const Decoder& decoder, List<T>& list) {
+  if (!decoder.expect(Kind::array)) return false;
+  const Node& array = decoder.node();
+  if (!decoder.chargeRecords(array.count, sizeof(T))) return false;
   list.reserve(array.count);  // proven by the document, paid for by the budget
   std::uint32_t index = 0;
   for (const NodeIndex element : decoder.document().elements(array)) {
-    decodeInto(Decoder(decoder, index++, element), list.emplace_back());
+    if (!decodeInto(Decoder(decoder, index++, element), list.emplace_back())) return false;
   }
+  return true;
 }
 
 /// A dictionary, seen through an enumeration of keys: `Keys::count`, `Keys::at(index)`,
@@ -146,10 +161,14 @@ void decodeInto(const Decoder& decoder, List<T>& list) {
 template <class Keys>
 class KeyedDecodingContainer {
  public:
-  explicit KeyedDecodingContainer(const Decoder& decoder) : decoder_(decoder) {
-    const Node& dictionary = decoder.expect(Kind::dictionary);
-    decoder.chargeScanned(dictionary.count);
-    const Document& document = decoder.document();
+  explicit KeyedDecodingContainer(const Decoder& decoder) : decoder_(decoder) {}
+
+  /// Finds the entries; before anything else.
+  [[nodiscard]] bool scan() {
+    if (!decoder_.expect(Kind::dictionary)) return false;
+    const Node& dictionary = decoder_.node();
+    if (!decoder_.chargeScanned(dictionary.count)) return false;
+    const Document& document = decoder_.document();
     const auto keys = document.keys(dictionary);
     const auto values = document.values(dictionary);
     const auto& find = Keys::finder();
@@ -165,53 +184,46 @@ class KeyedDecodingContainer {
       seen_[key->index() / 64] |= std::uint64_t{1} << (key->index() % 64);
       values_[key->index()] = values[i];
     }
+    return true;
   }
 
   [[nodiscard]] bool contains(Keys key) const noexcept {
     return ((seen_[key.index() / 64] >> (key.index() % 64)) & 1) != 0;
   }
 
-  /// Throws `keyNotFound` when there is no entry, and what decoding its value throws.
-  template <class T>
-  [[nodiscard]] T decode(Keys key) const {
-    T value{};
-    decodeField(key, value);
-    return value;
-  }
-  template <class T>
-  [[nodiscard]] Optional<T> decodeIfPresent(Keys key) const {
-    Optional<T> value;
-    if (contains(key)) decodeField(key, value);
-    return value;
-  }
-
-  /// The same, into a record's member in place: a plain member is required; an optional one must
+  /// The entry under `key` into a record's member: a plain member is required; an optional one must
   /// have been seen, and be absent so far.
   template <class T>
-  void decodeField(Keys key, T& value) const {
-    if (!contains(key)) decoder_.failMissing(key.stringValue());
-    decodeInto(Decoder(decoder_, key.stringValue(), values_[key.index()]), value);
+  [[nodiscard]] bool decodeField(Keys key, T& value) const {
+    if (!contains(key)) return decoder_.refuseMissing(key.stringValue());
+    return decodeInto(Decoder(decoder_, key.stringValue(), values_[key.index()]), value);
   }
   template <class T>
-  void decodeField(Keys key, Optional<T>& value) const {
+  [[nodiscard]] bool decodeField(Keys key, Optional<T>& value) const {
     const Decoder decoder(decoder_, key.stringValue(), values_[key.index()]);
     if constexpr (Scalar<T>) {
-      std::construct_at(&value, decodeScalar<T>(decoder));  // absent so far: it owns nothing
+      if (!admitsScalar<T>(decoder)) return false;
+      std::construct_at(&value, scalar<T>(decoder));  // absent so far: it owns nothing
+      return true;
     } else {
       value = Optional<T>(T{});
-      decodeInto(decoder, *value);
+      return decodeInto(decoder, *value);
     }
   }
 
-  /// Calls `visit(key)` in the order of the cases, for each that was seen and each in `required`.
+  /// Calls `visit(key)` in the order of the cases, for each that was seen and each in `required`,
+  /// as long as it returns true; returns whether it always did.
   template <class Visitor>
-  void forEach(const std::array<std::uint64_t, (Keys::count + 63) / 64>& required,
-               Visitor&& visit) const {
+  [[nodiscard]] bool forEach(const std::array<std::uint64_t, (Keys::count + 63) / 64>& required,
+                             Visitor&& visit) const {
     for (std::size_t word = 0; word < seen_.size(); ++word) {
       for (std::uint64_t left = seen_[word] | required[word]; left != 0; left &= left - 1) {
-        visit(Keys::at(word * 64 + static_cast<std::size_t>(std::countr_zero(left))));
+        if (!visit(Keys::at(word * 64 + static_cast<std::size_t>(std::countr_zero(left))))) {
+          return false;
+        }
       }
     }
+    return true;
   }
 
  private:

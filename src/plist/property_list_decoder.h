@@ -1,5 +1,9 @@
 #pragma once
 
+#include <optional>
+#include <utility>
+
+#include "ironmoat/errors.h"
 #include "ironmoat/values.h"
 #include "plist/decoder.h"
 #include "plist/document.h"
@@ -7,19 +11,20 @@
 
 namespace ironmoat::plist {
 
-/// Bytes of either form to a record `R`, by `R::decode(const Decoder&)`. Holds nothing between
-/// calls.
+/// Bytes of either form to a record. Holds nothing between calls.
 class PropertyListDecoder {
  public:
-  /// Throws DecodingError, and whatever R's decoding throws, unchanged. The record keeps a
-  /// reference to the message's block, and depends on nothing else.
+  /// Into `record`, freshly made, by its `decode`. Returns why the message is refused; the record
+  /// is then useless. None: the record keeps a reference to the message's block, and depends on
+  /// nothing else.
   template <class R>
-  [[nodiscard]] R decode(const Data& message) const {
+  [[nodiscard]] std::optional<DecodingError> decode(const Data& message, R& record) const {
     Document document;
-    read(message, document);
-    Budget budget{.message = &message};
-    const Decoder decoder(document, budget);
-    return R::decode(decoder);
+    std::optional<DecodingError> refusal = read(message, document);
+    if (refusal) return refusal;
+    Decoding decoding{.document = document, .message = &message};
+    if (!record.decode(Decoder(decoding))) refusal = std::move(decoding.refusal);
+    return refusal;
   }
 };
 

@@ -1,5 +1,8 @@
 #pragma once
 
+#include <optional>
+
+#include "ironmoat/errors.h"
 #include "ironmoat/values.h"
 #include "plist/document.h"
 
@@ -9,12 +12,12 @@ namespace ironmoat::plist {
 /// with "bplist", XML otherwise. The document holds the message's block and copies nothing that the
 /// message has literally.
 ///
-/// Throws DecodingError, `malformed` with an offset into `message` or `limitExceeded`; the document
-/// is then useless. Time is linear in the size of the message.
-void read(const Data& message, Document& document);
+/// Returns why the message is refused, `malformed` with an offset into it or `limitExceeded`; the
+/// document is then useless. None: it was read. Time is linear in the size of the message.
+[[nodiscard]] std::optional<DecodingError> read(const Data& message, Document& document);
 
 /// One form each, for tests. Requires at most limits::messageBytes.
-void readBinary(const Data& message, Document& document);
-void readXml(const Data& message, Document& document);
+[[nodiscard]] std::optional<DecodingError> readBinary(const Data& message, Document& document);
+[[nodiscard]] std::optional<DecodingError> readXml(const Data& message, Document& document);
 
 }  // namespace ironmoat::plist

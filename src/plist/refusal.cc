@@ -1,12 +1,19 @@
 #include "plist/refusal.h"
 
+#include <cstddef>
+#include <string>
+
 #include "ironmoat/limits.h"
 
 namespace ironmoat::plist {
 
 DecodingError malformed(std::string_view reason, std::uint64_t offset) {
-  return {DecodingError::Kind::malformed, "",
-          std::string(reason) + " at offset " + std::to_string(offset), offset};
+  constexpr std::string_view kWhere = " at offset ";
+  constexpr std::size_t kMostDigits = 20;
+  std::string sentence;
+  sentence.reserve(reason.size() + kWhere.size() + kMostDigits);
+  sentence.append(reason).append(kWhere).append(std::to_string(offset));
+  return {DecodingError::Kind::malformed, "", sentence, offset};
 }
 
 DecodingError tooDeep() {

@@ -286,6 +286,13 @@ void XmlReader::data(bool empty) {
 
 }  // namespace
 
-void readXml(const Data& message, Document& document) { XmlReader(message, document).read(); }
+std::optional<DecodingError> readXml(const Data& message, Document& document) {
+  try {
+    XmlReader(message, document).read();
+    return std::nullopt;
+  } catch (const DecodingError& refusal) {
+    return refusal;
+  }
+}
 
 }  // namespace ironmoat::plist

@@ -23,10 +23,9 @@ struct VeskCommandResponseSchema {
   Optional<Bool> sharedSession;
   Optional<Int> protocolVersion;
 
-  static VeskCommandResponseSchema decode(const plist::Decoder& decoder);
+  [[nodiscard]] bool decode(const plist::Decoder& decoder);
   void encode(plist::Encoder& encoder) const;
 };
-void decodeInto(const plist::Decoder& decoder, VeskCommandResponseSchema& record);
 
 template <>
 struct records::Table<VeskCommandResponseSchema> {

@@ -20,7 +20,7 @@
 ///       using CodingKeys = records::CodingKeys<Example>;
 ///       Int command = 0;
 ///       Optional<String> name;
-///       static Example decode(const plist::Decoder& decoder);
+///       [[nodiscard]] bool decode(const plist::Decoder& decoder);
 ///       void encode(plist::Encoder& encoder) const;
 ///     };
 ///     template <>
@@ -35,6 +35,9 @@
 /// and in its .cc `IRONMOAT_KEYED_RECORD(Example)`, from keyed_record_impl.h. A plain member is
 /// required, an optional one may be absent. A row that is missing, out of order, of an unsupported
 /// type or with another row's key does not compile.
+///
+/// `decode` fills a record that is freshly made, its fields in table order, and returns whether it
+/// did; the first field that is refused ends it (plist/decoder.h says how).
 namespace ironmoat::plist {
 class Decoder;
 class Encoder;

@@ -23,18 +23,17 @@ constexpr bool wellFormed() {
       });
 }
 
-/// Decodes the fields of `record`, freshly made, in table order. The first error ends it.
 template <class R>
-void decodeFields(const plist::Decoder& decoder, R& record) {
+[[nodiscard]] bool decodeFields(const plist::Decoder& decoder, R& record) {
   static_assert(wellFormed<R>());
   using Keys = typename R::CodingKeys;
   using Container = plist::KeyedDecodingContainer<Keys>;
-  using DecodeOne = void (*)(const Container&, Keys, R&);
+  using DecodeOne = bool (*)(const Container&, Keys, R&);
   static constexpr auto decodeOne = detail::overMembers(
       Table<R>::rows, []<auto... Members>() {
         return std::array<DecodeOne, Keys::count>{
             [](const Container& container, Keys key, R& into) {
-              container.decodeField(key, into.*Members);
+              return container.decodeField(key, into.*Members);
             }...};
       });
   static constexpr auto required = detail::overMembers(
@@ -48,8 +47,10 @@ void decodeFields(const plist::Decoder& decoder, R& record) {
          ...);
         return bits;
       });
-  const Container container = decoder.container<Keys>();
-  container.forEach(required, [&](Keys key) { decodeOne[key.index()](container, key, record); });
+  Container container(decoder);
+  return container.scan() && container.forEach(required, [&](Keys key) {
+    return decodeOne[key.index()](container, key, record);
+  });
 }
 
 /// Writes `record` as a dictionary: required fields always, optional ones when present.
@@ -74,13 +75,8 @@ void encodeFields(plist::Encoder& encoder, const R& record) {
 
 /// Defines decoding and encoding of `Record`; stands once, in the record's .cc.
 #define IRONMOAT_KEYED_RECORD(Record)                                                           \
-  Record Record::decode(const plist::Decoder& decoder) {                                        \
-    Record record{};                                                                            \
-    records::decodeFields(decoder, record);                                                     \
-    return record;                                                                              \
-  }                                                                                             \
-  void decodeInto(const plist::Decoder& decoder, Record& record) {                              \
-    records::decodeFields(decoder, record);                                                     \
+  bool Record::decode(const plist::Decoder& decoder) {                                          \
+    return records::decodeFields(decoder, *this);                                               \
   }                                                                                             \
   void Record::encode(plist::Encoder& encoder) const { records::encodeFields(encoder, *this); } \
   static_assert(records::wellFormed<Record>())

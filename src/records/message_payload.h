@@ -162,10 +162,9 @@ struct VeskCorvelProtocolPayload {
   Optional<Bool> expectsPeerResponse;
   Optional<Int> allowGDR;
 
-  static VeskCorvelProtocolPayload decode(const plist::Decoder& decoder);
+  [[nodiscard]] bool decode(const plist::Decoder& decoder);
   void encode(plist::Encoder& encoder) const;
 };
-void decodeInto(const plist::Decoder& decoder, VeskCorvelProtocolPayload& record);
 
 template <>
 struct records::Table<VeskCorvelProtocolPayload> {

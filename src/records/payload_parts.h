@@ -11,10 +11,9 @@ struct VeskCorvelProtocolDeliveryContext {
 
   Optional<Int> count;
 
-  static VeskCorvelProtocolDeliveryContext decode(const plist::Decoder& decoder);
+  [[nodiscard]] bool decode(const plist::Decoder& decoder);
   void encode(plist::Encoder& encoder) const;
 };
-void decodeInto(const plist::Decoder& decoder, VeskCorvelProtocolDeliveryContext& record);
 
 template <>
 struct records::Table<VeskCorvelProtocolDeliveryContext> {
@@ -33,10 +32,9 @@ struct VeskHoplinePluginRequest {
   Optional<Int> pluginStream;
   Optional<Bool> pluginDevMode;
 
-  static VeskHoplinePluginRequest decode(const plist::Decoder& decoder);
+  [[nodiscard]] bool decode(const plist::Decoder& decoder);
   void encode(plist::Encoder& encoder) const;
 };
-void decodeInto(const plist::Decoder& decoder, VeskHoplinePluginRequest& record);
 
 template <>
 struct records::Table<VeskHoplinePluginRequest> {
@@ -58,10 +56,9 @@ struct VeskHoplineAllocationStatus {
   Optional<Data> token;
   Optional<String> destinationId;
 
-  static VeskHoplineAllocationStatus decode(const plist::Decoder& decoder);
+  [[nodiscard]] bool decode(const plist::Decoder& decoder);
   void encode(plist::Encoder& encoder) const;
 };
-void decodeInto(const plist::Decoder& decoder, VeskHoplineAllocationStatus& record);
 
 template <>
 struct records::Table<VeskHoplineAllocationStatus> {
@@ -86,10 +83,9 @@ struct VeskHoplineSelfAllocToken {
   Optional<Data> relayAccessToken;
   Optional<Int> relayProvider;
 
-  static VeskHoplineSelfAllocToken decode(const plist::Decoder& decoder);
+  [[nodiscard]] bool decode(const plist::Decoder& decoder);
   void encode(plist::Encoder& encoder) const;
 };
-void decodeInto(const plist::Decoder& decoder, VeskHoplineSelfAllocToken& record);
 
 template <>
 struct records::Table<VeskHoplineSelfAllocToken> {
@@ -112,10 +108,9 @@ struct VeskHoplinePluginAllocation {
   Optional<Data> relaySessionKey;
   Optional<Data> relayAccessToken;
 
-  static VeskHoplinePluginAllocation decode(const plist::Decoder& decoder);
+  [[nodiscard]] bool decode(const plist::Decoder& decoder);
   void encode(plist::Encoder& encoder) const;
 };
-void decodeInto(const plist::Decoder& decoder, VeskHoplinePluginAllocation& record);
 
 template <>
 struct records::Table<VeskHoplinePluginAllocation> {

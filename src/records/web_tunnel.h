@@ -16,10 +16,9 @@ struct VeskCorvelProtocolHttpHeaders {
   Optional<String> splunkHint;
   Optional<String> asHttpHeader;
 
-  static VeskCorvelProtocolHttpHeaders decode(const plist::Decoder& decoder);
+  [[nodiscard]] bool decode(const plist::Decoder& decoder);
   void encode(plist::Encoder& encoder) const;
 };
-void decodeInto(const plist::Decoder& decoder, VeskCorvelProtocolHttpHeaders& record);
 
 template <>
 struct records::Table<VeskCorvelProtocolHttpHeaders> {
@@ -52,10 +51,9 @@ struct VeskCommandWebTunnelResponseSchema {
   Optional<Int> httpResponseStatus;
   Optional<String> httpErrorMsg;
 
-  static VeskCommandWebTunnelResponseSchema decode(const plist::Decoder& decoder);
+  [[nodiscard]] bool decode(const plist::Decoder& decoder);
   void encode(plist::Encoder& encoder) const;
 };
-void decodeInto(const plist::Decoder& decoder, VeskCommandWebTunnelResponseSchema& record);
 
 template <>
 struct records::Table<VeskCommandWebTunnelResponseSchema> {

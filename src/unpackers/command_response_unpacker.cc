@@ -1,14 +1,17 @@
 #include "unpackers/command_response_unpacker.h"
 
+#include <utility>
+
 #include "records/command_response.h"
 #include "unpackers/conversion.h"
 #include "unpackers/decode_message.h"
 
 namespace ironmoat {
 
-VeskCommandResponse VeskCommandResponseUnpacker::unpack(const Data& message) const {
-  const auto wire = decodeMessage<VeskCommandResponseSchema>(message);
-  return VeskCommandResponse::with(argumentsFrom<VeskCommandResponse>(wire));
+Unpacked<VeskCommandResponse> VeskCommandResponseUnpacker::unpack(const Data& message) const {
+  VeskCommandResponseSchema wire;
+  if (auto refusal = decodeMessage(message, wire)) return std::move(*refusal);
+  return Unpacked<VeskCommandResponse>([&] { return argumentsFrom<VeskCommandResponse>(wire); });
 }
 
 }  // namespace ironmoat

@@ -7,8 +7,8 @@ namespace ironmoat {
 
 struct VeskCommandResponseUnpacker {
   using MessageSchemaType = VeskCommandResponse;
-  /// Throws DecodingError, and what an output record's initialiser refuses with, unchanged.
-  [[nodiscard]] VeskCommandResponse unpack(const Data& message) const;
+  /// Throws what an output record's initialiser refuses with, unchanged.
+  [[nodiscard]] Unpacked<VeskCommandResponse> unpack(const Data& message) const;
 };
 static_assert(MessageUnpacker<VeskCommandResponseUnpacker>);
 

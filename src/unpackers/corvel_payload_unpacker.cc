@@ -75,9 +75,10 @@ DrelUserPayloadArguments convertPayload(const VeskCorvelProtocolPayload& wire) {
 
 }  // namespace
 
-DrelUserPayload VeskCorvelPayloadUnpacker::unpack(const Data& message) const {
-  const auto wire = decodeMessage<VeskCorvelProtocolPayload>(message);
-  return DrelUserPayload([&] { return convertPayload(wire); });
+Unpacked<DrelUserPayload> VeskCorvelPayloadUnpacker::unpack(const Data& message) const {
+  VeskCorvelProtocolPayload wire;
+  if (auto refusal = decodeMessage(message, wire)) return std::move(*refusal);
+  return Unpacked<DrelUserPayload>([&] { return convertPayload(wire); });
 }
 
 }  // namespace ironmoat

@@ -166,8 +166,9 @@ TEST_F(UnpackersTest, WhatTheHostRefusesIsAReplyAndARecordThatComesBackIsAskedFo
 
 TEST_F(UnpackersTest, ADecodingErrorComesBeforeAnyCall) {
   const Data wrong = message(payload(1, "<key>h</key><dict/>" + list("mml", {""})));
-  EXPECT_EQ(testing::refusalOf([&] { (void)VeskCorvelPayloadUnpacker().unpack(wrong); }),
-            "keyNotFound mml[0].c: required key is missing");
+  const auto unpacked = VeskCorvelPayloadUnpacker().unpack(wrong);
+  ASSERT_FALSE(unpacked);
+  EXPECT_EQ(testing::inWords(unpacked.refusal()), "keyNotFound mml[0].c: required key is missing");
   EXPECT_TRUE(calls.empty());
 }
 

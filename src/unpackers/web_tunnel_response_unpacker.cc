@@ -17,12 +17,13 @@ struct Converted {
 
 }  // namespace
 
-VeskCommandWebTunnelResponse VeskCommandWebTunnelResponseUnpacker::unpack(
+Unpacked<VeskCommandWebTunnelResponse> VeskCommandWebTunnelResponseUnpacker::unpack(
     const Data& message) const {
-  const auto wire = decodeMessage<VeskCommandWebTunnelResponseSchema>(message);
+  VeskCommandWebTunnelResponseSchema wire;
+  if (auto refusal = decodeMessage(message, wire)) return std::move(*refusal);
   Converted converted{.httpHeaders = convertHeaderBlock(wire.httpHeaders)};
-  return VeskCommandWebTunnelResponse::with(
-      argumentsFrom<VeskCommandWebTunnelResponse>(wire, std::move(converted)));
+  return Unpacked<VeskCommandWebTunnelResponse>(
+      [&] { return argumentsFrom<VeskCommandWebTunnelResponse>(wire, std::move(converted)); });
 }
 
 }  // namespace ironmoat

@@ -26,7 +26,7 @@ struct Example {
   Optional<Int> third;
 #endif
 
-  static Example decode(const plist::Decoder& decoder);
+  [[nodiscard]] bool decode(const plist::Decoder& decoder);
   void encode(plist::Encoder& encoder) const;
 };
 
@@ -85,7 +85,7 @@ Output convert(const Example& wire) { return Output::with(argumentsFrom<Output>(
 
 struct Unpacker {
   using MessageSchemaType = Output;
-  [[nodiscard]] Output unpack(const Data& message) const;
+  [[nodiscard]] Unpacked<Output> unpack(const Data& message) const;
 };
 
 void registerAll(IronmoatServer& server) {

@@ -6,18 +6,11 @@
 
 namespace ironmoat::testing {
 
-/// What `act` is refused with, as "kind path: sentence" ("kind: sentence" without a path), or
-/// "accepted".
-template <class Act>
-std::string refusalOf(Act&& act) {
-  try {
-    act();
-  } catch (const DecodingError& error) {
-    std::string text(nameOf(error.kind()));
-    if (!error.path().empty()) text.append(" ").append(error.path());
-    return text.append(": ").append(error.what());
-  }
-  return "accepted";
+/// A refusal as "kind path: sentence" ("kind: sentence" without a path).
+inline std::string inWords(const DecodingError& refusal) {
+  std::string text(nameOf(refusal.kind()));
+  if (!refusal.path().empty()) text.append(" ").append(refusal.path());
+  return text.append(": ").append(refusal.what());
 }
 
 }  // namespace ironmoat::testing
