@@ -64,7 +64,7 @@ template <class Key>
 Data manyEntries(plist::Form form, std::size_t count, Key key) {
   plist::Document document;
   plist::DocumentBuilder builder(document, BlockRef(), Sharing::anyThread);
-  builder.beginDictionary();
+  static_cast<void>(builder.beginDictionary());
   builder.string("c");
   builder.integer(1);
   for (std::size_t i = 0; i < count; ++i) {

@@ -1,15 +1,15 @@
 #include "plist/document_builder.h"
 
 #include "ironmoat/limits.h"
-#include "plist/refusal.h"
 
 namespace ironmoat::plist {
 
-void DocumentBuilder::begin(Kind kind) {
-  if (open_.size() == limits::nestedContainers) throw tooDeep();
+bool DocumentBuilder::begin(Kind kind) {
+  if (open_.size() == limits::nestedContainers) return false;
   const auto index = static_cast<NodeIndex>(document_.nodes_.size());
   add({kind, false, 0, 0, 0});
   open_.push({index, static_cast<std::uint32_t>(pending_.size())});
+  return true;
 }
 
 void DocumentBuilder::end() {

@@ -13,8 +13,7 @@ namespace ironmoat::plist {
 /// `beginDictionary`, then key and value in turn, `end`; `beginArray`, elements, `end`.
 ///
 /// The caller keeps the order (a key before each value, one root, every `begin` ended); a builder
-/// whose order was broken must not be finished. Opening a container deeper than
-/// limits::nestedContainers throws DecodingError `limitExceeded`.
+/// whose order was broken must not be finished.
 class DocumentBuilder {
  public:
   /// `source` is the block that `sourceString` and `sourceData` point into; it may be none.
@@ -23,8 +22,9 @@ class DocumentBuilder {
     document_.source_ = std::move(source);
   }
 
-  void beginDictionary() { begin(Kind::dictionary); }
-  void beginArray() { begin(Kind::array); }
+  /// False where limits::nestedContainers are open already; then none is opened.
+  [[nodiscard]] bool beginDictionary() { return begin(Kind::dictionary); }
+  [[nodiscard]] bool beginArray() { return begin(Kind::array); }
   void end();
   /// Containers open now.
   [[nodiscard]] std::size_t depth() const noexcept { return open_.size(); }
@@ -63,7 +63,7 @@ class DocumentBuilder {
     std::uint32_t firstPending;
   };
 
-  void begin(Kind kind);
+  [[nodiscard]] bool begin(Kind kind);
   void add(const Node& node) {
     const auto index = static_cast<NodeIndex>(document_.nodes_.size());
     document_.nodes_.push(node);

@@ -2,6 +2,7 @@
 
 #include "ironmoat/values.h"
 #include "plist/document_builder.h"
+#include "plist/refusal.h"
 #include "plist/writer.h"
 
 namespace ironmoat::plist {
@@ -17,7 +18,7 @@ class Encoder {
   /// Opens a dictionary as the current value; whoever asked for the value closes it.
   template <class Keys>
   [[nodiscard]] KeyedEncodingContainer<Keys> container() {
-    builder_.beginDictionary();
+    if (!builder_.beginDictionary()) throw tooDeep();
     return KeyedEncodingContainer<Keys>(*this);
   }
   [[nodiscard]] DocumentBuilder& builder() noexcept { return builder_; }
@@ -43,7 +44,7 @@ void encodeValue(Encoder& encoder, const R& record) {
 }
 template <class T>
 void encodeValue(Encoder& encoder, const List<T>& list) {
-  encoder.builder().beginArray();
+  if (!encoder.builder().beginArray()) throw tooDeep();
   for (const T& element : list) encodeValue(encoder, element);
   encoder.builder().end();
 }

@@ -6,6 +6,7 @@
 #include "plist/base64.h"
 #include "plist/document_builder.h"
 #include "plist/reader.h"
+#include "plist/refusal.h"
 #include "plist/xml_scalars.h"
 #include "plist/xml_scanner.h"
 #include "plist/xml_text.h"
@@ -144,12 +145,12 @@ void XmlReader::value(Element element, bool empty) {
   const char* const content = in_.at();
   switch (element) {
     case Element::dictionary:
-      builder_.beginDictionary();
+      if (!builder_.beginDictionary()) throw tooDeep();
       place_ = Place::key;
       if (empty) endContainer();
       return;
     case Element::array:
-      builder_.beginArray();
+      if (!builder_.beginArray()) throw tooDeep();
       place_ = Place::element;
       if (empty) endContainer();
       return;

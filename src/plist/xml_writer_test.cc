@@ -17,7 +17,7 @@ TEST(XmlWriterTest, RefusesWhatTheFormOrARecordCannotHold) {
       },
       [](auto& builder) { builder.string("\xEF\xBF\xBF"); },
       [](auto& builder) {
-        builder.beginDictionary();
+        ASSERT_TRUE(builder.beginDictionary());
         builder.string("\x1F");
         builder.boolean(true);
         builder.end();
