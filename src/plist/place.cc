@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cstddef>
 #include <span>
+#include <string_view>
 
 #include "plist/binary_format.h"
 #include "plist/xml_scanner.h"
@@ -30,19 +31,17 @@ std::uint64_t placeInBinary(NodeIndex node, std::span<const std::uint8_t> messag
 /// Every element but the root's own is one node, in the order of the start tags; what else has a
 /// '<' is markup that is skipped: no attribute has.
 std::uint64_t placeInXml(NodeIndex node, const Data& message) {
-  const XmlSource source(message, XmlSource::Characters::known);
+  XmlSource source(message);  // refuses nothing: it was read before
+  if (!source.open(XmlSource::Characters::known)) return 0;
   XmlScanner in(source);
-  in.skipProlog();
+  if (!in.skipProlog()) return 0;
   in.take("<plist");
+  std::string_view content;
   while (!in.atEnd()) {
     in.advance(std::min(in.rest().find('<'), in.rest().size()));
     const char next = in.peek(1);
     if (next == '!' || next == '?') {
-      if (in.take("<![CDATA[")) {
-        in.takeUntil("]]>");
-      } else if (!in.skipMarkup()) {
-        in.advance(1);
-      }
+      if (!(in.take("<![CDATA[") ? in.takeUntil("]]>", content) : in.skipMarkup())) break;
     } else {
       if (in.atEnd() || (next != '/' && node-- == 0)) break;
       in.advance(1);

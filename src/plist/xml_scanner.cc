@@ -19,119 +19,116 @@ bool isXmlInAnyCase(std::string_view name) noexcept {
 
 }  // namespace
 
-std::string_view XmlScanner::takeUntil(std::string_view mark) {
+bool XmlScanner::takeUntil(std::string_view mark, std::string_view& text) {
   const std::string_view left = rest();
   const std::size_t length = left.find(mark);
-  if (length == std::string_view::npos) refuse("unexpected end", end_);
+  if (length == std::string_view::npos) return refuse("unexpected end", end_);
   at_ += length + mark.size();
-  return left.substr(0, length);
+  text = left.substr(0, length);
+  return true;
 }
 
-std::string_view XmlScanner::takeQuoted() {
-  if (take("\"")) return takeUntil("\"");
-  if (take("'")) return takeUntil("'");
-  refuse("no quoted value");
+bool XmlScanner::takeQuoted(std::string_view& value) {
+  if (take("\"")) return takeUntil("\"", value);
+  if (take("'")) return takeUntil("'", value);
+  return refuse("no quoted value");
 }
 
-std::string_view XmlScanner::takeAttributeValue() {
+bool XmlScanner::takeAttributeValue(std::string_view& value) {
   skipSpace();
-  if (!take("=")) refuse("attribute without a value");
+  if (!take("=")) return refuse("attribute without a value");
   skipSpace();
-  const std::string_view value = takeQuoted();
+  if (!takeQuoted(value)) return false;
   const std::size_t wrong = value.find_first_of("<&");
-  if (wrong != std::string_view::npos) refuse("markup in a value", value.data() + wrong);
-  return value;
+  return wrong == std::string_view::npos || refuse("markup in a value", value.data() + wrong);
 }
 
-std::string_view XmlScanner::takeName() {
-  const std::string_view name = rest().substr(0, xmlNameLength(rest()));
-  if (name.empty()) refuse("no name");
+bool XmlScanner::takeName(std::string_view& name) {
+  name = rest().substr(0, xmlNameLength(rest()));
   at_ += name.size();
-  return name;
+  return !name.empty() || refuse("no name");
 }
 
-void XmlScanner::requireSpace() {
-  if (!skipSpace()) refuse("no white space");
+bool XmlScanner::requireSpace() { return skipSpace() || refuse("no white space"); }
+
+bool XmlScanner::skipProlog() {
+  if (!declaration() || !skipMisc()) return false;
+  if (take("<!DOCTYPE") && !doctype()) return false;
+  return skipMisc();
 }
 
-void XmlScanner::skipProlog() {
-  declaration();
-  skipMisc();
-  if (take("<!DOCTYPE")) doctype();
-  skipMisc();
-}
-
-void XmlScanner::declaration() {
+bool XmlScanner::declaration() {
   // As nearly every writer puts it, in one step: with the usual root tag, a third off reading the
   // smallest message.
   constexpr std::string_view kUsual = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>";
-  if (!source_.isUtf16() && rest().starts_with(kUsual)) return advance(kUsual.size());
-  if (!looksAt("<?xml") || (rest().size() > 5 && !isXmlSpace(at_[5]))) return;
+  if (!source_.isUtf16() && rest().starts_with(kUsual)) {
+    advance(kUsual.size());
+    return true;
+  }
+  if (!looksAt("<?xml") || (rest().size() > 5 && !isXmlSpace(at_[5]))) return true;
   advance(5);
-  requireSpace();
-  if (!take("version")) refuse("no version");
-  const std::string_view version = takeAttributeValue();
-  if (!isOneDotDigits(version)) refuse("unknown version", version.data());
+  if (!requireSpace()) return false;
+  if (!take("version")) return refuse("no version");
+  std::string_view value;
+  if (!takeAttributeValue(value)) return false;
+  if (!isOneDotDigits(value)) return refuse("unknown version", value.data());
   bool spaced = skipSpace();
   if (spaced && take("encoding")) {
-    const std::string_view encoding = takeAttributeValue();
-    source_.checkEncoding(encoding, encoding.data());
+    if (!takeAttributeValue(value) || !source_.checkEncoding(value, value.data())) return false;
     spaced = skipSpace();
   }
   if (spaced && take("standalone")) {
-    const std::string_view standalone = takeAttributeValue();
-    if (standalone != "yes" && standalone != "no") refuse("neither yes nor no", standalone.data());
+    if (!takeAttributeValue(value)) return false;
+    if (value != "yes" && value != "no") return refuse("neither yes nor no", value.data());
     skipSpace();
   }
-  if (!take("?>")) refuse("bad declaration");
+  return take("?>") || refuse("bad declaration");
 }
 
-void XmlScanner::doctype() {
-  requireSpace();
-  takeName();
+bool XmlScanner::doctype() {
+  std::string_view name;
+  if (!requireSpace() || !takeName(name)) return false;
   const bool spaced = skipSpace();
   const bool isPublic = spaced && take("PUBLIC");
   if (isPublic || (spaced && take("SYSTEM"))) {
-    requireSpace();
-    if (isPublic) {
-      publicIdentifier();
-      requireSpace();
-    }
-    takeQuoted();
+    if (!requireSpace()) return false;
+    if (isPublic && (!publicIdentifier() || !requireSpace())) return false;
+    std::string_view where;
+    if (!takeQuoted(where)) return false;
     skipSpace();
   }
-  if (peek() == '[') refuse("internal subset");
-  if (!take(">")) refuse("bad document type");
+  if (peek() == '[') return refuse("internal subset");
+  return take(">") || refuse("bad document type");
 }
 
-void XmlScanner::publicIdentifier() {
+bool XmlScanner::publicIdentifier() {
   constexpr std::string_view kCharacters =
       " \r\nabcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789-'()+,./:=?;!*#@$_%";
-  const std::string_view identifier = takeQuoted();
+  std::string_view identifier;
+  if (!takeQuoted(identifier)) return false;
   const std::size_t wrong = identifier.find_first_not_of(kCharacters);
-  if (wrong != std::string_view::npos) refuse("no public identifier", identifier.data() + wrong);
+  return wrong == std::string_view::npos ||
+         refuse("no public identifier", identifier.data() + wrong);
 }
 
-void XmlScanner::skipMisc() {
-  do {
-    skipSpace();
-  } while (skipMarkup());
+bool XmlScanner::skipMisc() {
+  for (skipSpace(); looksAtMarkup(); skipSpace()) {
+    if (!skipMarkup()) return false;
+  }
+  return true;
 }
 
 bool XmlScanner::skipMarkup() {
   const char* start = at_;
+  std::string_view text;
   if (take("<!--")) {
-    takeUntil("--");
-    if (!take(">")) refuse("two hyphens in a comment");
-    return true;
+    if (!takeUntil("--", text)) return false;
+    return take(">") || refuse("two hyphens in a comment");
   }
-  if (!take("<?")) return false;
-  if (isXmlInAnyCase(takeName())) refuse("misplaced declaration", start);
-  if (!take("?>")) {
-    requireSpace();
-    takeUntil("?>");
-  }
-  return true;
+  advance(2);
+  if (!takeName(text)) return false;
+  if (isXmlInAnyCase(text)) return refuse("misplaced declaration", start);
+  return take("?>") || (requireSpace() && takeUntil("?>", text));
 }
 
 }  // namespace ironmoat::plist

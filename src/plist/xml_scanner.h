@@ -23,7 +23,7 @@ bool sameBytes(const char* a, const char* b) noexcept {
 /// moves on for good, so that all of a reader's work is linear.
 class XmlScanner {
  public:
-  explicit XmlScanner(const XmlSource& source) noexcept
+  explicit XmlScanner(XmlSource& source) noexcept
       : source_(source),
         at_(source.text().data()),
         end_(source.text().data() + source.text().size()) {}
@@ -48,6 +48,8 @@ class XmlScanner {
     at_ += Size - 1;
     return true;
   }
+  /// A comment or processing instruction begins here.
+  [[nodiscard]] bool looksAtMarkup() const noexcept { return looksAt("<?") || looksAt("<!--"); }
   /// Requires that many characters to be left.
   void advance(std::size_t count) noexcept { at_ += count; }
 
@@ -60,34 +62,36 @@ class XmlScanner {
   /// Moves on to what may end a run of plain text (see findTextStop), or to the end.
   void skipPlainText() noexcept { at_ = findTextStop(at_, end_); }
 
-  /// The text up to `mark`, and moves past both. Refuses when it never comes.
-  std::string_view takeUntil(std::string_view mark);
+  // From here on all may refuse, and are false when they have (see XmlSource).
+
+  /// The text up to `mark`, and moves past both.
+  [[nodiscard]] bool takeUntil(std::string_view mark, std::string_view& text);
   /// The value of an attribute or literal in quotes of either kind.
-  std::string_view takeQuoted();
+  [[nodiscard]] bool takeQuoted(std::string_view& value);
   /// The value in ` = "..."`.
-  std::string_view takeAttributeValue();
-  std::string_view takeName();
+  [[nodiscard]] bool takeAttributeValue(std::string_view& value);
+  [[nodiscard]] bool takeName(std::string_view& name);
 
   /// All that may stand before the root: declaration, DOCTYPE, white space and markup.
-  void skipProlog();
+  [[nodiscard]] bool skipProlog();
   /// White space, comments and processing instructions.
-  void skipMisc();
-  /// Moves past a comment or processing instruction, if one is here.
-  bool skipMarkup();
+  [[nodiscard]] bool skipMisc();
+  /// Requires looksAtMarkup().
+  [[nodiscard]] bool skipMarkup();
 
-  /// Throws `malformed` for the place here, or "unexpected end" there.
-  [[noreturn]] void refuse(const char* reason) const { refuse(reason, at_); }
-  [[noreturn]] void refuse(const char* reason, const char* at) const {
-    source_.refuse(at == end_ ? "unexpected end" : reason, at);
+  /// Refuses the message as `malformed` for the place here, or for its "unexpected end" there.
+  [[nodiscard]] bool refuse(const char* reason) { return refuse(reason, at_); }
+  [[nodiscard]] bool refuse(const char* reason, const char* at) {
+    return source_.refuse(at == end_ ? "unexpected end" : reason, at);
   }
 
  private:
-  void declaration();
-  void doctype();
-  void publicIdentifier();
-  void requireSpace();
+  [[nodiscard]] bool declaration();
+  [[nodiscard]] bool doctype();
+  [[nodiscard]] bool publicIdentifier();
+  [[nodiscard]] bool requireSpace();
 
-  const XmlSource& source_;
+  XmlSource& source_;
   const char* at_;
   const char* end_;
 };

@@ -31,18 +31,18 @@ bool equalsIgnoringCase(std::string_view text, std::string_view word) noexcept {
 
 }  // namespace
 
-XmlSource::XmlSource(const Data& message, Characters characters)
-    : message_(message), block_(shared(message.slice().block())) {
-  const std::string_view bytes = message.view();
+bool XmlSource::open(Characters characters) {
+  block_ = shared(message_.slice().block());
+  const std::string_view bytes = message_.view();
   if (bytes.starts_with("\xFE\xFF") || bytes.starts_with("\xFF\xFE")) {
     utf16_ = true;
-    transcodeUtf16(bytes.starts_with("\xFE\xFF"));
+    if (!transcodeUtf16(bytes.starts_with("\xFE\xFF"))) return false;
   } else {
     text_ = bytes.starts_with(kUtf8Mark) ? bytes.substr(kUtf8Mark.size()) : bytes;
   }
-  if (characters == Characters::known) return;
+  if (characters == Characters::known) return true;
   const std::size_t valid = xmlTextPrefix(text_);
-  if (valid != text_.size()) refuse("no character of xml", text_.data() + valid);
+  return valid == text_.size() || refuse("no character of xml", text_.data() + valid);
 }
 
 std::uint32_t XmlSource::utf16Unit(std::size_t index) const noexcept {
@@ -52,10 +52,10 @@ std::uint32_t XmlSource::utf16Unit(std::size_t index) const noexcept {
   return bigEndian_ ? (byte(0) << 8) | byte(1) : byte(0) | (byte(1) << 8);
 }
 
-void XmlSource::transcodeUtf16(bool bigEndian) {
+bool XmlSource::transcodeUtf16(bool bigEndian) {
   bigEndian_ = bigEndian;
   const std::size_t units = (message_.size() - kUtf16MarkSize) / 2;
-  if (message_.size() % 2 != 0) throw malformed("half a character", message_.size() - 1);
+  if (message_.size() % 2 != 0) return refuse(malformed("half a character", message_.size() - 1));
   BlockBuilder utf8(sharing());
   for (std::size_t at = 0; at < units;) {
     // In pieces, so that room for the worst case is never made for the whole message.
@@ -74,7 +74,7 @@ void XmlSource::transcodeUtf16(bool bigEndian) {
       if (isHighSurrogate(c) && at < units && isLowSurrogate(utf16Unit(at))) {
         c = 0x10000 + ((c & 0x3FF) << 10) + (utf16Unit(at++) & 0x3FF);
       } else if (isHighSurrogate(c) || isLowSurrogate(c)) {
-        throw malformed("half a surrogate pair", kUtf16MarkSize + 2 * first);
+        return refuse(malformed("half a surrogate pair", kUtf16MarkSize + 2 * first));
       }
       out += writeUtf8(c, out);
     }
@@ -82,15 +82,17 @@ void XmlSource::transcodeUtf16(bool bigEndian) {
   }
   block_ = utf8.finish();
   if (block_) text_ = {block_->bytes(), block_->size()};
+  return true;
 }
 
-void XmlSource::checkEncoding(std::string_view name, const char* at) const {
+bool XmlSource::checkEncoding(std::string_view name, const char* at) {
   const bool utf16 = equalsIgnoringCase(name, "UTF-16");
   const bool ascii = equalsIgnoringCase(name, "US-ASCII");
-  if (!utf16 && !ascii && !equalsIgnoringCase(name, "UTF-8")) refuse("unknown encoding", at);
-  if (utf16 != utf16_) refuse("not in the encoding that it declares", at);
+  if (!utf16 && !ascii && !equalsIgnoringCase(name, "UTF-8")) return refuse("unknown encoding", at);
+  if (utf16 != utf16_) return refuse("not in the encoding that it declares", at);
   const std::size_t plain = ascii ? asciiPrefix(message_.view()) : message_.size();
-  if (plain != message_.size()) throw malformed("not in the encoding that it declares", plain);
+  return plain == message_.size() ||
+         refuse(malformed("not in the encoding that it declares", plain));
 }
 
 std::uint64_t XmlSource::offsetInMessage(const char* at) const noexcept {
@@ -106,8 +108,13 @@ std::uint64_t XmlSource::offsetInMessage(const char* at) const noexcept {
   return kUtf16MarkSize + 2 * unit;
 }
 
-void XmlSource::refuse(const char* reason, const char* at) const {
-  throw malformed(reason, offsetInMessage(at));
+bool XmlSource::refuse(const char* reason, const char* at) {
+  return refuse(malformed(reason, offsetInMessage(at)));
+}
+
+bool XmlSource::refuse(DecodingError error) {
+  refusal_.emplace(std::move(error));
+  return false;
 }
 
 }  // namespace ironmoat::plist

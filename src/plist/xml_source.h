@@ -2,21 +2,31 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 #include <string_view>
+#include <utility>
 
+#include "ironmoat/errors.h"
 #include "ironmoat/values.h"
 
 namespace ironmoat::plist {
 
 /// A message as XML text: known to be UTF-8 and to hold only XML characters. A message in UTF-16 is
 /// transcoded into a block of its own; any other is its own text.
+///
+/// Nothing is thrown for a bad message. Where the reader refuses it, it says `return refuse(...)`,
+/// which keeps the one error here and is false; every function on the way back returns false at
+/// once, so that nothing goes on with what was not proven.
 class XmlSource {
  public:
   enum class Characters { unknown, known };
 
-  /// Throws DecodingError for bytes that are no such text; `known` ones have been such a source
-  /// before, which is not checked again. Keeps a reference to `message`.
-  explicit XmlSource(const Data& message, Characters characters = Characters::unknown);
+  /// Keeps a reference to `message`, and has no text until it is opened.
+  explicit XmlSource(const Data& message) noexcept : message_(message) {}
+
+  /// Refuses bytes that are no such text; `known` ones have been such a source before, which is not
+  /// checked again.
+  [[nodiscard]] bool open(Characters characters = Characters::unknown);
 
   /// The message is UTF-16; its text here is UTF-8 all the same.
   [[nodiscard]] bool isUtf16() const noexcept { return utf16_; }
@@ -32,15 +42,18 @@ class XmlSource {
   }
 
   /// Refuses the message when it is not in the encoding that its declaration names; `at` is where.
-  void checkEncoding(std::string_view name, const char* at) const;
+  [[nodiscard]] bool checkEncoding(std::string_view name, const char* at);
 
   /// The place `at` of the text, as an offset into the message.
   [[nodiscard]] std::uint64_t offsetInMessage(const char* at) const noexcept;
-  /// Throws `malformed` for that place.
-  [[noreturn]] void refuse(const char* reason, const char* at) const;
+  /// Refuses the message as `malformed` for that place.
+  [[nodiscard, gnu::cold, gnu::noinline]] bool refuse(const char* reason, const char* at);
+  [[nodiscard, gnu::cold, gnu::noinline]] bool refuse(DecodingError error);
+  /// Requires that the message was refused.
+  [[nodiscard]] DecodingError takeRefusal() { return std::move(refusal_).value(); }
 
  private:
-  void transcodeUtf16(bool bigEndian);
+  [[nodiscard]] bool transcodeUtf16(bool bigEndian);
   [[nodiscard]] std::uint32_t utf16Unit(std::size_t index) const noexcept;
 
   const Data& message_;
@@ -48,6 +61,7 @@ class XmlSource {
   std::string_view text_;
   bool utf16_ = false;
   bool bigEndian_ = false;
+  std::optional<DecodingError> refusal_;
 };
 
 }  // namespace ironmoat::plist

@@ -19,7 +19,7 @@ void appendFoldingLineEnds(std::string_view text, BlockBuilder& out) {
 }
 
 /// After "&#".
-char32_t takeCharacterNumber(XmlScanner& in) {
+[[nodiscard]] bool takeCharacterNumber(XmlScanner& in, char32_t& character) {
   const std::uint32_t base = in.take("x") ? 16 : 10;
   std::uint32_t number = 0;
   bool any = false;
@@ -34,35 +34,42 @@ char32_t takeCharacterNumber(XmlScanner& in) {
     if (digit >= base) break;
     if (number <= 0x10FFFF) number = number * base + digit;  // past it, it stays past it
   }
-  if (!any) in.refuse("bad reference");
-  return number;
+  character = number;
+  return any || in.refuse("bad reference");
 }
 
-void takeReference(XmlScanner& in, BlockBuilder& out) {
+[[nodiscard]] bool takeReference(XmlScanner& in, BlockBuilder& out) {
+  const auto standsFor = [&out](char c) {
+    out.push(c);
+    return true;
+  };
   const char* start = in.at();
-  if (in.take("&lt;")) return out.push('<');
-  if (in.take("&gt;")) return out.push('>');
-  if (in.take("&amp;")) return out.push('&');
-  if (in.take("&quot;")) return out.push('"');
-  if (in.take("&apos;")) return out.push('\'');
-  if (!in.take("&#")) in.refuse("unknown entity");
-  const char32_t character = takeCharacterNumber(in);
-  if (!in.take(";")) in.refuse("bad reference");
-  if (!isXmlCharacter(character)) in.refuse("no character of xml", start);
+  if (in.take("&lt;")) return standsFor('<');
+  if (in.take("&gt;")) return standsFor('>');
+  if (in.take("&amp;")) return standsFor('&');
+  if (in.take("&quot;")) return standsFor('"');
+  if (in.take("&apos;")) return standsFor('\'');
+  if (!in.take("&#")) return in.refuse("unknown entity");
+  char32_t character = 0;
+  if (!takeCharacterNumber(in, character)) return false;
+  if (!in.take(";")) return in.refuse("bad reference");
+  if (!isXmlCharacter(character)) return in.refuse("no character of xml", start);
   char utf8[4];
   out.append({utf8, writeUtf8(character, utf8)});
+  return true;
 }
 
 }  // namespace
 
-void skipCharacterData(XmlScanner& in) {
+bool skipCharacterData(XmlScanner& in) {
   for (in.skipPlainText(); in.peek() == ']'; in.skipPlainText()) {
-    if (in.looksAt("]]>")) in.refuse("end of cdata outside of any");
+    if (in.looksAt("]]>")) return in.refuse("end of cdata outside of any");
     in.advance(1);
   }
+  return true;
 }
 
-void transformText(XmlScanner& in, const char* start, BlockBuilder& out) {
+bool transformText(XmlScanner& in, const char* start, BlockBuilder& out) {
   const char* literal = start;  // what is to be appended as it is
   for (;;) {
     out.append({literal, static_cast<std::size_t>(in.at() - literal)});
@@ -70,16 +77,20 @@ void transformText(XmlScanner& in, const char* start, BlockBuilder& out) {
       in.take("\n");
       out.push('\n');
     } else if (in.peek() == '&') {
-      takeReference(in, out);
+      if (!takeReference(in, out)) return false;
     } else if (in.take("<![CDATA[")) {
-      appendFoldingLineEnds(in.takeUntil("]]>"), out);
+      std::string_view content;
+      if (!in.takeUntil("]]>", content)) return false;
+      appendFoldingLineEnds(content, out);
     } else if (in.looksAt("</")) {
-      return;
+      return true;
+    } else if (!in.looksAtMarkup()) {
+      return in.refuse("element inside a text element");
     } else if (!in.skipMarkup()) {
-      in.refuse("element inside a text element");
+      return false;
     }
     literal = in.at();
-    skipCharacterData(in);
+    if (!skipCharacterData(in)) return false;
   }
 }
 

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <optional>
 #include <string_view>
 
 #include "plist/xml_scanner.h"
@@ -7,24 +8,27 @@
 
 namespace ironmoat::plist {
 
+// All are false when they have refused the message (see XmlSource).
+
 /// Moves on to a '<', '&' or CR, or to the end.
-void skipCharacterData(XmlScanner& in);
+[[nodiscard]] bool skipCharacterData(XmlScanner& in);
 
 /// Appends the content of a text element as it is to be read, from `start` to its end tag, with
 /// references and CDATA resolved, line ends folded, comments and instructions left out.
-void transformText(XmlScanner& in, const char* start, BlockBuilder& out);
+[[nodiscard]] bool transformText(XmlScanner& in, const char* start, BlockBuilder& out);
 
-/// Moves over the content of a text element, to its end tag. Returns true when the message has that
-/// content literally, in `literal`; otherwise it is appended to `out`.
-[[nodiscard]] inline bool takeText(XmlScanner& in, std::string_view& literal, BlockBuilder& out) {
+/// Moves over the content of a text element, to its end tag. Where the message has that content
+/// literally it is `literal`; otherwise that is none, and it is appended to `out`.
+[[nodiscard]] inline bool takeText(XmlScanner& in, std::optional<std::string_view>& literal,
+                                   BlockBuilder& out) {
   const char* const start = in.at();
   in.skipPlainText();
-  if (in.peek() == ']') skipCharacterData(in);
+  if (in.peek() == ']' && !skipCharacterData(in)) return false;
   if (!in.looksAt("</")) {
-    transformText(in, start, out);
-    return false;
+    literal.reset();
+    return transformText(in, start, out);
   }
-  literal = {start, static_cast<std::size_t>(in.at() - start)};
+  literal.emplace(start, static_cast<std::size_t>(in.at() - start));
   return true;
 }
 
