@@ -1,6 +1,6 @@
 // growth SMALLEST LARGEST [time]: what unpacking costs against the message's size, for each shape
-// and sample in each form, as JSON lines: bytes of the message, allocations, peak bytes of heap
-// and, when asked, the least CPU nanoseconds of several runs.
+// and sample in each form and what is refused at its end, as JSON lines: bytes of the message,
+// allocations, peak bytes of heap and, when asked, the least CPU nanoseconds of several runs.
 //
 // Every unpacking to be counted goes through `measured`, once, in the order of the lines: under
 // callgrind with --toggle-collect and --dump-after on it, instructions come out in the same order.
@@ -19,8 +19,8 @@
 #include "unpackers/corvel_payload_unpacker.h"
 
 extern "C" [[gnu::noinline]] void measured(const ironmoat::Data& message) {
-  const auto record = ironmoat::VeskCorvelPayloadUnpacker().unpack(message);
-  asm volatile("" : : "r"(&record) : "memory");
+  const auto unpacked = ironmoat::VeskCorvelPayloadUnpacker().unpack(message);
+  asm volatile("" : : "r"(&unpacked) : "memory");
 }
 
 namespace ironmoat::bench {
@@ -70,11 +70,21 @@ void report(std::string_view kind, std::string_view name, plist::Form form, cons
 
 void run(std::size_t smallest, std::size_t largest, bool timed) {
   constexpr plist::Form kForms[] = {plist::Form::binary, plist::Form::xml};
-  static_cast<void>(VeskCorvelPayloadUnpacker().unpack(  // what happens once in a process
-      messageOf(sample("full").record, plist::Form::binary)));
+  const auto once = [](const Data& message) {  // what happens once in a process
+    static_cast<void>(VeskCorvelPayloadUnpacker().unpack(message));
+  };
+  const VeskCorvelProtocolPayload& full = sample("full").record;
+  for (const plist::Form form : kForms) {
+    once(messageOf(full, form));
+    once(messageOf(WrongAtLast{full}, form));
+    once(brokenAtLast(messageOf(full, form), form));
+  }
   for (const Sample& each : samples()) {
     for (const plist::Form form : kForms) {
-      report("sample", each.name, form, messageOf(each.record, form), timed);
+      const Data message = messageOf(each.record, form);
+      report("sample", each.name, form, message, timed);
+      report("wrong", each.name, form, messageOf(WrongAtLast{each.record}, form), timed);
+      report("broken", each.name, form, brokenAtLast(message, form), timed);
     }
   }
   for (const Shape& shape : shapes()) {

@@ -133,4 +133,16 @@ Data inOneThreadBlock(std::string_view bytes) {
   return Data(detail::Slice::copyOf(bytes, Sharing::oneThread));
 }
 
+Data brokenAtLast(const Data& message, plist::Form form) {
+  std::string bytes(message.view());
+  if (form == plist::Form::xml) {
+    bytes.at(bytes.rfind('>') - 1) = '-';
+  } else {
+    constexpr std::size_t kTrailer = 32;  // its byte 6: the size of an offset, the last before it
+    const std::size_t trailer = bytes.size() - kTrailer;
+    bytes.at(trailer - static_cast<unsigned char>(bytes.at(trailer + 6))) = '\xFF';
+  }
+  return inOneThreadBlock(bytes);
+}
+
 }  // namespace ironmoat::bench

@@ -33,7 +33,8 @@ Data messageOf(const R& record, plist::Form form) {
   return inOneThreadBlock(plist::PropertyListEncoder(form).encode(record).view());
 }
 
-/// The record with a last field of the wrong kind: all the work is done by then.
+/// The record with a last field of the wrong kind: the document is read by then, and the other
+/// fields are decoded.
 struct WrongAtLast {
   const VeskCorvelProtocolPayload& record;
   void encode(plist::Encoder& encoder) const {
@@ -44,6 +45,10 @@ struct WrongAtLast {
     encoder.builder().string("wrong");
   }
 };
+
+/// The message with its last object out of bounds or its last end tag misspelt: all else is read by
+/// then.
+Data brokenAtLast(const Data& message, plist::Form form);
 
 constexpr std::string_view nameOf(plist::Form form) {
   return form == plist::Form::binary ? "binary" : "xml";

@@ -1,8 +1,9 @@
 #!/usr/bin/env python3
 """quick.py GROWTH-PROGRAM: has unpacking become worse in a way that shows on any machine?
 
-Counts allocations and, where there is valgrind, instructions; looks at no clock. Fails when a message needs
-more than it is granted below, when instructions or memory grow faster than the message, or when
+Counts allocations and, where there is valgrind, instructions; looks at no clock. Fails when a
+message needs more than it is granted below, when refusing it at its end takes more than twice the
+instructions of accepting it, when instructions or memory grow faster than the message, or when
 allocations come with the number of texts or records.
 """
 
@@ -32,6 +33,7 @@ GRANTED = {
     ("unicode", "binary"): (2, 14_500),
     ("unicode", "xml"): (1, 22_800),
 }
+REFUSED_AT_MOST = 2.0  # against accepted
 SIZES = (4096, 262144)
 # Buffers double: so many allocations for each doubling of a message, and these to begin with.
 PER_DOUBLING, AT_FIRST = 6, 12
@@ -62,9 +64,14 @@ def count(program):
 
 
 def faults(lines):
+    accepted = {(line["name"], line["form"]): line for line in lines if line["kind"] == "sample"}
     for line in lines:
-        if line["kind"] != "sample":
-            continue
+        if line["kind"] in ("wrong", "broken") and "instructions" in line:
+            ratio = line["instructions"] / accepted[line["name"], line["form"]]["instructions"]
+            if ratio > REFUSED_AT_MOST:
+                yield (f"{line['name']}, {line['form']}, {line['kind']} at its end: "
+                       f"{line['instructions']:,} instructions, {ratio:.2f} times what accepting takes")
+    for line in accepted.values():
         allocations, instructions = GRANTED[line["name"], line["form"]]
         for what, most in (("allocations", allocations), ("instructions", instructions)):
             if line.get(what, 0) > most:
@@ -88,7 +95,7 @@ def faults(lines):
 def main():
     lines = count(sys.argv[1])
     for line in lines:
-        print(f"{line['name']:<14}{line['form']:<8}{line['bytes']:>10,} bytes"
+        print(f"{line['kind']:<7}{line['name']:<14}{line['form']:<8}{line['bytes']:>10,} bytes"
               f"{line.get('instructions', 0):>12,} instructions{line['allocations']:>6} allocations"
               f"{line['peak']:>12,} bytes of heap")
     found = list(faults(lines))

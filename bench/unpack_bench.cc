@@ -8,7 +8,6 @@
 #include <vector>
 
 #include "confinement/confinement.h"
-#include "ironmoat/errors.h"
 #include "messages.h"
 #include "protobuf_peer.h"
 #include "unpackers/corvel_payload_unpacker.h"
@@ -26,30 +25,26 @@ void add(std::string_view message, std::string_view what, Function once, std::si
   });
 }
 
-bool isRefused(const Data& message) {
-  try {
-    return VeskCorvelPayloadUnpacker().unpack(message).command == 0;
-  } catch (const DecodingError&) {
-    return true;
-  }
-}
-
 void addForm(const Sample& sample, plist::Form form) {
   const Data message = messageOf(sample.record, form);
   const std::string prefix = std::string(nameOf(form)) + "/";
   const std::size_t size = message.size();
   add(
       sample.name, prefix + "unpack",
-      [message] { return VeskCorvelPayloadUnpacker().unpack(message).command; }, size);
+      [message] { return VeskCorvelPayloadUnpacker().unpack(message)->command; }, size);
   add(
       sample.name, prefix + "copy_and_unpack",
       [bytes = std::string(message.view())] {
-        return VeskCorvelPayloadUnpacker().unpack(inOneThreadBlock(bytes)).command;
+        return VeskCorvelPayloadUnpacker().unpack(inOneThreadBlock(bytes))->command;
       },
       size);
-  const Data wrong = messageOf(WrongAtLast{sample.record}, form);
-  add(
-      sample.name, prefix + "refused", [wrong] { return isRefused(wrong); }, wrong.size());
+  const auto addRefused = [&](const char* what, const Data& bad) {
+    add(
+        sample.name, prefix + what,
+        [bad] { return VeskCorvelPayloadUnpacker().unpack(bad).refusal().kind(); }, bad.size());
+  };
+  addRefused("wrong", messageOf(WrongAtLast{sample.record}, form));
+  addRefused("broken", brokenAtLast(message, form));
   add(
       sample.name, prefix + "memcpy",
       [bytes = std::string(message.view()), to = std::vector<char>(size)]() mutable {
