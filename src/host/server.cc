@@ -50,9 +50,6 @@ void IronmoatServer::answer(const Data& request, BlockBuilder& reply) const {
   } catch (const std::bad_alloc&) {
     reply.truncate(start);
     throw;
-  } catch (const DecodingError& error) {
-    reply.truncate(start);
-    frames::appendRefusal(reply, id, error);
   } catch (const frames::FrameError& error) {
     reply.truncate(start);
     frames::appendSentence(reply, id, Status::notServed, error.what());

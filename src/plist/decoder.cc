@@ -38,24 +38,23 @@ std::optional<std::uint64_t> Decoder::offset() const {
   return placeOf(node_, *decoding_.message);
 }
 
-bool Decoder::refuse(DecodingError::Kind kind, const std::string& sentence) const {
+void Decoder::refuse(DecodingError::Kind kind, const std::string& sentence) const {
   decoding_.refusal.emplace(kind, path(), sentence, offset());
-  return false;
 }
 
-bool Decoder::refuseMismatch(Kind expected) const {
+void Decoder::refuseMismatch(Kind expected) const {
   std::string sentence;
   sentence.reserve(40);  // one allocation, not two
   sentence.append("expected ").append(nameOf(expected));
   sentence.append(", found ").append(nameOf(node().kind));
-  return refuse(DecodingError::Kind::typeMismatch, sentence);
+  refuse(DecodingError::Kind::typeMismatch, sentence);
 }
 
-bool Decoder::refuseOutOfRange() const {
-  return refuse(DecodingError::Kind::outOfRange, "integer does not fit in 64 bits with a sign");
+void Decoder::refuseOutOfRange() const {
+  refuse(DecodingError::Kind::outOfRange, "integer does not fit in 64 bits with a sign");
 }
 
-bool Decoder::refuseMissing(const std::string_view& key) const {
+void Decoder::refuseMissing(const std::string_view& key) const {
   std::string sentence("required key is missing");
   const auto keys = document_.keys(node());
   if (std::any_of(keys.begin(), keys.end(), [&](NodeIndex other) {
@@ -63,11 +62,11 @@ bool Decoder::refuseMissing(const std::string_view& key) const {
       })) {
     sentence += "; one that differs from it only in case is there";
   }
-  return Decoder(*this, key, node_).refuse(DecodingError::Kind::keyNotFound, sentence);
+  Decoder(*this, key, node_).refuse(DecodingError::Kind::keyNotFound, sentence);
 }
 
-bool Decoder::refuseLimit(const char* what, std::size_t limit, const char* unit) const {
-  return refuse(DecodingError::Kind::limitExceeded, what + std::to_string(limit) + unit);
+void Decoder::refuseLimit(const char* what, std::size_t limit, const char* unit) const {
+  refuse(DecodingError::Kind::limitExceeded, what + std::to_string(limit) + unit);
 }
 
 }  // namespace ironmoat::plist

@@ -61,7 +61,11 @@ class Decoder {
   [[nodiscard]] const Node& node() const noexcept { return document_.node(node_); }
 
   /// The current node is of this kind.
-  [[nodiscard]] bool expect(Kind kind) const { return node().kind == kind || refuseMismatch(kind); }
+  [[nodiscard]] bool expect(Kind kind) const {
+    if (node().kind == kind) return true;
+    refuseMismatch(kind);
+    return false;
+  }
   [[nodiscard]] bool chargeRecords(std::size_t count, std::size_t size) const {
     return charge(decoding_.budget.recordBytes, count * size,
                   "lists take more memory than the limit of ", limits::recordBytes, " bytes");
@@ -77,20 +81,22 @@ class Decoder {
                   " entries");
   }
 
-  // Each returns false.
-  [[gnu::cold]] bool refuseMismatch(Kind expected) const;
-  [[gnu::cold]] bool refuseOutOfRange() const;
-  [[gnu::cold]] bool refuseMissing(const std::string_view& key) const;
+  [[gnu::cold]] void refuseMismatch(Kind expected) const;
+  [[gnu::cold]] void refuseOutOfRange() const;
+  [[gnu::cold]] void refuseMissing(const std::string_view& key) const;
 
  private:
   bool charge(std::size_t& left, std::size_t amount, const char* what, std::size_t limit,
               const char* unit) const {
-    if (amount > left) return refuseLimit(what, limit, unit);
+    if (amount > left) {
+      refuseLimit(what, limit, unit);
+      return false;
+    }
     left -= amount;
     return true;
   }
-  [[gnu::cold]] bool refuseLimit(const char* what, std::size_t limit, const char* unit) const;
-  bool refuse(DecodingError::Kind kind, const std::string& sentence) const;
+  [[gnu::cold]] void refuseLimit(const char* what, std::size_t limit, const char* unit) const;
+  void refuse(DecodingError::Kind kind, const std::string& sentence) const;
   [[nodiscard]] std::string path() const;
   [[nodiscard]] std::optional<std::uint64_t> offset() const;
 
@@ -115,8 +121,9 @@ template <Scalar T>
     return decoder.expect(std::same_as<T, String> ? Kind::string : Kind::data) &&
            decoder.chargeDelivered(decoder.node().count);
   } else {
-    if (decoder.node().kind == Kind::unsignedInteger) return decoder.refuseOutOfRange();
-    return decoder.expect(Kind::integer);
+    if (decoder.node().kind != Kind::unsignedInteger) return decoder.expect(Kind::integer);
+    decoder.refuseOutOfRange();
+    return false;
   }
 }
 /// The value; requires that it was admitted.
@@ -195,8 +202,11 @@ class KeyedDecodingContainer {
   /// have been seen, and be absent so far.
   template <class T>
   [[nodiscard]] bool decodeField(Keys key, T& value) const {
-    if (!contains(key)) return decoder_.refuseMissing(key.stringValue());
-    return decodeInto(Decoder(decoder_, key.stringValue(), values_[key.index()]), value);
+    if (contains(key)) {
+      return decodeInto(Decoder(decoder_, key.stringValue(), values_[key.index()]), value);
+    }
+    decoder_.refuseMissing(key.stringValue());
+    return false;
   }
   template <class T>
   [[nodiscard]] bool decodeField(Keys key, Optional<T>& value) const {
