@@ -81,6 +81,10 @@ struct Output : OutputArguments {
   static Output with(Arguments arguments);
 };
 
+#ifdef CASE_overlooked_refusal
+void decode(Example& wire, const plist::Decoder& decoder) { wire.decode(decoder); }
+#endif
+
 Output convert(const Example& wire) { return Output::with(argumentsFrom<Output>(wire)); }
 
 struct Unpacker {
