@@ -3,7 +3,6 @@
 #include <algorithm>
 
 #include "plist/place.h"
-#include "plist/scratch_array.h"
 
 namespace ironmoat::plist {
 
@@ -19,17 +18,18 @@ bool equalsIgnoringCase(std::string_view a, std::string_view b) noexcept {
 }  // namespace
 
 std::string Decoder::path() const {
-  ScratchArray<const Decoder*, 16> way;
-  for (const Decoder* at = this; at->parent_ != nullptr; at = at->parent_) way.push(at);
-  std::string path;
-  for (std::size_t i = way.size(); i-- > 0;) {
-    if (way[i]->key_ == nullptr) {
-      path.append("[").append(std::to_string(way[i]->index_)).append("]");
-      continue;
+  std::string path;  // from its end, the way that is known
+  for (const Decoder* at = this; at->parent_ != nullptr; at = at->parent_) {
+    if (at->key_ != nullptr) {
+      path.append(at->key_->rbegin(), at->key_->rend());
+      if (at->parent_->parent_ != nullptr) path += '.';
+    } else {
+      const std::string index = std::to_string(at->index_);
+      path += ']';
+      path.append(index.rbegin(), index.rend()) += '[';
     }
-    if (!path.empty()) path += ".";
-    path += *way[i]->key_;
   }
+  std::reverse(path.begin(), path.end());
   return path;
 }
 
