@@ -8,11 +8,14 @@
 
 #include <atomic>
 #include <cerrno>
+#include <exception>
 #include <filesystem>
+#include <memory>
 #include <string>
 #include <thread>
 #include <vector>
 
+#include "client/connection.h"
 #include "ironmoat/command_response.h"
 #include "ironmoat/limits.h"
 #include "support/leaves_nothing.h"
@@ -199,6 +202,23 @@ TEST_F(ClientTest, OutcomesComeWhoeverWaitsForThem) {
   client.reset();
   for (std::size_t t = 4; t < threads.size(); ++t) threads[t].join();
   expectEchoes(unheard);
+}
+
+/// What submits and then waits can be held up in between, for longer than the deadline.
+TEST_F(ClientTest, WhoComesLateToWaitIsHeard) {
+  struct Plain final : client::Request {
+    Plain() : Request(VeskCommandResponse::schemaName, Data("echo 1")) {}
+    void give(const frames::Reply& /*reply*/) override {}
+    void giveError(std::exception_ptr /*error*/) noexcept override {}
+  };
+  client::Connection connection(fake(20ms));
+  for (const auto late : {0ms, 40ms}) {
+    const auto request = std::make_shared<Plain>();
+    std::this_thread::sleep_for(late);  // the client's thread falls asleep
+    connection.submit(request, client::Connection::Then::waits);
+    std::this_thread::sleep_for(late);
+    EXPECT_TRUE(connection.await(*request, std::chrono::steady_clock::now() + 10s));
+  }
 }
 
 TEST_F(ClientTest, WhatCannotServeIsUnavailable) {

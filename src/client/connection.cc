@@ -100,6 +100,7 @@ bool Connection::await(Request& request, TimePoint until) {
     if (callerMayRead(now)) {
       readUntilDone(lock, request, until);
     } else if (now < until) {
+      if (reader_ == Reader::nobody && waiting_) wake();  // it has become overdue on the way here
       sleep(lock, request, until);
     }
     if (!request.isDone() && Clock::now() >= until) {
