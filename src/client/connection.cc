@@ -206,9 +206,15 @@ void Connection::readUntilDone(Lock& lock, const Request& request, TimePoint unt
     lock.unlock();
     Came came = Came::nothing;
     bool ended = false;
-    callersWait_([&] { return (came = readSome()) != Came::nothing; },
-                 [&] { ended = waitForReplies(soonest); });
-    if (came == Came::nothing && !ended) came = readSome();
+    const auto look = [&] { return (came = readSome()) != Came::nothing; };
+    if (Clock::now() >= soonest) {
+      look();
+    } else {
+      callersWait_(look, [&] {
+        ended = waitForReplies(soonest);
+        look();  // also when it has ended: it may have answered after the socket was looked at
+      });
+    }
     lock.lock();
     callersTurn_ = true;
     if (came != Came::nothing || ended) trouble_ = take(lock, came);

@@ -86,13 +86,12 @@ void Connection::turn(Lock& lock) {
     return;
   }
   const bool readable = (socket.revents & POLLIN) != 0;
-  if (readable) {
+  const bool over = (socket.revents & (POLLHUP | POLLERR)) != 0 || ended.revents != 0;
+  if (readable || over || unwritable_) {
     lock.unlock();
-    const Came came = readSome();
+    const Came came = readSome();  // also when it has ended, as in `readUntilDone`
     lock.lock();
-    if (came != Came::nothing) trouble_ = take(lock, came);
-  } else if (socket.revents & (POLLHUP | POLLERR) || ended.revents != 0 || unwritable_) {
-    trouble_ = "";
+    if (came != Came::nothing || !readable) trouble_ = take(lock, came);
   }
   if (trouble_) return;
   const auto now = Clock::now();
