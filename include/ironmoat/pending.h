@@ -38,19 +38,21 @@ class IRONMOAT_API Pending {
   /// `ready` or, when the time is up, `timeout`; with no time at all it looks what has come.
   template <class Rep, class Period>
   std::future_status wait_for(const std::chrono::duration<Rep, Period>& time) const {
-    const auto now = Clock::now();
-    const auto most = Clock::time_point::max() - now;
-    return waitUntil(time < most ? now + std::chrono::ceil<Clock::duration>(time)
-                                 : Clock::time_point::max());
+    const Seconds seconds = time;
+    if (seconds >= std::chrono::years(100)) return waitUntil(Clock::time_point::max());
+    if (seconds <= Seconds::zero()) return waitUntil(Clock::time_point());
+    return waitUntil(Clock::now() + std::chrono::ceil<Clock::duration>(seconds));
   }
   template <class Time>
   std::future_status wait_until(const Time& time) const {
-    return wait_for(time - Time::clock::now());
+    return wait_for(Seconds(time.time_since_epoch()) -
+                    Seconds(Time::clock::now().time_since_epoch()));
   }
 
  private:
   friend class Client;
   using Clock = std::chrono::steady_clock;
+  using Seconds = std::chrono::duration<long double>;  // no time overflows in it
 
   Pending(std::shared_ptr<client::Request> request, std::shared_ptr<client::Connection> connection)
       : request_(std::move(request)), connection_(std::move(connection)) {}

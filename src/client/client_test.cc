@@ -175,8 +175,15 @@ TEST_F(ClientTest, OutcomesComeWhoeverWaitsForThem) {
   std::vector<Pending> waiting;
   auto client = std::make_unique<Client>(all);
   std::vector<Pending> unheard = submitEchoes(*client, 50);  // beyond the room: the client reads
+  Pending first = submit(*client, "slow 10");
+  Pending second = submit(*client, "slow 10");
+  EXPECT_EQ(first.wait_for(std::chrono::hours::max()), std::future_status::ready);
+  EXPECT_EQ(second.wait_until(std::chrono::sys_seconds::max()), std::future_status::ready);
   Pending slow = submit(*client, "slow 100");
   EXPECT_EQ(slow.wait_for(1ms), std::future_status::timeout);
+  EXPECT_EQ(slow.wait_for(std::chrono::hours::min()), std::future_status::timeout);
+  EXPECT_EQ(slow.wait_until(std::chrono::system_clock::time_point::min()),
+            std::future_status::timeout);
   while (slow.wait_for(0s) != std::future_status::ready) {
   }
   EXPECT_EQ(outcome(slow), "100");
