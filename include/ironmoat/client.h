@@ -22,9 +22,9 @@ namespace ironmoat {
 ///
 /// Any number of threads may use one client at once, with any number of requests in flight. The
 /// client keeps one thread, which takes none of the daemon's signals, and changes no signal's
-/// handling; a SIGCHLD comes when its process ends, and a handler that reaps it does no harm. After
-/// fork() a client that was used belongs to the parent: in the child every request fails with
-/// `unavailable`, and destroying the copy does nothing.
+/// handling; a SIGCHLD comes when its process ends, and a handler that reaps it does no harm. No
+/// call is a point of cancellation. After fork() a client that was used belongs to the parent: in
+/// the child every request fails with `unavailable`, and destroying the copy does nothing.
 class IRONMOAT_API Client {
  public:
   struct Options {

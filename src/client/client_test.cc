@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <pthread.h>
 #include <signal.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -226,6 +227,33 @@ TEST_F(ClientTest, WhoComesLateToWaitIsHeard) {
     std::this_thread::sleep_for(late);
     EXPECT_TRUE(connection.await(*request, std::chrono::steady_clock::now() + 10s));
   }
+}
+
+TEST_F(ClientTest, WhoeverIsCancelledHoldsUpNobody) {
+  Client::Options all = fake();
+  all.maxBytesInFlight = 1200;
+  Client client(all);
+  EXPECT_EQ(outcome(client, "echo 1"), "1");
+  Pending slow = submit(client, "slow 100");
+  Pending other = submit(client, "echo 2");
+  const auto cancel = [](auto call) {
+    using Call = decltype(call);
+    pthread_t thread{};
+    const auto run = [](void* argument) -> void* {
+      (*static_cast<Call*>(argument))();
+      return nullptr;
+    };
+    ASSERT_EQ(::pthread_create(&thread, nullptr, run, &call), 0);
+    std::this_thread::sleep_for(20ms);
+    ::pthread_cancel(thread);
+    ::pthread_join(thread, nullptr);
+  };
+  cancel([&] { submit(client, "echo 3"); });  // waits for room
+  slow = submit(client, "slow 100");
+  cancel([&] { slow.wait(); });  // reads
+  EXPECT_EQ(outcome(other), "2");
+  EXPECT_EQ(outcome(slow), "100");
+  EXPECT_EQ(outcome(client, "echo 4"), "4");
 }
 
 TEST_F(ClientTest, WhatCannotServeIsUnavailable) {

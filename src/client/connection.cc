@@ -1,6 +1,7 @@
 #include "client/connection.h"
 
 #include <poll.h>
+#include <pthread.h>
 #include <sys/eventfd.h>
 #include <sys/socket.h>
 #include <unistd.h>
@@ -9,6 +10,7 @@
 #include <array>
 #include <cerrno>
 #include <new>
+#include <string_view>
 #include <system_error>
 #include <utility>
 
@@ -22,13 +24,34 @@ using namespace std::chrono_literals;
 
 namespace {
 
-constexpr int kWritesInARow = 4;                 // before replies are looked at again
-constexpr std::size_t kAtOnce = 64;              // replies given out together, at most
-constexpr std::size_t kMostParts = 2 * kAtOnce;  // of a write: two for each request
+constexpr int kWritesInARow = 4;     // before replies are looked at again
+constexpr std::size_t kAtOnce = 64;  // replies given out together, at most
+constexpr std::size_t kMostParts = 2 * RequestQueue::kMostAtOnce;  // of a write
 
 std::exception_ptr unavailable(const std::string& why) {
   return std::make_exception_ptr(ServiceError(ServiceError::Kind::unavailable, why));
 }
+
+/// What the service did. Empty, as of one that has ended, when there is no memory to say it.
+std::string violation(std::string_view what, const char* how = "") noexcept {
+  try {
+    return std::string(what).append(how);
+  } catch (const std::bad_alloc&) {
+    return {};
+  }
+}
+
+/// The calling thread is not cancelled while it has a place or a turn that others wait for.
+class Uncancelled {
+ public:
+  Uncancelled() noexcept { ::pthread_setcancelstate(PTHREAD_CANCEL_DISABLE, &before_); }
+  Uncancelled(const Uncancelled&) = delete;
+  Uncancelled& operator=(const Uncancelled&) = delete;
+  ~Uncancelled() { ::pthread_setcancelstate(before_, nullptr); }
+
+ private:
+  int before_ = 0;
+};
 
 }  // namespace
 
@@ -41,6 +64,7 @@ Connection::Connection(Client::Options options)
 }
 
 void Connection::stop() noexcept {
+  const Uncancelled whole;
   {
     const Lock lock(mutex_);
     stopping_ = true;
@@ -55,6 +79,7 @@ void Connection::submit(std::shared_ptr<Request> request, Then then) {
   if (inForkedChild()) {
     return request->fail(unavailable("this client belongs to the process that forked this one"));
   }
+  const Uncancelled whole;
   Lock lock(mutex_);
   try {
     if (!thread_.joinable()) startThread();
@@ -94,6 +119,7 @@ bool Connection::await(Request& request, TimePoint until) {
     request.fail(unavailable("this client belongs to the process that forked this one"));
     return true;
   }
+  const Uncancelled whole;
   Lock lock(mutex_);
   while (!request.isDone()) {
     const TimePoint now = Clock::now();
@@ -133,23 +159,12 @@ void Connection::findReader() noexcept {
 }
 
 void Connection::sleep(Lock& lock, Request& request, TimePoint until) {
-  struct Registration {  // ends also when the calling thread is cancelled
-    Registration(std::vector<Request*>& among, Request& request) : all(among), sleepsFor(request) {
-      all.push_back(&request);
-      request.sleeper = &woken;
-    }
-    Registration(const Registration&) = delete;
-    Registration& operator=(const Registration&) = delete;
-    ~Registration() {
-      sleepsFor.sleeper = nullptr;
-      all.erase(std::find(all.begin(), all.end(), &sleepsFor));
-    }
-    std::vector<Request*>& all;
-    Request& sleepsFor;
-    std::condition_variable woken;
-  };
-  Registration registered(sleepers_, request);
-  registered.woken.wait_until(lock, until);
+  std::condition_variable woken;
+  sleepers_.push_back(&request);
+  request.sleeper = &woken;
+  woken.wait_until(lock, until);
+  request.sleeper = nullptr;
+  sleepers_.erase(std::find(sleepers_.begin(), sleepers_.end(), &request));
 }
 
 void Connection::startThread() {
@@ -181,24 +196,10 @@ void Connection::flush() {
   blocked_ = queue_.hasUnsent();
 }
 
-/// Leaves everything but replies that are in order to the connection's thread.
+/// Leaves everything but replies that are in order to the connection's thread. Nothing in it throws
+/// or is cancelled: whoever takes the turn gives it up.
 void Connection::readUntilDone(Lock& lock, const Request& request, TimePoint until) {
-  struct Turn {  // ends also when the calling thread is cancelled
-    Turn(Connection& of, Lock& held) : connection(of), lock(held) {
-      connection.reader_ = Reader::caller;
-    }
-    Turn(const Turn&) = delete;
-    Turn& operator=(const Turn&) = delete;
-    ~Turn() {
-      if (!lock.owns_lock()) lock.lock();
-      connection.reader_ = Reader::nobody;
-      if (connection.stopping_) connection.readerLeft_.notify_all();
-      connection.findReader();
-    }
-    Connection& connection;
-    Lock& lock;
-  };
-  const Turn turn(*this, lock);
+  reader_ = Reader::caller;
   do {
     flush();
     if (blocked_ && waiting_) wake();
@@ -220,6 +221,9 @@ void Connection::readUntilDone(Lock& lock, const Request& request, TimePoint unt
     if (came != Came::nothing || ended) trouble_ = take(lock, came);
   } while (!request.isDone() && !trouble_ && !unwritable_ && !stopping_ &&
            Clock::now() < std::min(until, queue_.expiry().value_or(TimePoint::max())));
+  reader_ = Reader::nobody;
+  if (stopping_) readerLeft_.notify_all();
+  findReader();
 }
 
 bool Connection::waitForReplies(TimePoint until) const noexcept {
@@ -246,7 +250,7 @@ Connection::Came Connection::readSome() noexcept {
 
 std::optional<std::string> Connection::take(Lock& lock, Came came) {
   if (came == Came::nothing || came == Came::end) return "";
-  std::optional<std::string> violation;
+  std::optional<std::string> wrong;
   try {
     if (came == Came::tooMuch) throw std::bad_alloc();
     if (state_ == State::greeting) {
@@ -257,17 +261,17 @@ std::optional<std::string> Connection::take(Lock& lock, Came came) {
     }
     if (state_ == State::ready) settle(lock);
     if (state_ == State::ready && assembler_->midFrame() && !queue_.owesAny()) {
-      violation = "sent bytes that nobody asked for";
+      wrong = violation("sent bytes that nobody asked for");
     }
   } catch (const frames::FrameError& broken) {
-    violation = std::string("sent a broken frame: ") + broken.what();
+    wrong = violation("sent a broken frame: ", broken.what());
   } catch (const frames::RecordError& broken) {
-    violation = std::string("sent a broken record: ") + broken.what();
+    wrong = violation("sent a broken record: ", broken.what());
   } catch (const std::bad_alloc&) {
-    violation = "sent more than there is memory for";
+    wrong = violation("sent more than there is memory for");
   }
   if (!lock.owns_lock()) lock.lock();
-  return violation;
+  return wrong;
 }
 
 std::string Connection::greet(const Data& body) {

@@ -3,7 +3,15 @@
 #include <algorithm>
 #include <utility>
 
+#include "frames/frame.h"
+#include "ironmoat/limits.h"
+
 namespace ironmoat::client {
+
+RequestQueue::RequestQueue(Clock::duration deadline) : deadline_(deadline) {
+  heads_.reserve(kMostAtOnce *
+                 (frames::kLengthBytes + frames::kMaxRequestBody - limits::messageBytes));
+}
 
 std::uint64_t RequestQueue::push(std::shared_ptr<Request> request, TimePoint now) {
   slots_.push_back({std::move(request), {}});
@@ -30,7 +38,7 @@ std::size_t RequestQueue::gather(std::span<iovec> parts) {
   heads_.truncate(0);
   std::size_t used = 0;
   std::size_t skip = sentOfNext_;
-  std::size_t room = kWindow - owedCount_;
+  std::size_t room = std::min(kMostAtOnce, kWindow - owedCount_);
   for (std::uint64_t id = next_; id < sendableEnd() && room > 0 && parts.size() - used >= 2; ++id) {
     // There is a request: what has its outcome was sent before `next_`, or is among the suspects
     // and not their front.

@@ -36,8 +36,10 @@ class RequestQueue {
   static constexpr std::size_t kWindow = 256;
 
   static constexpr std::size_t kWorthSending = 16;
+  /// That `gather` gives out, at most, in two parts each.
+  static constexpr std::size_t kMostAtOnce = 64;
 
-  explicit RequestQueue(Clock::duration deadline) : deadline_(deadline) {}
+  explicit RequestQueue(Clock::duration deadline);
 
   /// Returns its id.
   std::uint64_t push(std::shared_ptr<Request> request, TimePoint now);
@@ -46,7 +48,7 @@ class RequestQueue {
   /// A fresh process is ready: sending starts over.
   void restart(TimePoint now);
   /// Fills `parts` with what can be sent now, as for writev, and returns how many it used; they are
-  /// valid until the next call of any function here.
+  /// valid until the next call of any function here. Takes no memory: what was taken in gets out.
   std::size_t gather(std::span<iovec> parts);
   /// The first `bytes` of what `gather` gave have been sent.
   void sent(std::size_t bytes);
