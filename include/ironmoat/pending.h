@@ -35,6 +35,7 @@ class IRONMOAT_API Pending {
   /// answer could be had, std::bad_alloc.
   R get();
   void wait() const { static_cast<void>(waitUntil(Clock::time_point::max())); }
+  // NOLINTBEGIN(readability-identifier-naming): std::future's names
   /// `ready` or, when the time is up, `timeout`; with no time at all it looks what has come.
   template <class Rep, class Period>
   std::future_status wait_for(const std::chrono::duration<Rep, Period>& time) const {
@@ -48,6 +49,7 @@ class IRONMOAT_API Pending {
     return wait_for(Seconds(time.time_since_epoch()) -
                     Seconds(Time::clock::now().time_since_epoch()));
   }
+  // NOLINTEND(readability-identifier-naming)
 
  private:
   friend class Client;
