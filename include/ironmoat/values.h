@@ -42,7 +42,11 @@ class Slice {
       range_.block->retain();
     }
   }
-  Slice(Slice&& other) noexcept : range_(std::exchange(other.range_, kAbsent)) {}
+  Slice(Slice&& other) noexcept : range_(other.range_) {
+    if (range_.block != nullptr) [[unlikely]] {
+      other.range_ = kAbsent;
+    }
+  }
   Slice& operator=(Slice other) noexcept {
     std::swap(range_, other.range_);
     return *this;

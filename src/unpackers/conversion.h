@@ -56,29 +56,47 @@ using FieldNamed = decltype(pick<fieldIndex<R>(Name::name)>(
     static_cast<const Placing<std::make_index_sequence<FieldsOf<R>::Type::count>,
                               typename FieldsOf<R>::Type>*>(nullptr)));
 
+/// Whether a value that was moved from needs no destructor: a number never does; the slice of a
+/// text or of data is left absent, a list without memory; an optional one is left absent or with
+/// that.
+template <class T>
+inline constexpr bool ownsNothingOnceMovedFrom = std::is_trivially_destructible_v<T>;
+template <>
+inline constexpr bool ownsNothingOnceMovedFrom<String> = true;
+template <>
+inline constexpr bool ownsNothingOnceMovedFrom<Data> = true;
+template <class T>
+inline constexpr bool ownsNothingOnceMovedFrom<List<T>> = true;
+template <class T>
+inline constexpr bool ownsNothingOnceMovedFrom<Optional<T>> = ownsNothingOnceMovedFrom<T>;
+
 /// What argument `Argument` is made of: the converted part of its name, else the wire field of its
-/// name, which must be of exactly its type. A reference, so that the argument is made from it in
-/// place (by way of a temporary each of 150 would cost two copies).
+/// name, which must be of exactly its type. An rvalue reference, so that the argument is made from
+/// it in place (by way of a temporary each of 150 would cost two copies).
 template <class Argument, class Wire, class Converted>
-decltype(auto) argumentOf(const Wire& wire, Converted& converted) {
+auto&& argumentOf(Wire& wire, Converted& converted) noexcept {
   using Part = FieldNamed<Converted, Argument>;
+  using Same = FieldNamed<Wire, Argument>;
+  static_assert(!std::is_void_v<Same>, "no wire field has this argument's name");
+  static_assert(std::is_nothrow_move_constructible_v<typename Argument::Type>);
   if constexpr (!std::is_void_v<Part>) {
-    return std::move(Part::in(converted));  // an rvalue reference
+    return std::move(Part::in(converted));
   } else {
-    using Same = FieldNamed<Wire, Argument>;
-    static_assert(!std::is_void_v<Same>, "no wire field has this argument's name");
     static_assert(std::is_same_v<typename Same::Type, typename Argument::Type>,
                   "the wire field of this argument's name is of another type");
-    return (Same::in(wire));
+    static_assert(ownsNothingOnceMovedFrom<typename Same::Type>,
+                  "nobody destroys the wire field of this argument's name");
+    return std::move(Same::in(wire));
   }
 }
 
 }  // namespace detail
 
-/// The arguments for `Output::with`: the parts in `converted`, and every other one as `wire` has
-/// it.
+/// The arguments for `Output::with`: the parts in `converted`, and every other one moved out of the
+/// wire field of its name. By their count and names there is no other field in `wire`.
 template <class Output, class Wire, class Converted = NothingConverted>
-typename Output::Arguments argumentsFrom(const Wire& wire, Converted&& converted = {}) {
+typename Output::Arguments argumentsFrom(Wire&& wire, Converted&& converted = {}) noexcept {
+  static_assert(std::is_rvalue_reference_v<Wire&&>);
   using Arguments = typename Output::Arguments;
   return [&]<auto... Members>(FieldList<Arguments, Members...>) {
     static_assert(sizeof...(Members) == detail::FieldsOf<Wire>::Type::count,

@@ -1,6 +1,7 @@
 #include "unpackers/corvel_payload_unpacker.h"
 
 #include "records/message_payload.h"
+#include "unpackers/consumption.h"
 #include "unpackers/conversion.h"
 #include "unpackers/decode_message.h"
 #include "unpackers/header_block.h"
@@ -26,59 +27,56 @@ struct Converted {
                            &R::selfAllocTokenList, &R::pluginAllocations>;
 };
 
-DrelUserPayloadArguments convertPayload(const VeskCorvelProtocolPayload& wire);
-
-/// An absent list and an empty one both give an empty one.
-List<DrelUserPayload> convertPayloads(const Optional<List<VeskCorvelProtocolPayload>>& wire) {
-  List<DrelUserPayload> output;
-  if (!wire) return output;
-  output.reserve(wire->size());
-  for (const VeskCorvelProtocolPayload& element : *wire) {
-    output.emplace_back([&] { return convertPayload(element); });
-  }
-  return output;
+Converted convertParts(VeskCorvelProtocolPayload& wire);
+template <class Wire>
+NothingConverted convertParts(Wire&) {
+  return {};
 }
 
+/// An absent list and an empty one both give an empty one.
 template <class Output, class Wire>
-List<Output> convertRelayList(const Optional<List<Wire>>& wire) {
+List<Output> convertList(Optional<List<Wire>>& wire) {
   List<Output> output;
   if (!wire) return output;
-  output.reserve(wire->size());
-  for (const Wire& element : *wire) {
-    output.emplace_back([&] { return argumentsFrom<Output>(element); });
+  WireElements<Wire> elements(std::move(*wire));
+  output.reserve(elements.size());
+  while (!elements.done()) {
+    output.emplace_back(
+        [&] { return elements.template consumeCurrent<Output>(convertParts(elements.current())); });
   }
   return output;
 }
 
 Optional<DrelUserPayloadDeliveryContext> convertDeliveryContext(
-    const Optional<VeskCorvelProtocolDeliveryContext>& wire) {
+    Optional<VeskCorvelProtocolDeliveryContext>& wire) {
   if (!wire) return {};
-  return DrelUserPayloadDeliveryContext::with(argumentsFrom<DrelUserPayloadDeliveryContext>(*wire));
+  return DrelUserPayloadDeliveryContext::with(
+      argumentsFrom<DrelUserPayloadDeliveryContext>(std::move(*wire)));
 }
 
-/// Children before parents: the arguments of the record's own initialiser, once every record in it
-/// is made. Recurses as deep as payloads nest: at most half of limits::nestedContainers, which the
-/// reader has checked.
-DrelUserPayloadArguments convertPayload(const VeskCorvelProtocolPayload& wire) {
-  Converted converted{
-      .dstIdTokenList = convertPayloads(wire.dstIdTokenList),
-      .corvelMessageList = convertPayloads(wire.corvelMessageList),
+/// Children before parents: every record in a payload, before the arguments of its own initialiser.
+/// Recurses as deep as payloads nest: at most half of limits::nestedContainers, which the reader
+/// has checked.
+Converted convertParts(VeskCorvelProtocolPayload& wire) {
+  return {
+      .dstIdTokenList = convertList<DrelUserPayload>(wire.dstIdTokenList),
+      .corvelMessageList = convertList<DrelUserPayload>(wire.corvelMessageList),
       .httpHeaders = convertHeaderBlock(wire.httpHeaders),
       .deliveryContext = convertDeliveryContext(wire.deliveryContext),
-      .pluginRequests = convertRelayList<DrelHoplinePluginRequest>(wire.pluginRequests),
-      .allocationStatuses = convertRelayList<DrelHoplineAllocationStatus>(wire.allocationStatuses),
-      .selfAllocTokenList = convertRelayList<DrelHoplineSelfAllocToken>(wire.selfAllocTokenList),
-      .pluginAllocations = convertRelayList<DrelHoplinePluginAllocation>(wire.pluginAllocations),
+      .pluginRequests = convertList<DrelHoplinePluginRequest>(wire.pluginRequests),
+      .allocationStatuses = convertList<DrelHoplineAllocationStatus>(wire.allocationStatuses),
+      .selfAllocTokenList = convertList<DrelHoplineSelfAllocToken>(wire.selfAllocTokenList),
+      .pluginAllocations = convertList<DrelHoplinePluginAllocation>(wire.pluginAllocations),
   };
-  return argumentsFrom<DrelUserPayload>(wire, std::move(converted));
 }
 
 }  // namespace
 
 Unpacked<DrelUserPayload> VeskCorvelPayloadUnpacker::unpack(const Data& message) const {
-  VeskCorvelProtocolPayload wire;
-  if (auto refusal = decodeMessage(message, wire)) return std::move(*refusal);
-  return Unpacked<DrelUserPayload>([&] { return convertPayload(wire); });
+  WireRecord<VeskCorvelProtocolPayload> wire;
+  if (auto refusal = decodeMessage(message, wire.fields())) return std::move(*refusal);
+  return Unpacked<DrelUserPayload>(
+      [&] { return wire.consume<DrelUserPayload>(convertParts(wire.fields())); });
 }
 
 }  // namespace ironmoat

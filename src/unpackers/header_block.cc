@@ -5,9 +5,10 @@
 namespace ironmoat {
 
 Optional<DrelUserPayloadHttpHeaders> convertHeaderBlock(
-    const Optional<VeskCorvelProtocolHttpHeaders>& block) {
+    Optional<VeskCorvelProtocolHttpHeaders>& block) {
   if (!block) return {};
-  return DrelUserPayloadHttpHeaders::with(argumentsFrom<DrelUserPayloadHttpHeaders>(*block));
+  return DrelUserPayloadHttpHeaders::with(
+      argumentsFrom<DrelUserPayloadHttpHeaders>(std::move(*block)));
 }
 
 }  // namespace ironmoat

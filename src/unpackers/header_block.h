@@ -8,6 +8,6 @@ namespace ironmoat {
 /// The header block conversion, shared by the two records that carry one: absent stays absent, and
 /// a present block goes through its initialiser, also when all its fields are absent.
 Optional<DrelUserPayloadHttpHeaders> convertHeaderBlock(
-    const Optional<VeskCorvelProtocolHttpHeaders>& block);
+    Optional<VeskCorvelProtocolHttpHeaders>& block);
 
 }  // namespace ironmoat

@@ -93,14 +93,16 @@ std::string payload(int command, const std::string& entries = "") {
 }
 
 /// Payload 1 with everything nested in it, down to payloads in payloads, last things first.
+/// Wherever the host refuses, what is left unconverted holds text, and would leak if it were
+/// forgotten.
 Data tree() {
   const std::string inner = payload(21, "<key>h</key><dict>" + text("aS", "inner") + "</dict>");
   return message(
       list("qpla", {text("qpln", "pa")}) + list("qsatv", {"<key>qrip</key><data>aXA=</data>"}) +
       list("qal", {number("qri", 1), number("qri", 2), ""}) + list("qplr", {text("qpln", "pr")}) +
       "<key>Dc</key><dict>" + number("c", 3) + "</dict><key>h</key><dict/>" +
-      list("mml", {payload(31, list("dtl", {inner})), payload(32)}) +
-      list("dtl", {payload(11), payload(12)}) + payload(1));
+      list("mml", {payload(31, text("ua", "a") + list("dtl", {inner})), payload(32)}) +
+      list("dtl", {payload(11), payload(12, text("ua", "a"))}) + payload(1, text("ua", "a")));
 }
 
 class UnpackersTest : public ::testing::Test {

@@ -22,8 +22,9 @@ Unpacked<VeskCommandWebTunnelResponse> VeskCommandWebTunnelResponseUnpacker::unp
   VeskCommandWebTunnelResponseSchema wire;
   if (auto refusal = decodeMessage(message, wire)) return std::move(*refusal);
   Converted converted{.httpHeaders = convertHeaderBlock(wire.httpHeaders)};
-  return Unpacked<VeskCommandWebTunnelResponse>(
-      [&] { return argumentsFrom<VeskCommandWebTunnelResponse>(wire, std::move(converted)); });
+  return Unpacked<VeskCommandWebTunnelResponse>([&] {
+    return argumentsFrom<VeskCommandWebTunnelResponse>(std::move(wire), std::move(converted));
+  });
 }
 
 }  // namespace ironmoat

@@ -85,7 +85,7 @@ struct Output : OutputArguments {
 void decode(Example& wire, const plist::Decoder& decoder) { wire.decode(decoder); }
 #endif
 
-Output convert(const Example& wire) { return Output::with(argumentsFrom<Output>(wire)); }
+Output convert(Example&& wire) { return Output::with(argumentsFrom<Output>(std::move(wire))); }
 
 struct Unpacker {
   using MessageSchemaType = Output;
