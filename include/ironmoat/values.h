@@ -25,9 +25,9 @@ using List = std::vector<T>;
 
 namespace detail {
 
-/// A range of a Block that keeps the block alive. Absent is all zero, which is also what is left of
-/// a slice that was moved from; an empty range holds no block and is told from absence by its
-/// offset.
+/// A range of a Block that keeps the block alive. Absent is all zero; an empty range holds no block
+/// and is told from absence by its offset. What was moved from holds no block either: it is absent,
+/// or still empty.
 class Slice {
  public:
   Slice() noexcept = default;

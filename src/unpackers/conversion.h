@@ -56,9 +56,8 @@ using FieldNamed = decltype(pick<fieldIndex<R>(Name::name)>(
     static_cast<const Placing<std::make_index_sequence<FieldsOf<R>::Type::count>,
                               typename FieldsOf<R>::Type>*>(nullptr)));
 
-/// Whether a value that was moved from needs no destructor: a number never does; the slice of a
-/// text or of data is left absent, a list without memory; an optional one is left absent or with
-/// that.
+/// Whether a value that was moved from needs no destructor: a number never does; text and data are
+/// left without a block, a list without memory; an optional value is left absent or as those.
 template <class T>
 inline constexpr bool ownsNothingOnceMovedFrom = std::is_trivially_destructible_v<T>;
 template <>
