@@ -19,14 +19,6 @@ CARRIAGE_RETURNS = ["\r", "a\rb", "\r\n", "\n\r\n", "]]>\r"]
 NOT_IN_XML = ["a\0", "\x01é", "\x0b", "\x1b😀", "a\uFFFE", "\uFFFF"]
 
 
-def binary(value):
-    return plistlib.dumps(value, fmt=plistlib.FMT_BINARY, sort_keys=False)
-
-
-def xml(value):
-    return plistlib.dumps(value, fmt=plistlib.FMT_XML, sort_keys=False)
-
-
 def wrong_values(type_name, for_xml):
     """One or more of each kind other than the type's; for integers those that do not fit, too."""
     right = list if type_name.startswith(LIST_OF) else KINDS.get(type_name, dict)

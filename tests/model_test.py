@@ -11,16 +11,18 @@ import argparse
 import collections
 import json
 import os
+import pathlib
 import plistlib
 import random
 import subprocess
 import sys
 import tempfile
 
-import message_extremes
-from message_generator import Generator, binary, every_fault, xml
-from message_model import RECORDS, Model, shown
-from xml_spelling import Speller
+sys.path.append(str(pathlib.Path(__file__).resolve().parents[1] / "scripts/from_tables"))
+import message_extremes  # noqa: E402
+from message_generator import Generator, every_fault  # noqa: E402
+from message_model import RECORDS, Model, binary, shown, xml  # noqa: E402
+from xml_spelling import Speller  # noqa: E402
 
 FORMATS = {"binary": plistlib.FMT_BINARY, "xml": plistlib.FMT_XML}
 

@@ -15,11 +15,11 @@ import tempfile
 import threading
 import unittest
 
-from message_generator import binary, xml
-from message_model import RECORDS, Model
+PROJECT = pathlib.Path(__file__).resolve().parents[1]
+sys.path.append(str(PROJECT / "scripts/from_tables"))
+from message_model import RECORDS, Model, binary, xml  # noqa: E402
 
 TOOL = DUMP_TABLES = None
-PROJECT = pathlib.Path(__file__).resolve().parents[1]
 MESSAGE_BYTES = 16 << 20
 
 

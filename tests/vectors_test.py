@@ -14,11 +14,10 @@ import subprocess
 import sys
 import unittest
 
-import message_model
-
 ROOT = pathlib.Path(__file__).resolve().parents[1]
-sys.path.append(str(ROOT / "examples/python"))
+sys.path += [str(ROOT / folder) for folder in ("examples/python", "scripts/from_tables")]
 import ironmoat  # noqa: E402
+import message_model  # noqa: E402
 
 VECTORS = ROOT / "tests/vectors"
 ENTRIES = json.loads((VECTORS / "vectors.json").read_text())
@@ -55,7 +54,7 @@ class Vectors(unittest.TestCase):
     maxDiff = 2000
 
     def test_tables(self):
-        subprocess.run([sys.executable, ROOT / "tests/generated_files.py", DUMP_TABLES, "--check"],
+        subprocess.run([sys.executable, ROOT / "scripts/from_tables/generated_files.py", DUMP_TABLES, "--check"],
                        check=True)
 
     def test_tool(self):

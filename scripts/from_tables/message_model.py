@@ -6,6 +6,7 @@ Knows no field: works on the tables that dump_tables prints, and on messages as 
 
 import base64
 import json
+import plistlib
 import subprocess
 
 LIST_OF = "list of "
@@ -15,6 +16,14 @@ RECORDS = {
     "command-response": ("VeskCommandResponseSchema", "VeskCommandResponse"),
     "web-tunnel-response": ("VeskCommandWebTunnelResponseSchema", "VeskCommandWebTunnelResponse"),
 }
+
+
+def binary(value):
+    return plistlib.dumps(value, fmt=plistlib.FMT_BINARY, sort_keys=False)
+
+
+def xml(value):
+    return plistlib.dumps(value, fmt=plistlib.FMT_XML, sort_keys=False)
 
 
 class Refusal(Exception):

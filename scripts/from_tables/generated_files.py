@@ -13,7 +13,7 @@ from message_model import RECORDS, Model
 from message_vectors import Vectors
 from record_pages import Page
 
-ROOT = pathlib.Path(__file__).resolve().parents[1]
+ROOT = pathlib.Path(__file__).resolve().parents[2]
 VECTORS = ROOT / "tests/vectors"
 
 
