@@ -58,6 +58,7 @@ struct Walk {
         return;
       case Kind::string:
       case Kind::data:
+        requireInside(document.slice(node));
         bytes += node.count;
         return;
       case Kind::real:
@@ -70,6 +71,11 @@ struct Walk {
       case Kind::boolean:
         return;
     }
+  }
+  static void requireInside(const detail::Slice& text) {
+    require(text.block() == nullptr
+                ? text.length() == 0
+                : text.offset() + std::uint64_t{text.length()} <= text.block()->size());
   }
   void visitChild(plist::NodeIndex index, std::uint32_t depth) {
     const plist::Kind kind = document.node(index).kind;
