@@ -35,18 +35,14 @@ class Service:
         self.process = subprocess.Popen([program], stdin=theirs, stdout=theirs,
                                         preexec_fn=limit if address_space else None)
         theirs.close()
-        self.socket = ours
+        self.socket, self.stream = ours, ours.makefile("rb")
         self.frame()  # the hello
 
     def receive(self, count):
-        parts = []
-        while count > 0:
-            part = self.socket.recv(min(count, 1 << 22))
-            if not part:
-                raise EOFError("the service closed its connection")
-            parts.append(part)
-            count -= len(part)
-        return b"".join(parts)
+        received = self.stream.read(count)
+        if len(received) < count:
+            raise EOFError("the service closed its connection")
+        return received
 
     def frame(self):
         return self.receive(struct.unpack("<I", self.receive(4))[0])
@@ -121,18 +117,18 @@ class Run:
 
     def attack(self, group, name, messages):
         service = Service(self.options.service)
-        verdicts, longest, waited = [], 0, 0
+        outcomes = []
         try:
             for message in messages:
-                outcome, seconds, clock = service.ask(message)
-                verdicts.append(outcome)
-                longest, waited = max(longest, seconds), max(waited, clock)
+                outcomes.append(service.ask(message))
             peak = service.memory("VmHWM")
             service.end()
         except (EOFError, OSError) as error:
             service.process.kill()
-            self.check(False, f"{group}, {name}: {error} at message {len(verdicts)}")
+            self.check(False, f"{group}, {name}: {error} at message {len(outcomes)}")
             return
+        verdicts, seconds, waits = zip(*outcomes)
+        longest = max(seconds)
         self.check(not any(v.startswith("status") for v in verdicts), f"{name}: {short(verdicts)}")
         self.check(longest < self.options.seconds, f"{name}: {longest:.2f} s")
         if self.options.mebibytes:
@@ -141,54 +137,48 @@ class Run:
         self.heaviest.append((peak, verdicts[largest], messages[largest]))
         self.heaviest = sorted(self.heaviest, key=lambda heavy: -heavy[0])[:6]
         row = (group, name, f"{max(map(len, messages)):,}", short(verdicts),
-               f"{longest * 1000:.0f} ms", f"{waited * 1000:.0f} ms", f"{peak:.0f} MiB")
+               f"{longest * 1000:.0f} ms", f"{max(waits) * 1000:.0f} ms", f"{peak:.0f} MiB")
         print("| " + " | ".join(row) + " |" if self.options.table else " - ".join(row), flush=True)
+
+    def pipelined(self, service, messages):
+        """Numbers and verdicts as they come, of messages sent without waiting."""
+        def send():
+            for number, message in enumerate(messages):
+                service.send(number, message)
+        threading.Thread(target=send, daemon=True).start()
+        for _ in messages:
+            reply = service.frame()
+            yield struct.unpack("<Q", reply[:8])[0], verdict(reply)
 
     def all_at_once(self, address_space=None):
         service = Service(self.options.service, address_space)
-        rounds = self.options.rounds
-        asked = [(outcome, message) for _ in range(rounds) for _, outcome, message in self.heaviest]
-
-        def send():
-            for number, (_, message) in enumerate(asked):
-                service.send(number, message)
-        begun = time.monotonic()
-        sender = threading.Thread(target=send, daemon=True)
-        sender.start()
-        counts = collections.Counter()
-        for _ in asked:
-            reply = service.frame()
-            number = struct.unpack("<Q", reply[:8])[0]
-            outcome = verdict(reply)
+        asked = self.heaviest * self.options.rounds
+        begun, counts = time.monotonic(), collections.Counter()
+        for number, outcome in self.pipelined(service, [message for _, _, message in asked]):
             no_memory = outcome == "limitExceeded: the message takes more memory than there is"
             counts["without memory" if no_memory else outcome.partition(":")[0]] += 1
-            self.check(no_memory or outcome == asked[number][0],
-                       f"at once: {outcome}, alone: {asked[number][0]}")
+            self.check(no_memory or outcome == asked[number][1],
+                       f"at once: {outcome}, alone: {asked[number][1]}")
         peak = service.memory("VmHWM")
         service.end()
         limit = f" in {address_space >> 20} MiB of addresses" if address_space else ""
-        print(f"the {len(self.heaviest)} heaviest, {rounds} times at once{limit}: {dict(counts)}, "
+        print(f"the heaviest, {len(asked)} at once{limit}: {dict(counts)}, "
               f"{time.monotonic() - begun:.1f} s, {peak:.0f} MiB", flush=True)
 
     def refusals_leave_nothing(self, count):
         """All refused attacks in the small, over and over."""
         service = Service(self.options.service)
-        messages = []
-        for _, _, attacks in attack_messages.catalogue(1 << 16):
-            messages += [attack for attack in attacks[:20] if service.ask(attack)[0] != "record"]
+        messages = [attack for _, _, attacks in attack_messages.catalogue(1 << 16)
+                    for attack in attacks if service.ask(attack)[0] != "record"]
 
-        def refuse(count):
-            def send():
-                for number in range(count):
-                    service.send(number, messages[number % len(messages)])
-            sender = threading.Thread(target=send, daemon=True)
-            sender.start()
-            for _ in range(count):
-                self.check(verdict(service.frame()) != "record", "refused before, now a record")
+        def memory_after(count):
+            asked = (messages * (count // len(messages) + 1))[:count]
+            for _, outcome in self.pipelined(service, asked):
+                self.check(outcome != "record", "refused before, now a record")
             return service.memory("VmRSS")
         # What malloc keeps for later depends on which messages meet: that settles first.
-        before = refuse(max(count // 5, 3 * len(messages)))
-        grown = refuse(count) - before
+        before = memory_after(max(count // 5, 3 * len(messages)))
+        grown = memory_after(count) - before
         service.end()
         print(f"{count} messages refused, of {len(messages)} sorts: {before:.1f} MiB before, "
               f"{grown:+.1f} MiB after", flush=True)
