@@ -9,7 +9,7 @@
 
 #include "ironmoat/values.h"
 
-/// Records made and compared by their lists of fields alone.
+/// Records made by their lists of fields alone.
 namespace ironmoat::testing {
 
 /// Where a record's FieldList is: an output record has its own, others say it by specialising this.
@@ -100,27 +100,5 @@ class RecordGenerator : public BasicRecordGenerator<std::mt19937_64> {
   RecordGenerator(std::uint64_t seed, double presence)
       : BasicRecordGenerator(std::mt19937_64(seed), presence) {}
 };
-
-/// The way to the first field in which two records differ, or nothing.
-template <class T>
-std::string difference(const T& a, const T& b) {
-  std::string found;
-  if constexpr (Record<T>) {
-    FieldsOf<T>::List::forEach([&](auto field) {
-      if (!found.empty()) return;
-      found = difference(field.in(a), field.in(b));
-      if (!found.empty()) found = std::string(field.name) + " " + found;
-    });
-  } else if constexpr (requires { a.has_value(); }) {
-    if (a.has_value() != b.has_value()) return "presence";
-    if (a) found = difference(*a, *b);
-  } else if constexpr (requires { a.front(); }) {
-    if (a.size() != b.size()) return "length";
-    for (std::size_t i = 0; found.empty() && i < a.size(); ++i) found = difference(a[i], b[i]);
-  } else if (!(a == b)) {
-    found = "value";
-  }
-  return found;
-}
 
 }  // namespace ironmoat::testing
