@@ -42,14 +42,20 @@ void write(BlockBuilder& frames) { write({frames.bytes(), frames.size()}); }
   for (;;) ::pause();
 }
 
+void reply(std::uint64_t id, int status, std::string_view body) {
+  BlockBuilder out;
+  const std::size_t start = frames::beginReply(out, id, static_cast<frames::Status>(status));
+  out.append(body);
+  frames::endReply(out, start);
+  write(out);
+}
+
 void answer(std::uint64_t id, Int number) {
   VeskCommandResponseArguments arguments;
   arguments.command = number;
-  BlockBuilder out;
-  const std::size_t start = frames::beginReply(out, id, frames::Status::record);
-  frames::encodeRecord(VeskCommandResponse::with(std::move(arguments)), out);
-  frames::endReply(out, start);
-  write(out);
+  BlockBuilder record;
+  frames::encodeRecord(VeskCommandResponse::with(std::move(arguments)), record);
+  reply(id, 0, {record.bytes(), record.size()});
 }
 
 /// Descriptors, environment and signal state that a service should not have been given.
@@ -119,15 +125,11 @@ void serve(const frames::Request& request) {
   } else if (verb == "absurdLength") {
     write("\xff\xff\xff\xff....");
   } else if (verb == "badRecord") {
-    const std::size_t start = frames::beginReply(out, id, frames::Status::record);
-    out.append("\xff\xff\xff\xff\xff\xff\xff\xff");
-    frames::endReply(out, start);
+    reply(id, 0, "\xff\xff\xff\xff\xff\xff\xff\xff");
   } else if (verb == "badStatus") {
-    frames::endReply(out, frames::beginReply(out, id, static_cast<frames::Status>(4)));
+    reply(id, 4, "");
   } else if (verb == "badText") {
-    const std::size_t start = frames::beginReply(out, id, frames::Status::notServed);
-    out.append("\xff");
-    frames::endReply(out, start);
+    reply(id, 2, "\xff");
   } else if (verb == "greetAgain") {
     frames::appendHello(out, frames::Hello::ours());
   } else if (verb == "flood") {  // the longest reply that may be announced, and no end after it

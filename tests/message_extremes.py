@@ -37,20 +37,12 @@ def nesting(limit):
 def lists_of_records(tables):
     """Lists that take all the memory that there is for records, and one record more."""
     size = {record["name"]: record["bytes"] for record in tables["wireRecords"]}
-    limit = tables["limits"]["recordBytes"]
-    tiny = {"c": 1}
-    most = limit // size["VeskCorvelProtocolPayload"]
-    yield "one list", {"c": 1, "dtl": [tiny] * most}, None
-    yield "one list", {"c": 1, "dtl": [tiny] * (most + 1)}, refused("dtl")
-    yield "two lists", {"c": 1, "mml": [tiny] * (most - 1), "dtl": [tiny]}, None
-    yield "two lists", {"c": 1, "mml": [tiny] * most, "dtl": [tiny]}, refused("mml")
-    within = {"c": 2, "mml": [tiny] * (most // 2 - 1)}
-    yield "lists in a list", {"c": 1, "mml": [within] * 2}, None
-    within = {"c": 2, "mml": [tiny] * (most // 2)}
-    yield "lists in a list", {"c": 1, "mml": [within] * 2}, refused("mml[1].mml")
-    most = limit // size["VeskHoplineSelfAllocToken"]
-    yield "small records", {"c": 1, "qsatv": [{}] * most}, None
-    yield "small records", {"c": 1, "qsatv": [{}] * (most + 1)}, refused("qsatv")
+    for key, record, element in (("mml", "VeskCorvelProtocolPayload", {"c": 1}),
+                                 ("qsatv", "VeskHoplineSelfAllocToken", {})):
+        most = tables["limits"]["recordBytes"] // size[record]
+        yield "a list", {"c": 1, key: [element] * most}, None
+        yield "a list", {"c": 1, key: [element] * (most + 1)}, refused(key)
+        yield "two lists", {"c": 1, "dtl": [{"c": 2}], key: [element] * most}, refused(key)
 
 
 def messages(tables):
