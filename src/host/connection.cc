@@ -21,7 +21,7 @@ namespace {
 constexpr std::size_t kWorthCalling = std::size_t{16} << 10;  // bytes: some 30 microseconds' work
 constexpr std::size_t kShort = std::size_t{4} << 10;          // bytes of a message
 constexpr std::size_t kMostSmall = std::size_t{64} << 10;     // bytes of small replies that wait
-constexpr auto kPatience = std::chrono::milliseconds(1);
+constexpr auto kPatience = std::chrono::milliseconds(4);
 
 enum class Readiness : std::uint8_t { toRead, toWrite };
 
