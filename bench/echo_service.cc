@@ -7,6 +7,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <chrono>
 #include <csignal>
 #include <cstring>
 #include <optional>
@@ -49,7 +50,7 @@ bool writeAll(std::string_view bytes) {
 }
 
 ssize_t readSome(std::span<char> room) {
-  static frames::BriefWait wait;
+  static frames::BriefWait wait(std::chrono::microseconds(20));  // the service's
   ssize_t count = -1;
   while (count < 0) {
     const auto look = [&] {

@@ -57,6 +57,8 @@ class Connection {
 
  private:
   using Lock = std::unique_lock<std::mutex>;
+  /// The service is at work on what is waited for: so long it takes over half a pipeline.
+  static constexpr auto kPatience = std::chrono::microseconds(50);
   enum class State : std::uint8_t { absent, greeting, ready };
   enum class Reader : std::uint8_t { nobody, caller, thread };
   enum class Came : std::uint8_t { nothing, bytes, tooMuch, end };
@@ -142,7 +144,7 @@ class Connection {
   std::optional<ServiceProcess> process_;
   std::optional<frames::FrameAssembler> assembler_;
   std::vector<Answer> answers_;
-  frames::BriefWait callersWait_;
+  frames::BriefWait callersWait_{kPatience};
 
   // The thread's own.
   TimePoint greetBy_{};

@@ -35,7 +35,7 @@ class RequestQueue {
   /// Requests given to a process and not yet answered, at most: bounds how many become suspects.
   static constexpr std::size_t kWindow = 256;
 
-  static constexpr std::size_t kWorthSending = 16;
+  static constexpr std::size_t kWorthSending = 32;
   /// That `gather` gives out, at most, in two parts each.
   static constexpr std::size_t kMostAtOnce = 64;
 

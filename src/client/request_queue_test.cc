@@ -141,7 +141,7 @@ TEST_F(RequestQueueTest, AProcessIsGivenSoManyAtOnce) {
 TEST_F(RequestQueueTest, WhatIsWorthSendingGrowsWithWhatIsOwed) {
   restart();
   std::size_t owed = 0;
-  for (const std::size_t worth : {1, 1, 2, 4, 8, 16, 16, 16}) {
+  for (const std::size_t worth : {1, 1, 2, 4, 8, 16, 32, 32}) {
     for (std::size_t unsent = 1; unsent <= worth; ++unsent) {
       push("m");
       EXPECT_EQ(queue_.isWorthSending(), unsent == worth) << unsent << " for " << owed;

@@ -12,13 +12,18 @@ namespace ironmoat::frames {
 /// than `kNear` time and again is not near: then it costs nothing. For one thread at a time.
 class BriefWait {
  public:
+  using Clock = std::chrono::steady_clock;
+
+  /// `patience`: how long it looks again, at most.
+  explicit BriefWait(Clock::duration patience) : patience_(patience) {}
+
   /// `look` says whether what is waited for has come; `sleep` returns when it may have.
   template <class Look, class Sleep>
   void operator()(Look&& look, Sleep&& sleep) {
     if (look()) return;
     if (!kOthersRun) return sleep();
     const auto start = Clock::now();
-    while (trust_ > 0 && Clock::now() - start < kPatience) {
+    while (trust_ > 0 && Clock::now() - start < patience_) {
       std::this_thread::yield();
       if (look()) {
         trust_ = kMostTrust;
@@ -34,12 +39,11 @@ class BriefWait {
   }
 
  private:
-  using Clock = std::chrono::steady_clock;
-  static constexpr auto kPatience = std::chrono::microseconds(20);
-  static constexpr auto kNear = std::chrono::microseconds(200);
+  static constexpr auto kNear = std::chrono::microseconds(150);
   static constexpr int kMostTrust = 8;
   static inline const bool kOthersRun = std::thread::hardware_concurrency() > 1;
 
+  const Clock::duration patience_;
   int trust_ = 0;  // waits of which it is expected to come soon
 };
 

@@ -3,6 +3,7 @@
 #include <sys/uio.h>
 
 #include <atomic>
+#include <chrono>
 #include <condition_variable>
 #include <cstddef>
 #include <cstdint>
@@ -53,11 +54,11 @@ class RequestSource {
   frames::FrameAssembler assembler_;  // the reading thread's, while there is one
   bool ended_ = false;
   bool reading_ = false;
-  frames::BriefWait wait_;   // the reading thread's
-  std::uint64_t taken_ = 0;  // requests
-  bool watching_ = false;    // there is a watcher,
-  bool asleep_ = false;      // ... and it looks up only when it is called
-  bool called_ = false;      // ... and it was called in
+  frames::BriefWait wait_{std::chrono::microseconds(20)};  // the reading thread's
+  std::uint64_t taken_ = 0;                                // requests
+  bool watching_ = false;                                  // there is a watcher,
+  bool asleep_ = false;  // ... and it looks up only when it is called
+  bool called_ = false;  // ... and it was called in
   std::condition_variable watcher_;
   std::condition_variable others_;
 };
