@@ -159,11 +159,16 @@ class Run:
             counts["without memory" if no_memory else outcome.partition(":")[0]] += 1
             self.check(no_memory or outcome == asked[number][1],
                        f"at once: {outcome}, alone: {asked[number][1]}")
+        seconds = time.monotonic() - begun
         peak = service.memory("VmHWM")
+        time.sleep(1.5)  # a second without a request
+        rest = service.memory("VmRSS")
         service.end()
+        if self.options.mebibytes:
+            self.check(rest < 16, f"{rest:.0f} MiB are kept at rest")
         limit = f" in {address_space >> 20} MiB of addresses" if address_space else ""
         print(f"the heaviest, {len(asked)} at once{limit}: {dict(counts)}, "
-              f"{time.monotonic() - begun:.1f} s, {peak:.0f} MiB", flush=True)
+              f"{seconds:.1f} s, {peak:.0f} MiB, {rest:.0f} MiB at rest", flush=True)
 
     def refusals_leave_nothing(self, count):
         """All refused attacks in the small, over and over."""

@@ -113,6 +113,8 @@ void prepareMemory() noexcept {
   }
 }
 
+void giveBackMemory() noexcept { ::malloc_trim(0); }
+
 std::uint32_t confine() {
   Parts parts;
   // The client's thread that starts the service outlives it, unless its whole process dies: then

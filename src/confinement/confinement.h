@@ -30,6 +30,10 @@ class CannotConfine : public std::system_error {
 /// Settles what malloc does and the size of threads' stacks. Before the first thread is started.
 void prepareMemory() noexcept;
 
+/// What malloc keeps for messages to come goes back to the kernel, which takes as long as a message
+/// of some kilobytes. At any time.
+void giveBackMemory() noexcept;
+
 /// Confines the process, threads that are running included; no other can be started afterwards.
 /// Those threads must have got as far as code of ours: starting one takes calls that are forbidden.
 /// Returns the frames::Confinement bits of what is in force, which are all but those that this

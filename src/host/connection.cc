@@ -12,6 +12,7 @@
 #include <cstdint>
 #include <utility>
 
+#include "confinement/confinement.h"
 #include "frames/frame.h"
 
 namespace ironmoat::host {
@@ -22,20 +23,25 @@ constexpr std::size_t kWorthCalling = std::size_t{16} << 10;  // bytes: some 30 
 constexpr std::size_t kShort = std::size_t{4} << 10;          // bytes of a message
 constexpr std::size_t kMostSmall = std::size_t{64} << 10;     // bytes of small replies that wait
 constexpr auto kPatience = std::chrono::milliseconds(4);
+constexpr timespec kPause = {1, 0};
 
 enum class Readiness : std::uint8_t { toRead, toWrite };
 
-/// A call on a descriptor failed for now: waits until it is ready. False when it failed for good.
-/// By pselect, because poll takes no descriptors at all under an open-files limit of 0.
-bool waitOut(int descriptor, Readiness readiness) {
-  if (errno == EINTR) return true;
-  if (errno != EAGAIN && errno != EWOULDBLOCK) return false;
+/// Waits until the descriptor is ready, or as long as it may. False when that failed for good. By
+/// pselect, because poll takes no descriptors at all under an open-files limit of 0.
+bool waitUntilReady(int descriptor, Readiness readiness, const timespec* most = nullptr) {
   fd_set only;
   FD_ZERO(&only);
   FD_SET(descriptor, &only);
   fd_set* const toRead = readiness == Readiness::toRead ? &only : nullptr;
   fd_set* const toWrite = readiness == Readiness::toWrite ? &only : nullptr;
-  return pselect(descriptor + 1, toRead, toWrite, nullptr, nullptr, nullptr) >= 0 || errno == EINTR;
+  return pselect(descriptor + 1, toRead, toWrite, nullptr, most, nullptr) >= 0 || errno == EINTR;
+}
+
+/// A call on a descriptor failed for now: waits until it is ready. False when it failed for good.
+bool waitOut(int descriptor, Readiness readiness) {
+  if (errno == EINTR) return true;
+  return (errno == EAGAIN || errno == EWOULDBLOCK) && waitUntilReady(descriptor, readiness);
 }
 
 }  // namespace
@@ -100,17 +106,23 @@ std::optional<Data> RequestSource::take() {
 }
 
 std::size_t RequestSource::readSome(std::span<char> room) noexcept {
+  bool paused = false;  // nothing came for a while
   for (;;) {
     ssize_t count = 0;
     bool slept = false;
-    wait_(
-        [&] {
-          count = read(descriptor_, room.data(), room.size());
-          return count >= 0 || errno != EAGAIN;
-        },
-        [&] { slept = waitOut(descriptor_, Readiness::toRead); });
+    const auto look = [&] {
+      count = read(descriptor_, room.data(), room.size());
+      return count >= 0 || errno != EAGAIN;
+    };
+    wait_(look, [&] {
+      slept = waitUntilReady(descriptor_, Readiness::toRead, paused ? nullptr : &kPause);
+    });
+    if (count < 0 && !slept && errno != EINTR) return 0;
+    if (count < 0 && slept && !paused && !look()) {
+      confinement::giveBackMemory();
+      paused = true;
+    }
     if (count >= 0) return static_cast<std::size_t>(count);
-    if (!slept && errno != EINTR) return 0;
   }
 }
 
