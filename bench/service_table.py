@@ -18,16 +18,19 @@ def main():
 
     alone, echo, service = time("inProcess"), time("roundTrip/echo"), time("roundTrip/service")
     one, two = time("pipelined/service"), time("pipelined/service/real_time/threads:2")
+    trip = service / (echo + alone)
+    refused = time("roundTrip/refused") / service
+    rate = alone / one
     rows = [
-        ("round trip / (echo + unpacking)", service / (echo + alone), "≤ 1.15"),
-        ("refused / accepted, round trip", time("roundTrip/refused") / service, "≤ 2"),
-        ("pipelined rate / rate in process", alone / one, "≥ 0.4"),
-        ("pipelined rate / that of the echo", time("pipelined/echo") / one, ""),
-        ("pipelined rate, two client threads / one", one / two, ""),
+        ("round trip / (echo + unpacking)", trip, "≤ 1.15", trip <= 1.15),
+        ("refused / accepted, round trip", refused, "≤ 2", refused <= 2),
+        ("pipelined rate / rate in process", rate, "≥ 0.4", rate >= 0.4),
+        ("pipelined rate / that of the echo", time("pipelined/echo") / one, "", True),
+        ("pipelined rate, two client threads / one", one / two, "", True),
     ]
     print("| through the service | ratio | to be |\n|---|---|---|")
-    for name, ratio, limit in rows:
-        print(f"| {name} | {ratio:.2f} | {limit} |")
+    for name, ratio, limit, holds in rows:
+        print(f"| {name} | {ratio:.2f}{'' if holds else ' **missed**'} | {limit} |")
     print("\n| wall time | |\n|---|---|")
     for name, value in [
         ("unpacking, in process", alone), ("round trip, echo", echo), ("round trip, service", service),
