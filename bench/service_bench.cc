@@ -7,7 +7,6 @@
 #include <sys/wait.h>
 
 #include <deque>
-#include <future>
 #include <memory>
 #include <stdexcept>
 #include <string>

@@ -8,7 +8,6 @@
 #include <atomic>
 #include <cstdlib>
 #include <functional>
-#include <future>
 #include <limits>
 #include <new>
 #include <string>

@@ -28,6 +28,9 @@ namespace ironmoat::host {
 /// the others wait. One of them, the watcher, is called in when there is work for two; and where
 /// the one at work stays away for long, it steps in by itself. So no request, and no reply that is
 /// held back, waits behind a slow message as long as a thread is free.
+///
+/// On a socket, which it makes one that does not block, the thread that reads looks again for a
+/// while before it sleeps, and gives the process's spare memory back after a second of nothing.
 class RequestSource {
  public:
   explicit RequestSource(int descriptor);

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <array>
-#include <future>
 
 #include "inspect/json.h"
 #include "inspect/schema.h"
