@@ -1,5 +1,6 @@
 #pragma once
 
+#include <bit>
 #include <cstddef>
 #include <cstdint>
 #include <span>
@@ -25,9 +26,9 @@ using List = std::vector<T>;
 
 namespace detail {
 
-/// A range of a Block that keeps the block alive. Absent is all zero; an empty range holds no block
-/// and is told from absence by its offset. What was moved from holds no block either: it is absent,
-/// or still empty.
+/// A range of a Block that keeps the block alive. Absent is all zero, and nothing else has neither
+/// offset nor length; an empty range holds no block and is told from absence by its offset. What
+/// was moved from holds no block either: it is absent, or still empty.
 class Slice {
  public:
   Slice() noexcept = default;
@@ -35,7 +36,7 @@ class Slice {
   Slice(Block* block, std::uint32_t offset, std::uint32_t length) noexcept {
     if (length == 0) return;
     block->retain();
-    range_ = {block, offset, length};
+    range_ = {block, {offset, length}};
   }
   Slice(const Slice& other) noexcept : range_(other.range_) {
     if (range_.block != nullptr) [[unlikely]] {
@@ -64,28 +65,31 @@ class Slice {
     return slice;
   }
   [[nodiscard]] bool isAbsent() const noexcept {
-    return range_.block == nullptr && range_.offset == 0;
+    return std::bit_cast<std::uint64_t>(range_.extent) == 0;  // in one comparison
   }
 
   [[nodiscard]] const char* begin() const noexcept {
-    return range_.block == nullptr ? "" : range_.block->bytes() + range_.offset;
+    return range_.block == nullptr ? "" : range_.block->bytes() + range_.extent.offset;
   }
-  [[nodiscard]] std::uint32_t length() const noexcept { return range_.length; }
+  [[nodiscard]] std::uint32_t length() const noexcept { return range_.extent.length; }
   [[nodiscard]] std::string_view view() const noexcept { return {begin(), length()}; }
   [[nodiscard]] Block* block() const noexcept { return range_.block; }
-  [[nodiscard]] std::uint32_t offset() const noexcept { return range_.offset; }
+  [[nodiscard]] std::uint32_t offset() const noexcept { return range_.extent.offset; }
 
   /// The same bytes in a block of their own.
   IRONMOAT_API static Slice copyOf(std::string_view bytes, Sharing sharing = Sharing::anyThread);
 
  private:
-  struct Range {
-    Block* block;
+  struct Extent {
     std::uint32_t offset;
     std::uint32_t length;
   };
-  static constexpr Range kAbsent = {nullptr, 0, 0};
-  static constexpr Range kEmpty = {nullptr, 1, 0};
+  struct Range {
+    Block* block;
+    Extent extent;
+  };
+  static constexpr Range kAbsent = {nullptr, {0, 0}};
+  static constexpr Range kEmpty = {nullptr, {1, 0}};
 
   Range range_ = kEmpty;
 };

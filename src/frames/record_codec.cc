@@ -12,9 +12,7 @@ namespace ironmoat::frames {
 
 template <MessageSchema R>
 void encodeRecord(const R& record, BlockBuilder& out) {
-  Writer writer(out);
-  writer.record(record);
-  writer.finish();
+  Writer(out).write(record);
 }
 
 template <MessageSchema R>
