@@ -8,7 +8,6 @@
 #include <exception>
 #include <latch>
 #include <new>
-#include <shared_mutex>
 #include <system_error>
 #include <thread>
 
@@ -16,6 +15,7 @@
 #include "frames/frame.h"
 #include "host/connection.h"
 #include "host/memory_turns.h"
+#include "host/worker.h"
 #include "ironmoat/errors.h"
 
 namespace ironmoat {
@@ -74,8 +74,6 @@ void IronmoatServer::serve(const Data& request, BlockBuilder& reply) const {
 
 namespace {
 
-constexpr int kMostFailuresToRead = 8;
-
 std::uint32_t confineOrExit() {
   try {
     return confinement::confine();
@@ -95,53 +93,6 @@ void IronmoatServer::run() {
   host::RequestSource source(STDIN_FILENO);
   host::MemoryTurns turns;
 
-  // Replies are added and written within a turn, for it is memory that counts.
-  const auto flush = [&] {
-    const std::shared_lock together(turns);
-    sink.flush();
-  };
-  const auto next = [&] {
-    for (int failures = 0;; ++failures) {
-      try {
-        return source.next(flush);
-      } catch (const std::bad_alloc&) {
-        if (failures == kMostFailuresToRead) throw;
-        const std::unique_lock othersAreDone(turns);
-        sink.flush();
-      }
-    }
-  };
-  const auto reply = [&](const Data& request, BlockBuilder& frame) {
-    try {
-      const std::shared_lock together(turns);
-      answer(request, frame);
-      return sink.add(frame);
-    } catch (const std::bad_alloc&) {  // once more, then, below
-      static_cast<void>(frame.finish());
-    }
-    const std::unique_lock alone(turns);
-    sink.flush();
-    serve(request, frame);
-    sink.add(frame);
-  };
-  const auto serveAll = [&] {
-    BlockBuilder frame(Sharing::oneThread);
-    try {
-      while (!sink.broken()) {
-        const std::optional<Data> request = next();
-        if (!request) break;
-        reply(*request, frame);
-      }
-    } catch (const frames::FrameError& error) {
-      frames::appendSentence(frame, 0, Status::notServed, error.what());
-      sink.add(frame);
-    } catch (const std::bad_alloc&) {
-      // Not even room for an error: an end in order, and the peer may start another service.
-    }
-    flush();
-    source.close();
-  };
-
   // This thread serves nothing: its stack would have to grow, which is fatal at the limit of the
   // address space. Those of the others are there already.
   constexpr unsigned kFewest = 2;
@@ -155,7 +106,7 @@ void IronmoatServer::run() {
     workers.emplace_back([&] {
       started.count_down();
       confined.wait();
-      serveAll();
+      host::Worker(*this, source, sink, turns).run();
     });
   };
   for (unsigned i = 0; i < threads; ++i) start();

@@ -16,6 +16,10 @@
 
 namespace ironmoat {
 
+namespace host {
+class Worker;
+}
+
 /// Serves unpack requests over the process's standard input and output: one connected stream
 /// socket, or two pipes. doc/frames.md describes what is spoken there.
 class IronmoatServer {
@@ -55,6 +59,8 @@ class IronmoatServer {
   void serve(const Data& request, BlockBuilder& reply) const;
 
  private:
+  friend class host::Worker;
+
   /// Appends the record, or returns why the message is refused.
   using Handler =
       std::function<std::optional<DecodingError>(const Data& message, BlockBuilder& reply)>;
