@@ -4,13 +4,11 @@
 #include <utility>
 
 #include "frames/frame.h"
-#include "ironmoat/limits.h"
 
 namespace ironmoat::client {
 
 RequestQueue::RequestQueue(Clock::duration deadline) : deadline_(deadline) {
-  heads_.reserve(kMostAtOnce *
-                 (frames::kLengthBytes + frames::kMaxRequestBody - limits::messageBytes));
+  staged_.reserve(kMostAtOnce * (frames::kMaxRequestHead + kWorthCopying));
 }
 
 std::uint64_t RequestQueue::push(std::shared_ptr<Request> request, TimePoint now) {
@@ -35,32 +33,37 @@ bool RequestQueue::hasUnsent() const noexcept {
 
 std::size_t RequestQueue::gather(std::span<iovec> parts) {
   if (!hasUnsent()) return 0;
-  heads_.truncate(0);
+  staged_.truncate(0);
+  char* const staged = staged_.bytes();  // stays where it is: there is room for the most
   std::size_t used = 0;
-  std::size_t skip = sentOfNext_;
+  std::size_t partsStart = 0;  // where the staged part under way starts
+  const auto endPart = [&] {
+    if (staged_.size() == partsStart) return;
+    parts[used++] = {staged + partsStart, staged_.size() - partsStart};
+    partsStart = staged_.size();
+  };
   std::size_t room = std::min(kMostAtOnce, kWindow - owedCount_);
+  // Two parts are enough for any: what is staged before it is in the same part as its head.
   for (std::uint64_t id = next_; id < sendableEnd() && room > 0 && parts.size() - used >= 2; ++id) {
     // There is a request: what has its outcome was sent before `next_`, or is among the suspects
     // and not their front.
     const Request& request = *slot(id).request;
     --room;
     const std::string_view message = request.message().view();
-    const std::size_t start = heads_.size();
-    frames::appendRequestHead(heads_, id, request.outputType(), message.size());
-    // Heads are placed below, once they have stopped moving.
-    parts[used++] = {nullptr, heads_.size() - start};
-    parts[used++] = {const_cast<char*>(message.data()), message.size()};
-  }
-  char* head = heads_.bytes();
-  for (std::size_t i = 0; i < used; ++i) {
-    iovec& part = parts[i];
-    if (i % 2 == 0) {
-      part.iov_base = head;
-      head += part.iov_len;
+    frames::appendRequestHead(staged_, id, request.outputType(), message.size());
+    if (message.size() <= kWorthCopying) {
+      staged_.append(message);
+    } else {
+      endPart();
+      parts[used++] = {const_cast<char*>(message.data()), message.size()};
     }
-    const std::size_t skipped = std::min(skip, part.iov_len);
-    part.iov_base = static_cast<char*>(part.iov_base) + skipped;
-    part.iov_len -= skipped;
+  }
+  endPart();
+  std::size_t skip = sentOfNext_;
+  for (std::size_t i = 0; skip > 0; ++i) {
+    const std::size_t skipped = std::min(skip, parts[i].iov_len);
+    parts[i].iov_base = static_cast<char*>(parts[i].iov_base) + skipped;
+    parts[i].iov_len -= skipped;
     skip -= skipped;
   }
   return used;
@@ -70,9 +73,8 @@ void RequestQueue::sent(std::size_t bytes) {
   while (bytes > 0) {
     const Request& request = *slot(next_).request;
     if (sentOfNext_ == 0) ++begun_;
-    heads_.truncate(0);
-    frames::appendRequestHead(heads_, next_, request.outputType(), request.message().size());
-    const std::size_t left = heads_.size() + request.message().size() - sentOfNext_;
+    const std::size_t left =
+        frames::requestHeadBytes(request.outputType()) + request.message().size() - sentOfNext_;
     if (bytes < left) {
       sentOfNext_ += bytes;
       break;

@@ -38,6 +38,8 @@ class RequestQueue {
   static constexpr std::size_t kWorthSending = 32;
   /// That `gather` gives out, at most, in two parts each.
   static constexpr std::size_t kMostAtOnce = 64;
+  /// Bytes of a message that `gather` copies, at most: the system takes longer over another part.
+  static constexpr std::size_t kWorthCopying = 1024;
 
   explicit RequestQueue(Clock::duration deadline);
 
@@ -96,7 +98,7 @@ class RequestQueue {
   std::size_t owedCount_ = 0;      // wholly sent, not answered
   std::uint64_t begun_ = 0;        // requests that this process was given any byte of
   bool ready_ = false;
-  BlockBuilder heads_;
+  BlockBuilder staged_;  // what `gather` writes itself
 };
 
 }  // namespace ironmoat::client

@@ -12,13 +12,15 @@ namespace {
 
 constexpr std::string_view kMagic = "IRONMOAT";
 constexpr std::size_t kHelloBody = kMagic.size() + 2 + 4 + 8 + 8 + 8 + 8 + 4;
-constexpr std::size_t kMaxName = 255;
+constexpr std::size_t kRequestHead = 8 + 1;  // and the name
+constexpr std::size_t kMaxName = kMaxRequestHead - kLengthBytes - kRequestHead;
+static_assert(kMaxName == 255);
 constexpr std::size_t kReplyHead = 8 + 1;
 constexpr std::size_t kRefusalHead = 1 + 8 + 2;
 constexpr std::size_t kMaxText = 65535;
 constexpr std::uint64_t kNoOffset = ~std::uint64_t{0};
 
-constexpr std::size_t kLongestRequest = 8 + 1 + kMaxName + limits::messageBytes;
+constexpr std::size_t kLongestRequest = kRequestHead + kMaxName + limits::messageBytes;
 constexpr std::size_t kLongestReply = kReplyHead + limits::replyBytes;
 static_assert(kLongestRequest <= UINT32_MAX && kLongestReply <= UINT32_MAX);
 
@@ -126,7 +128,7 @@ void appendRequestHead(BlockBuilder& out, std::uint64_t id, std::string_view out
   if (outputType.empty() || outputType.size() > kMaxName) {
     throw FrameError("an output type's name has 1 to 255 bytes");
   }
-  const std::size_t head = 8 + 1 + outputType.size();
+  const std::size_t head = kRequestHead + outputType.size();
   if (messageBytes > kMaxRequestBody - head) throw FrameError("the message is too long");
   char* at = openFrame(out, head + messageBytes, head);
   at = store(at, id);
@@ -134,11 +136,13 @@ void appendRequestHead(BlockBuilder& out, std::uint64_t id, std::string_view out
   storeText(at, outputType);
 }
 
+std::size_t requestHeadBytes(std::string_view outputType) noexcept {
+  return kLengthBytes + kRequestHead + outputType.size();
+}
+
 void appendRequest(BlockBuilder& out, std::uint64_t id, std::string_view outputType,
                    std::string_view message) {
-  if (message.size() <= kMaxRequestBody) {
-    out.reserve(kLengthBytes + 8 + 1 + kMaxName + message.size());
-  }
+  if (message.size() <= kMaxRequestBody) out.reserve(kMaxRequestHead + message.size());
   appendRequestHead(out, id, outputType, message.size());
   out.append(message);
 }

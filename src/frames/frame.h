@@ -18,6 +18,8 @@ inline constexpr std::uint16_t kVersion = 1;
 inline constexpr std::size_t kLengthBytes = 4;
 /// The longest body of a request: id, a name of up to 255 bytes with its length, a message.
 extern const std::size_t kMaxRequestBody;
+/// The longest that a request frame has before its message, length included.
+inline constexpr std::size_t kMaxRequestHead = kLengthBytes + 8 + 1 + 255;
 extern const std::size_t kMaxReplyBody;
 
 /// A frame breaks the rules of doc/frames.md. Nothing after it on the connection can be trusted.
@@ -70,6 +72,8 @@ void appendRequest(BlockBuilder& out, std::uint64_t id, std::string_view outputT
 /// message's bytes from where they are.
 void appendRequestHead(BlockBuilder& out, std::uint64_t id, std::string_view outputType,
                        std::size_t messageBytes);
+/// How many bytes that is.
+[[nodiscard]] std::size_t requestHeadBytes(std::string_view outputType) noexcept;
 void appendRefusal(BlockBuilder& out, std::uint64_t id, const DecodingError& error);
 void appendSentence(BlockBuilder& out, std::uint64_t id, Status status, std::string_view sentence);
 
