@@ -8,7 +8,8 @@ namespace ironmoat {
 namespace detail {
 
 /// Specialised by types that have a bit pattern to spare for "absent" (String, Data): an optional
-/// one is then no larger than the value, and a record of absent fields is all zero bytes.
+/// one is then no larger than the value, and a record of absent fields is all zero bytes; a
+/// constant by the constructors here.
 template <class T>
 struct Niche {
   static constexpr bool exists = false;
@@ -17,7 +18,7 @@ struct Niche {
 template <class T, bool HasNiche = Niche<T>::exists>
 class OptionalStorage {
  public:
-  OptionalStorage() noexcept = default;
+  constexpr OptionalStorage() noexcept = default;
   explicit OptionalStorage(T&& value) : value_(std::move(value)) {}
   [[nodiscard]] bool present() const noexcept { return value_.has_value(); }
   [[nodiscard]] T& value() noexcept { return *value_; }
@@ -30,7 +31,7 @@ class OptionalStorage {
 template <class T>
 class OptionalStorage<T, true> {
  public:
-  OptionalStorage() noexcept : value_(Niche<T>::absent()) {}
+  constexpr OptionalStorage() noexcept : value_(Niche<T>::absent()) {}
   explicit OptionalStorage(T&& value) noexcept : value_(std::move(value)) {}
   [[nodiscard]] bool present() const noexcept { return !Niche<T>::isAbsent(value_); }
   [[nodiscard]] T& value() noexcept { return value_; }
@@ -50,8 +51,8 @@ class Optional {
  public:
   using value_type = T;
 
-  Optional() noexcept = default;
-  Optional(std::nullopt_t) noexcept {}               // NOLINT(google-explicit-constructor)
+  constexpr Optional() noexcept = default;
+  constexpr Optional(std::nullopt_t) noexcept {}     // NOLINT(google-explicit-constructor)
   Optional(T value) : storage_(std::move(value)) {}  // NOLINT(google-explicit-constructor)
 
   [[nodiscard]] bool has_value() const noexcept { return storage_.present(); }

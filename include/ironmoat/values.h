@@ -43,7 +43,7 @@ class Slice {
       range_.block->retain();
     }
   }
-  Slice(Slice&& other) noexcept : range_(other.range_) {
+  constexpr Slice(Slice&& other) noexcept : range_(other.range_) {
     if (range_.block != nullptr) [[unlikely]] {
       other.range_ = kAbsent;
     }
@@ -52,14 +52,14 @@ class Slice {
     std::swap(range_, other.range_);
     return *this;
   }
-  ~Slice() {
+  constexpr ~Slice() {
     // Most fields of a record are absent: hinted, the tests of 69 of them stand in one line.
     if (range_.block != nullptr) [[unlikely]] {
       range_.block->release();
     }
   }
 
-  static Slice absent() noexcept {
+  static constexpr Slice absent() noexcept {
     Slice slice;
     slice.range_ = kAbsent;
     return slice;
@@ -109,7 +109,7 @@ class String {
   // NOLINTNEXTLINE(google-explicit-constructor)
   String(const char* text) : String(std::string_view(text)) {}
   /// Internal: the caller has checked that the slice is valid UTF-8.
-  explicit String(detail::Slice validText) noexcept : slice_(std::move(validText)) {}
+  constexpr explicit String(detail::Slice validText) noexcept : slice_(std::move(validText)) {}
 
   [[nodiscard]] std::string_view view() const noexcept { return slice_.view(); }
   // NOLINTNEXTLINE(google-explicit-constructor)
@@ -134,7 +134,7 @@ class Data {
   IRONMOAT_API explicit Data(std::span<const std::uint8_t> bytes);
   explicit Data(std::string_view bytes) : slice_(detail::Slice::copyOf(bytes)) {}
   /// Internal.
-  explicit Data(detail::Slice slice) noexcept : slice_(std::move(slice)) {}
+  constexpr explicit Data(detail::Slice slice) noexcept : slice_(std::move(slice)) {}
 
   [[nodiscard]] std::span<const std::uint8_t> bytes() const noexcept {
     return {reinterpret_cast<const std::uint8_t*>(slice_.begin()), slice_.length()};
@@ -158,7 +158,7 @@ namespace detail {
 template <class T>
 struct SliceNiche {
   static constexpr bool exists = true;
-  static T absent() noexcept { return T(Slice::absent()); }
+  static constexpr T absent() noexcept { return T(Slice::absent()); }
 };
 template <>
 struct Niche<String> : SliceNiche<String> {
