@@ -32,9 +32,12 @@ def main():
         ("rate in process, two threads / one", 2 * alone / beside, "", True),
         ("pipelined rate / rate in process of one thread of two", beside / one, "", True),
     ]
+    judged = 2 * alone / beside >= 1.8  # or the processors were not two, and waited for each other
+    miss = " **missed**" if judged else " (not judged: the processors were shared)"
     print("| through the service | ratio | to be |\n|---|---|---|")
     for name, ratio, limit, holds in rows:
-        print(f"| {name} | {ratio:.2f}{'' if holds else ' **missed**'} | {limit} |")
+        mark = "" if holds and (judged or not limit) else miss
+        print(f"| {name} | {ratio:.2f}{mark} | {limit} |")
     print("\n| wall time | |\n|---|---|")
     for name, value in [
         ("unpacking, in process", alone), ("round trip, echo", echo), ("round trip, service", service),

@@ -49,7 +49,7 @@ class RequestQueue {
 
   /// A fresh process is ready: sending starts over.
   void restart(TimePoint now);
-  /// Fills `parts` with what can be sent now, as for writev, and returns how many it used; they are
+  /// Fills `parts`, two at least, with what can be sent now and returns how many it used; they are
   /// valid until the next call of any function here. Takes no memory: what was taken in gets out.
   std::size_t gather(std::span<iovec> parts);
   /// The first `bytes` of what `gather` gave have been sent.

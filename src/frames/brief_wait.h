@@ -13,9 +13,10 @@ namespace ironmoat::frames {
 /// than `kNear` time and again is not near: then it costs nothing. For one thread at a time.
 ///
 /// Both may have come to run on one processor, where they take turns, a round trip takes twice as
-/// long and the kernel leaves them for 10 to 30 ms. That shows in the time for which a look is
-/// held up. Who sleeps then is mostly woken on another processor: a tenth off the time of round
-/// trips and pipelines in a process's first 50 ms.
+/// long and the kernel may leave them for 10 to 30 ms. That shows in the time for which a look is
+/// held up. Who sleeps then is mostly woken on another processor, if there is one: a tenth off the
+/// time of round trips and pipelines in a process's first 50 ms. As it may not help, it is done for
+/// one wait of 32 at most.
 class BriefWait {
  public:
   using Clock = std::chrono::steady_clock;
@@ -54,7 +55,7 @@ class BriefWait {
       heldUp = heldUp || now - before > kHeldUp;
       came = look();
     }
-    crowded_ = heldUp ? crowded_ + 1 : std::min(crowded_, 0);
+    crowded_ = heldUp || crowded_ < 0 ? crowded_ + 1 : 0;
     return came;
   }
 
