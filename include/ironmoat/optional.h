@@ -8,8 +8,8 @@ namespace ironmoat {
 namespace detail {
 
 /// Specialised by types that have a bit pattern to spare for "absent" (String, Data): an optional
-/// one is then no larger than the value, and a record of absent fields is all zero bytes; a
-/// constant by the constructors here.
+/// one is then no larger than the value, and a record of absent fields is all zero bytes, which is
+/// known while compiling.
 template <class T>
 struct Niche {
   static constexpr bool exists = false;

@@ -67,9 +67,8 @@ class BriefWait {
   static inline const bool kOthersRun = std::thread::hardware_concurrency() > 1;
 
   const Clock::duration patience_;
-  int trust_ = 0;  // waits of which it is expected to come soon
-  int crowded_ =
-      0;  // waits in a row that were held up; below 0, that long nothing is done about it
+  int trust_ = 0;    // waits of which it is expected to come soon
+  int crowded_ = 0;  // waits in a row that were held up; below 0, minus those to let pass
 };
 
 }  // namespace ironmoat::frames
