@@ -69,7 +69,7 @@ int main() {
   ::fcntl(STDIN_FILENO, F_SETFL, O_NONBLOCK);
   confinement::prepareMemory();
   BlockBuilder body;
-  frames::encodeRecord(*VeskCorvelPayloadUnpacker().unpack(
+  frames::encodeRecord(VeskCorvelPayloadUnpacker().unpack(
                            bench::messageOf(bench::typicalPayload(0), plist::Form::binary)),
                        body);
   BlockBuilder out;

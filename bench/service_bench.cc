@@ -45,7 +45,7 @@ std::unique_ptr<Client> settledClient(const char* program) {
 void inProcess(benchmark::State& state) {
   const Data message = messageOf(typicalPayload(0), plist::Form::binary);
   for (auto _ : state) {
-    benchmark::DoNotOptimize(VeskCorvelPayloadUnpacker().unpack(message)->command);
+    benchmark::DoNotOptimize(VeskCorvelPayloadUnpacker().unpack(message).command);
   }
 }
 

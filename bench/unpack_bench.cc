@@ -3,6 +3,7 @@
 
 #include <benchmark/benchmark.h>
 
+#include <cstdlib>
 #include <cstring>
 #include <string>
 #include <vector>
@@ -31,17 +32,25 @@ void addForm(const Sample& sample, plist::Form form) {
   const std::size_t size = message.size();
   add(
       sample.name, prefix + "unpack",
-      [message] { return VeskCorvelPayloadUnpacker().unpack(message)->command; }, size);
+      [message] { return VeskCorvelPayloadUnpacker().unpack(message).command; }, size);
   add(
       sample.name, prefix + "copy_and_unpack",
       [bytes = std::string(message.view())] {
-        return VeskCorvelPayloadUnpacker().unpack(inOneThreadBlock(bytes))->command;
+        return VeskCorvelPayloadUnpacker().unpack(inOneThreadBlock(bytes)).command;
       },
       size);
   const auto addRefused = [&](const char* what, const Data& bad) {
     add(
         sample.name, prefix + what,
-        [bad] { return VeskCorvelPayloadUnpacker().unpack(bad).refusal().kind(); }, bad.size());
+        [bad] {
+          try {
+            static_cast<void>(VeskCorvelPayloadUnpacker().unpack(bad));
+          } catch (const DecodingError& rejection) {
+            return rejection.kind();
+          }
+          std::abort();
+        },
+        bad.size());
   };
   addRefused("wrong", messageOf(WrongAtLast{sample.record}, form));
   addRefused("broken", brokenAtLast(message, form));

@@ -38,15 +38,15 @@ Outcome refused(const DecodingError& error) {
 /// The reply's body, or the refusal in words.
 template <class Unpacker>
 Outcome unpack(const Data& message) {
-  const auto unpacked = Unpacker().unpack(message);
-  if (!unpacked) {
-    require(unpacked.refusal().offset().value_or(0) <= message.size());
-    return refused(unpacked.refusal());
+  try {
+    BlockBuilder out;
+    frames::encodeRecord(Unpacker().unpack(message), out);
+    const BlockRef block = out.finish();
+    return {true, {block->bytes(), block->size()}};
+  } catch (const DecodingError& rejection) {
+    require(rejection.offset().value_or(0) <= message.size());
+    return refused(rejection);
   }
-  BlockBuilder out;
-  frames::encodeRecord(*unpacked, out);
-  const BlockRef block = out.finish();
-  return {true, {block->bytes(), block->size()}};
 }
 
 /// The record in the slow decoder's words, or the refusal; `left` is what the budget still has.

@@ -23,7 +23,8 @@ import time
 
 import attack_messages
 
-KINDS = ["malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound"]
+KINDS = ["malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound",
+         "rejectedByHost"]
 OUTPUT_TYPE = b"DrelUserPayload"
 
 

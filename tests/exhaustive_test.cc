@@ -30,11 +30,13 @@ using plist::Form;
 /// The reply's body, or the refusal in words; nothing else comes out.
 template <class Unpacker>
 std::string outcome(const Data& message) {
-  const auto unpacked = Unpacker().unpack(message);
-  if (!unpacked) return testing::inWords(unpacked.refusal());
-  BlockBuilder out;
-  frames::encodeRecord(*unpacked, out);
-  return {out.bytes(), out.size()};
+  try {
+    BlockBuilder out;
+    frames::encodeRecord(Unpacker().unpack(message), out);
+    return {out.bytes(), out.size()};
+  } catch (const DecodingError& rejection) {
+    return testing::inWords(rejection);
+  }
 }
 
 template <class Wire>
@@ -48,7 +50,7 @@ std::string sample(Form form, double presence, std::uint64_t seed) {
 /// No beginning is a message, and whatever is changed, there is a record or a refusal.
 template <class Unpacker>
 void damage(const std::string& good) {
-  ASSERT_TRUE(Unpacker().unpack(testing::tightMessage(good)));
+  ASSERT_NO_THROW((void)Unpacker().unpack(testing::tightMessage(good)));
   for (std::size_t length = 0; length < good.size(); ++length) {
     const std::string cut = outcome<Unpacker>(testing::tightMessage(good.substr(0, length)));
     EXPECT_TRUE(cut.starts_with("malformed: ")) << length << ": " << cut;

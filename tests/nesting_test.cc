@@ -59,7 +59,7 @@ TEST(NestingTest, TheDeepestPayloadFitsInAMegabyteOfStack) {
     plist::Document document;
     ASSERT_FALSE(plist::readXml(xml, document));
     for (const Data& message : {xml, writeBinary(document)}) {
-      const std::string carried = reply(VeskCorvelPayloadUnpacker().unpack(message).value());
+      const std::string carried = reply(VeskCorvelPayloadUnpacker().unpack(message));
       EXPECT_EQ(reply(frames::decodeRecord<DrelUserPayload>(Data(carried))), carried);
     }
   });

@@ -30,7 +30,7 @@ void hold(std::size_t mebibytes) {
 struct ObedientUnpacker {
   using MessageSchemaType = VeskCommandResponse;
 
-  [[nodiscard]] Unpacked<VeskCommandResponse> unpack(const Data& message) const {
+  [[nodiscard]] VeskCommandResponse unpack(const Data& message) const {
     VeskCommandResponseArguments arguments;
     const std::string_view text = message.view();
     const std::string_view verb = text.substr(0, text.find(' '));
@@ -50,7 +50,7 @@ struct ObedientUnpacker {
     } else {
       arguments.token = message;
     }
-    return Unpacked<VeskCommandResponse>([&] { return std::move(arguments); });
+    return VeskCommandResponse::with(std::move(arguments));
   }
 };
 

@@ -21,11 +21,12 @@ namespace ironmoat {
 class IRONMOAT_API DecodingError : public std::runtime_error {
  public:
   enum class Kind : std::uint8_t {
-    malformed,      ///< the bytes are no property list; `offset()` says where
-    limitExceeded,  ///< over one of ironmoat/limits.h
-    typeMismatch,   ///< a value of the wrong kind
-    outOfRange,     ///< an integer that does not fit its field
-    keyNotFound,    ///< a required key is missing
+    malformed,       ///< the bytes are no property list; `offset()` says where
+    limitExceeded,   ///< over one of ironmoat/limits.h
+    typeMismatch,    ///< a value of the wrong kind
+    outOfRange,      ///< an integer that does not fit its field
+    keyNotFound,     ///< a required key is missing
+    rejectedByHost,  ///< an output record's initialiser threw; `what()` is its description
   };
 
   DecodingError(Kind kind, std::string path, const std::string& message,
@@ -54,7 +55,7 @@ class IRONMOAT_API ServiceError : public std::runtime_error {
     crashed,      ///< the service died over this request
     timedOut,     ///< no reply within the deadline
     unavailable,  ///< no service could be started or reached, or this one does not serve the
-                  ///< request: an output type it does not know, or a record that its host refused
+                  ///< request: an output type it does not know
   };
 
   ServiceError(Kind kind, const std::string& message) : std::runtime_error(message), kind_(kind) {}

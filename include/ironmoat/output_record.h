@@ -14,6 +14,14 @@ namespace ironmoat {
 template <class Make, class A>
 concept MakerOf = std::same_as<std::invoke_result_t<Make&>, A>;
 
+namespace detail {
+
+/// Whether an initialiser has thrown on this thread. Set where initialisers are called, cleared and
+/// asked in values/host_rejection.h: what an initialiser throws, no other code is to be blamed for.
+inline constinit thread_local bool initialiserThrew = false;
+
+}  // namespace detail
+
 /// What every output record of the host is: the arguments of its initialiser, in label order (the
 /// first one is labelled `with`, every other one with its field's name), once `admit` has let them
 /// pass. A daemon reads the members of `A` and never makes one, but in its tests.
@@ -32,7 +40,12 @@ struct OutputRecord : A {
   template <MakerOf<A> Make>
   explicit OutputRecord(Make&& make) : A(make()) {
     static_assert(A::Fields::check());
-    admit(static_cast<const A&>(*this));
+    try {
+      admit(static_cast<const A&>(*this));
+    } catch (...) {
+      detail::initialiserThrew = true;
+      throw;
+    }
   }
 };
 

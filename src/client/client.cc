@@ -14,6 +14,7 @@
 #include "ironmoat/limits.h"
 #include "ironmoat/user_payload.h"
 #include "ironmoat/web_tunnel_response.h"
+#include "values/host_rejection.h"
 
 namespace ironmoat {
 
@@ -49,14 +50,11 @@ class RequestFor final : public client::Request {
  private:
   void giveRecord(const Data& body) {
     try {
-      record_.emplace(InPlace{body});
+      withHostRejections([&] { record_.emplace(InPlace{body}); });
     } catch (const frames::RecordError&) {
       throw;
-    } catch (const std::bad_alloc&) {
+    } catch (...) {  // a DecodingError, or std::bad_alloc
       giveError(std::current_exception());
-    } catch (const std::exception& refusal) {  // of the record's initialiser
-      giveError(
-          std::make_exception_ptr(ServiceError(ServiceError::Kind::unavailable, refusal.what())));
     }
   }
 

@@ -53,7 +53,7 @@ enum class Status : std::uint8_t {
   record = 0,     ///< the body is the encoded record
   refused = 1,    ///< a DecodingError
   notServed = 2,  ///< unknown output type or a bad request; the body is a sentence
-  failed = 3,     ///< the unpacker failed in another way; the body is a sentence
+  failed = 3,     ///< the service failed in another way; the body is a sentence
 };
 
 struct Reply {

@@ -21,7 +21,7 @@ void encodeRecord(const R& record, BlockBuilder& out);
 
 /// The record back. Trusts nothing: every length, count, tag and text is checked, lists and depth
 /// are bounded as in ironmoat/limits.h. Text and bytes are slices of `body`. Throws RecordError,
-/// and what the record's initialiser refuses with.
+/// and what the record's initialiser throws.
 template <MessageSchema R>
 R decodeRecord(const Data& body);
 

@@ -1,8 +1,8 @@
 // What the host's initialisers let pass, and nothing else: a test that links definitions of its own
 // gets those instead, since no other symbol pulls this file out of its library.
 //
-// This host accepts every value. What it is to refuse belongs here: throw, and no record is made. A
-// std::exception's words reach the daemon, in a ServiceError `unavailable`.
+// This host accepts every value. To reject one, throw here: no record is made, and the daemon gets
+// a DecodingError `rejectedByHost`, with the description of a std::exception.
 
 #include "ironmoat/command_response.h"
 #include "ironmoat/http_headers.h"

@@ -17,6 +17,7 @@
 #include "host/memory_turns.h"
 #include "host/worker.h"
 #include "ironmoat/errors.h"
+#include "values/host_rejection.h"
 
 namespace ironmoat {
 
@@ -43,10 +44,11 @@ void IronmoatServer::answer(const Data& request, BlockBuilder& reply) const {
       return frames::appendSentence(reply, id, Status::notServed, "no unpacker for this type");
     }
     const std::size_t frame = frames::beginReply(reply, id, Status::record);
-    const std::optional<DecodingError> refusal = found->handler(parsed.message, reply);
-    if (!refusal) return frames::endReply(reply, frame);
+    withHostRejections([&] { found->handler(parsed.message, reply); });
+    frames::endReply(reply, frame);
+  } catch (const DecodingError& rejection) {
     reply.truncate(start);
-    frames::appendRefusal(reply, id, *refusal);
+    frames::appendRefusal(reply, id, rejection);
   } catch (const std::bad_alloc&) {
     reply.truncate(start);
     throw;
@@ -58,7 +60,7 @@ void IronmoatServer::answer(const Data& request, BlockBuilder& reply) const {
     frames::appendSentence(reply, id, Status::failed, error.what());
   } catch (...) {
     reply.truncate(start);
-    frames::appendSentence(reply, id, Status::failed, "the host refused the record");
+    frames::appendSentence(reply, id, Status::failed, "the unpacker failed");
   }
 }
 

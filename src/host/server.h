@@ -3,14 +3,12 @@
 #include <concepts>
 #include <cstdint>
 #include <functional>
-#include <optional>
 #include <string_view>
 #include <utility>
 #include <vector>
 
 #include "frames/record_codec.h"
 #include "host/message_unpacker.h"
-#include "ironmoat/errors.h"
 #include "ironmoat/values.h"
 #include "values/block_builder.h"
 
@@ -39,13 +37,9 @@ class IronmoatServer {
   template <MessageSchema Output, MessageUnpacker Unpacker>
   requires std::same_as<typename Unpacker::MessageSchemaType, Output>
   void registerUnpacker(Unpacker unpacker) {
-    add(Output::schemaName,
-        [unpacker](const Data& message, BlockBuilder& reply) -> std::optional<DecodingError> {
-          const Unpacked<Output> unpacked = unpacker.unpack(message);
-          if (!unpacked) return unpacked.refusal();
-          frames::encodeRecord(*unpacked, reply);
-          return std::nullopt;
-        });
+    add(Output::schemaName, [unpacker](const Data& message, BlockBuilder& reply) {
+      frames::encodeRecord(unpacker.unpack(message), reply);
+    });
   }
 
   /// Confines the process for good, then serves until the end of input, on several threads, and
@@ -61,9 +55,8 @@ class IronmoatServer {
  private:
   friend class host::Worker;
 
-  /// Appends the record, or returns why the message is refused.
-  using Handler =
-      std::function<std::optional<DecodingError>(const Data& message, BlockBuilder& reply)>;
+  /// Unpacks the message and appends the record. Throws what the unpacker does.
+  using Handler = std::function<void(const Data& message, BlockBuilder& reply)>;
   struct Registration {
     std::string_view outputType;
     Handler handler;

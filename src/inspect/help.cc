@@ -31,10 +31,10 @@ input.
   --help, -h         print this
   --version          print the version
 
-Kinds of error: malformed, limitExceeded, typeMismatch, outOfRange, keyNotFound
-(the message was refused), noTypeFits (every type refused it, for different
-reasons), crashed, timedOut (the service failed over it), unavailable (no
-service could be had), unreadable (FILE could not be read).
+Kinds of error: malformed, limitExceeded, typeMismatch, outOfRange, keyNotFound,
+rejectedByHost (the message was refused), noTypeFits (every type refused it, for
+different reasons), crashed, timedOut (the service failed over it), unavailable
+(no service could be had), unreadable (FILE could not be read).
 
 Exit status: 0 all unpacked; 1 some message refused, or the service failed over
 it, or it is not confined as it has to be; 2 wrong usage, a FILE that could not

@@ -8,11 +8,10 @@
 
 namespace ironmoat {
 
-Unpacked<VeskCommandResponse> VeskCommandResponseUnpacker::unpack(const Data& message) const {
+VeskCommandResponse VeskCommandResponseUnpacker::unpack(const Data& message) const {
   VeskCommandResponseSchema wire;
-  if (auto refusal = decodeMessage(message, wire)) return std::move(*refusal);
-  return Unpacked<VeskCommandResponse>(
-      [&] { return argumentsFrom<VeskCommandResponse>(std::move(wire)); });
+  decodeMessage(message, wire);
+  return VeskCommandResponse([&] { return argumentsFrom<VeskCommandResponse>(std::move(wire)); });
 }
 
 }  // namespace ironmoat

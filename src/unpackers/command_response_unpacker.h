@@ -7,8 +7,8 @@ namespace ironmoat {
 
 struct VeskCommandResponseUnpacker {
   using MessageSchemaType = VeskCommandResponse;
-  /// Throws what an output record's initialiser refuses with, unchanged.
-  [[nodiscard]] Unpacked<VeskCommandResponse> unpack(const Data& message) const;
+  /// Throws a DecodingError, or what an output record's initialiser throws.
+  [[nodiscard]] VeskCommandResponse unpack(const Data& message) const;
 };
 static_assert(MessageUnpacker<VeskCommandResponseUnpacker>);
 

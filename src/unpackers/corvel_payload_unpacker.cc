@@ -72,10 +72,10 @@ Converted convertParts(VeskCorvelProtocolPayload& wire) {
 
 }  // namespace
 
-Unpacked<DrelUserPayload> VeskCorvelPayloadUnpacker::unpack(const Data& message) const {
+DrelUserPayload VeskCorvelPayloadUnpacker::unpack(const Data& message) const {
   WireRecord<VeskCorvelProtocolPayload> wire;
-  if (auto refusal = decodeMessage(message, wire.fields())) return std::move(*refusal);
-  return Unpacked<DrelUserPayload>(
+  decodeMessage(message, wire.fields());
+  return DrelUserPayload(
       [&] { return wire.consume<DrelUserPayload>(convertParts(wire.fields())); });
 }
 

@@ -7,8 +7,8 @@ namespace ironmoat {
 
 struct VeskCorvelPayloadUnpacker {
   using MessageSchemaType = DrelUserPayload;
-  /// Throws what an output record's initialiser refuses with, unchanged.
-  [[nodiscard]] Unpacked<DrelUserPayload> unpack(const Data& message) const;
+  /// Throws a DecodingError, or what an output record's initialiser throws.
+  [[nodiscard]] DrelUserPayload unpack(const Data& message) const;
 };
 static_assert(MessageUnpacker<VeskCorvelPayloadUnpacker>);
 

@@ -1,6 +1,6 @@
 #pragma once
 
-#include <optional>
+#include <utility>
 
 #include "ironmoat/errors.h"
 #include "ironmoat/values.h"
@@ -8,12 +8,12 @@
 
 namespace ironmoat {
 
-/// The first half of every unpacker: a fresh decoder, the wire record out of the bytes, and the
-/// decoder gone again before anything is converted. Returns why the message is refused, or none.
+/// The first half of every unpacker: a fresh decoder fills the wire record from the bytes, and is
+/// gone before anything is converted. A rejection, a value up to here, is thrown.
 template <class Wire>
-[[nodiscard]] std::optional<DecodingError> decodeMessage(const Data& message, Wire& record) {
+void decodeMessage(const Data& message, Wire& record) {
   const plist::PropertyListDecoder decoder;
-  return decoder.decode(message, record);
+  if (auto rejection = decoder.decode(message, record)) throw std::move(*rejection);
 }
 
 }  // namespace ironmoat

@@ -4,6 +4,8 @@
 #include <gtest/gtest.h>
 
 #include <concepts>
+#include <functional>
+#include <new>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -15,6 +17,7 @@
 #include "unpackers/command_response_unpacker.h"
 #include "unpackers/corvel_payload_unpacker.h"
 #include "unpackers/web_tunnel_response_unpacker.h"
+#include "values/host_rejection.h"
 
 namespace ironmoat {
 namespace {
@@ -24,12 +27,13 @@ struct Refusal : std::runtime_error {
 };
 
 std::vector<std::string> calls;
-std::string refused;  // the call that the host refuses
+std::string refused;           // the call that the host refuses
+std::function<void()> refuse;  // how
 
 /// A call as "type argument", where the argument is the first one.
 void note(const std::string& type, const std::string& argument) {
   calls.push_back(type + " " + argument);
-  if (calls.back() == refused) throw Refusal(refused);
+  if (calls.back() == refused) refuse();
 }
 template <class T>
 std::string show(const T& value) {
@@ -110,6 +114,7 @@ class UnpackersTest : public ::testing::Test {
   void SetUp() override {
     calls.clear();
     refused.clear();
+    refuse = [] { throw Refusal(refused); };
   }
 };
 
@@ -146,7 +151,8 @@ TEST_F(UnpackersTest, ATunnelsHeadersComeFirstAndACommandIsOneCall) {
   EXPECT_THROW((void)VeskCommandResponseUnpacker().unpack(response), Refusal);
 }
 
-TEST_F(UnpackersTest, WhatTheHostRefusesIsAReplyAndARecordThatComesBackIsAskedForAgain) {
+/// A client runs the initialisers a second time, on the record that comes back.
+TEST_F(UnpackersTest, ServeRepliesRejectedByHostWhateverTheInitialiserThrows) {
   IronmoatServer server(IronmoatServer::Confine::no);
   server.registerUnpacker<VeskCommandResponse>(VeskCommandResponseUnpacker());
   const auto served = [&] {
@@ -158,19 +164,44 @@ TEST_F(UnpackersTest, WhatTheHostRefusesIsAReplyAndARecordThatComesBackIsAskedFo
     return frames::parseReply(Data(std::string_view(reply.bytes(), reply.size()).substr(4)));
   };
   const frames::Reply accepted = served();
+  EXPECT_EQ(accepted.status, frames::Status::record);
   refused = "response 9";
-  const frames::Reply failed = served();
-  EXPECT_EQ(failed.id, 5U);
-  EXPECT_EQ(failed.status, frames::Status::failed);
-  EXPECT_EQ(frames::parseSentence(failed.body), "response 9");
-  EXPECT_THROW((void)frames::decodeRecord<VeskCommandResponse>(accepted.body), Refusal);
+  const struct {
+    std::function<void()> refuse;
+    std::string description;
+  } rows[] = {
+      {refuse, refused},
+      {[] { throw std::bad_alloc(); }, std::bad_alloc().what()},
+      {[] { throw DecodingError(DecodingError::Kind::malformed, "path", "not a record", 7); },
+       "not a record"},
+      {[] { throw frames::FrameError("not a frame"); }, "not a frame"},
+      {[] { throw frames::RecordError("not a record"); }, "not a record"},
+      {[] { throw 5; }, "the host rejected the record"},
+  };
+  for (const auto& row : rows) {
+    refuse = row.refuse;
+    const frames::Reply reply = served();
+    EXPECT_EQ(reply.id, 5U);
+    ASSERT_EQ(reply.status, frames::Status::refused) << row.description;
+    const DecodingError rejection = frames::parseRefusal(reply.body);
+    EXPECT_EQ(testing::inWords(rejection), "rejectedByHost: " + row.description);
+    EXPECT_FALSE(rejection.offset().has_value());
+  }
+  const auto decode = [&] { (void)frames::decodeRecord<VeskCommandResponse>(accepted.body); };
+  EXPECT_THROW(withHostRejections(decode), DecodingError);
+  refused.clear();
+  const auto fail = [] { throw frames::RecordError("not of the host's"); };
+  EXPECT_THROW(withHostRejections(fail), frames::RecordError);
 }
 
 TEST_F(UnpackersTest, ADecodingErrorComesBeforeAnyCall) {
   const Data wrong = message(payload(1, "<key>h</key><dict/>" + list("mml", {""})));
-  const auto unpacked = VeskCorvelPayloadUnpacker().unpack(wrong);
-  ASSERT_FALSE(unpacked);
-  EXPECT_EQ(testing::inWords(unpacked.refusal()), "keyNotFound mml[0].c: required key is missing");
+  try {
+    (void)VeskCorvelPayloadUnpacker().unpack(wrong);
+    ADD_FAILURE() << "accepted";
+  } catch (const DecodingError& rejection) {
+    EXPECT_EQ(testing::inWords(rejection), "keyNotFound mml[0].c: required key is missing");
+  }
   EXPECT_TRUE(calls.empty());
 }
 

@@ -17,12 +17,12 @@ struct Converted {
 
 }  // namespace
 
-Unpacked<VeskCommandWebTunnelResponse> VeskCommandWebTunnelResponseUnpacker::unpack(
+VeskCommandWebTunnelResponse VeskCommandWebTunnelResponseUnpacker::unpack(
     const Data& message) const {
   VeskCommandWebTunnelResponseSchema wire;
-  if (auto refusal = decodeMessage(message, wire)) return std::move(*refusal);
+  decodeMessage(message, wire);
   Converted converted{.httpHeaders = convertHeaderBlock(wire.httpHeaders)};
-  return Unpacked<VeskCommandWebTunnelResponse>([&] {
+  return VeskCommandWebTunnelResponse([&] {
     return argumentsFrom<VeskCommandWebTunnelResponse>(std::move(wire), std::move(converted));
   });
 }

@@ -7,8 +7,8 @@ namespace ironmoat {
 
 struct VeskCommandWebTunnelResponseUnpacker {
   using MessageSchemaType = VeskCommandWebTunnelResponse;
-  /// Throws what an output record's initialiser refuses with, unchanged.
-  [[nodiscard]] Unpacked<VeskCommandWebTunnelResponse> unpack(const Data& message) const;
+  /// Throws a DecodingError, or what an output record's initialiser throws.
+  [[nodiscard]] VeskCommandWebTunnelResponse unpack(const Data& message) const;
 };
 static_assert(MessageUnpacker<VeskCommandWebTunnelResponseUnpacker>);
 

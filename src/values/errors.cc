@@ -14,6 +14,8 @@ std::string_view nameOf(DecodingError::Kind kind) noexcept {
       return "outOfRange";
     case DecodingError::Kind::keyNotFound:
       return "keyNotFound";
+    case DecodingError::Kind::rejectedByHost:
+      return "rejectedByHost";
   }
   return "unknown";
 }

@@ -89,7 +89,7 @@ Output convert(Example&& wire) { return Output::with(argumentsFrom<Output>(std::
 
 struct Unpacker {
   using MessageSchemaType = Output;
-  [[nodiscard]] Unpacked<Output> unpack(const Data& message) const;
+  [[nodiscard]] Output unpack(const Data& message) const;
 };
 
 void registerAll(IronmoatServer& server) {
