@@ -49,13 +49,13 @@ std::uint64_t BinaryEditor::addInteger() {
   const std::size_t power = below(5);
   const std::uint64_t value = oneIn(2) ? below(100) : edge();
   std::string bytes = bigEndianBytes(value, std::size_t{1} << std::min<std::size_t>(power, 3));
-  if (power == 4) bytes.insert(0, 8, oneIn(3) ? '\xFF' : '\0');
+  if (power == 4) bytes.insert(0, 8, oneIn(3) ? '\xFF' : oneIn(3) ? '\x01' : '\0');
   return add({static_cast<std::uint8_t>(0x10 | power), bytes, {}, {}, 0, {}});
 }
 std::uint64_t BinaryEditor::addScalar() {
   switch (below(8)) {
     case 0:
-      return add({static_cast<std::uint8_t>(0x08 + below(2)), {}, {}, {}, 0, {}});
+      return add({static_cast<std::uint8_t>(oneIn(4) ? 0 : 0x08 + below(2)), {}, {}, {}, 0, {}});
     case 1:
       return addInteger();
     case 2: {
@@ -89,7 +89,12 @@ std::uint64_t BinaryEditor::addScalar() {
   }
 }
 std::uint64_t BinaryEditor::addContainer(std::uint64_t element, std::size_t times) {
-  return add({0xA0, {}, std::vector<std::uint64_t>(times, element), {}, 0, {}});
+  return add({oneIn(8) ? std::uint8_t{0xC0} : std::uint8_t{0xA0},
+              {},
+              std::vector<std::uint64_t>(times, element),
+              {},
+              0,
+              {}});
 }
 std::uint64_t BinaryEditor::addDictionary() {
   Sketched dictionary{0xD0, {}, {}, {}, 0, {}};

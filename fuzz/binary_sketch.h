@@ -19,10 +19,8 @@ struct Sketched {
   std::optional<std::size_t> sameAs;      ///< begins where that object does, and writes nothing
 
   [[nodiscard]] unsigned kind() const { return marker >> 4U; }
-  [[nodiscard]] bool isContainer() const { return kind() == 0xA || kind() == 0xD; }
-  [[nodiscard]] bool hasLength() const {
-    return (kind() >= 0x4 && kind() <= 0x6) || kind() == 0xA || kind() == 0xD;
-  }
+  [[nodiscard]] bool isContainer() const { return kind() == 0xA || kind() == 0xC || kind() == 0xD; }
+  [[nodiscard]] bool hasLength() const { return (kind() >= 0x4 && kind() <= 0x6) || isContainer(); }
 };
 
 /// A binary property list taken apart, so that it can be edited and put together again: what the

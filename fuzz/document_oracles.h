@@ -53,6 +53,9 @@ struct Walk {
         }
         for (const plist::NodeIndex value : document.values(node)) visitChild(value, depth);
         return;
+      case Kind::set:
+        writable = false;
+        [[fallthrough]];
       case Kind::array:
         for (const plist::NodeIndex element : document.elements(node)) visitChild(element, depth);
         return;
@@ -61,10 +64,11 @@ struct Walk {
         requireInside(document.slice(node));
         bytes += node.count;
         return;
+      case Kind::wideInteger:
       case Kind::real:
       case Kind::date:
       case Kind::uid:
-      case Kind::unsignedInteger:
+      case Kind::null:
         writable = false;
         return;
       case Kind::integer:
@@ -79,7 +83,7 @@ struct Walk {
   }
   void visitChild(plist::NodeIndex index, std::uint32_t depth) {
     const plist::Kind kind = document.node(index).kind;
-    const bool container = kind == plist::Kind::dictionary || kind == plist::Kind::array;
+    const bool container = kind < plist::Kind::string;
     if (!tooLarge()) visit(index, depth + (container ? 1 : 0));
   }
 };

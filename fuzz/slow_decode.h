@@ -160,7 +160,7 @@ class SlowDecoder {
     } else if constexpr (std::is_same_v<T, Bool>) {
       out += expect(Kind::boolean, index, path).payload != 0 ? "yes;" : "no;";
     } else if constexpr (std::is_integral_v<T>) {
-      if (document_.node(index).kind == Kind::unsignedInteger) {
+      if (document_.node(index).kind == Kind::wideInteger) {
         refuse("outOfRange", path, "integer does not fit in 64 bits with a sign");
       }
       const std::uint64_t bits = expect(Kind::integer, index, path).payload;

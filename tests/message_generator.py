@@ -10,7 +10,7 @@ from message_model import KINDS, LIST_OF
 
 GOOD_INTEGERS = [0, 1, -1, 7, 127, 128, 255, 256, 32767, 65535, 65536, -2**31, 2**31 - 1, 2**31,
                  2**32 - 1, 2**32, 2**53 + 1, 2**63 - 1, -2**63, -2**63 + 1]
-WIDE_INTEGERS = [2**63, 2**63 + 1, 2**64 - 2, 2**64 - 1]
+WIDE_INTEGERS = [2**63, 2**64 - 1, 2**64, 2**127 - 1, -2**63 - 1, -2**127]
 REALS = [0.0, -0.0, 1.5, 5.0, 1e300, -1e-300, float("inf"), float("nan")]
 SIZES = [1, 2, 14, 15, 16, 17, 40, 255, 256, 300]  # binary lengths change their form at 15 and 256
 ODD_TEXTS = ["", "", "x", "0", "5", "true", " padded ", "e\u0301\u200d\u202e", "\uFEFF",
@@ -23,7 +23,7 @@ def wrong_values(type_name, for_xml):
     """One or more of each kind other than the type's; for integers those that do not fit, too."""
     right = list if type_name.startswith(LIST_OF) else KINDS.get(type_name, dict)
     values = [5, True, "5", "", b"5", b"", 5.0, datetime.datetime(2001, 1, 1), [], [5], ["5"], {},
-              {"c": 5}] + [plistlib.UID(5)] * (not for_xml)
+              {"c": 5}] + [plistlib.UID(5), None] * (not for_xml)
     return [value for value in values if type(value) is not right] + WIDE_INTEGERS * (right is int)
 
 
@@ -145,7 +145,7 @@ class Generator:
         if how < 4:
             return self.scalar([int, str, bytes, bool][how])
         if how < 6:
-            return r.choice([WIDE_INTEGERS, REALS][how - 4])
+            return r.choice([WIDE_INTEGERS, REALS + [None] * (not self.xml)][how - 4])
         if how == 6 or how == 7 and self.xml:
             return datetime.datetime(r.randrange(1, 10000), 2, 28, 23, 59, 59)
         if how == 7:

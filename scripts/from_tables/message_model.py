@@ -1,10 +1,11 @@
 """The rules by which a message becomes a record or is refused, told a second time.
 
 Knows no field: works on the tables that dump_tables prints, and on messages as plistlib reads them
-(dict, list, str, bytes, bool, int; whatever else is a value that fits no field).
+(dict, list, str, bytes, bool, int of any size; whatever else is a value that fits no field).
 """
 
 import base64
+import io
 import json
 import plistlib
 import subprocess
@@ -18,12 +19,36 @@ RECORDS = {
 }
 
 
+class BinaryWriter(plistlib._BinaryPlistWriter):
+    """plistlib's own stops at 2**64."""
+
+    def _write_object(self, value):
+        try:
+            super()._write_object(value)
+        except OverflowError:  # nothing but the object's offset was written
+            self._fp.write(b"\x14" + value.to_bytes(16, "big", signed=True))
+
+
+class XmlWriter(plistlib._PlistWriter):
+    def write_value(self, value):
+        try:
+            super().write_value(value)
+        except OverflowError:
+            self.simple_element("integer", str(value))
+
+
+def written(writer, value):
+    out = io.BytesIO()
+    writer(out, sort_keys=False, skipkeys=False).write(value)
+    return out.getvalue()
+
+
 def binary(value):
-    return plistlib.dumps(value, fmt=plistlib.FMT_BINARY, sort_keys=False)
+    return written(BinaryWriter, value)
 
 
 def xml(value):
-    return plistlib.dumps(value, fmt=plistlib.FMT_XML, sort_keys=False)
+    return written(XmlWriter, value)
 
 
 class Refusal(Exception):

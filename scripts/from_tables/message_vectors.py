@@ -77,6 +77,15 @@ class Vectors:
         unknown = {"C": 1, "": "no key", "dtl ": [], "?": {"c": "not looked at", "deep": [[], [1.5]]}}
         self.add("payload", "unknown-keys", "keys that no field has are passed over, whatever is "
                  "under them", {"c": 96} | unknown)
+        fields_none = [None, 2**100, plistlib.UID(1)]
+        self.entries.append(("values that fit in no field, under an unknown key: a set of null, a wide "
+                             "integer and a UID; a date out of range", "command-response", {
+            "command-response/no-field.bplist":
+                binary({"c": 96, "?": fields_none}).replace(b"\xa3", b"\xc3"),
+            "command-response/no-field.plist":
+                b"<plist><dict><key>?</key><array><date>2024-13-32T24:60:61Z</date><integer>-0x1"
+                b"0000000000000000</integer></array><key>c</key><integer>96</integer></dict></plist>"
+        }, {"record": {"command": 96}}))
         chain = {"c": 0, "Dc": {"c": 7}, "h": {"ri": "innermost"}}
         for depth in range(1, 20):
             chain = {"c": depth, "dtl" if depth % 2 else "mml": [chain]}
@@ -123,7 +132,9 @@ class Vectors:
         add("command-response", "real", "a real is no integer", {"c": 96.0})
         add("command-response", "true", "true is no integer", {"c": True})
         add("command-response", "too-large", "an integer beyond 64 bits, signed", {"c": 2**63})
-        add("command-response", "lacking", "a required key is missing", {"C": 96})
+        add("command-response", "far-too-large", "an integer beyond 64 bits", {"c": 1, "s": -2**100})
+        add("command-response", "null", "null is not absence", {"c": 1, "s": None}, [".bplist"])
+        add("command-response", "lacking", "a required key is missing", {"C": 96, "?": 2**64})
         add("command-response", "no-dictionary", "the message is no dictionary", [{"c": 96}])
         add("payload", "nested-mismatch", "the fault lies deep", {
             "c": 1, "mml": [{"c": 2}, {"c": 3, "dtl": [{"c": 4, "U": "text"}]}]})

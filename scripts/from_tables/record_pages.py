@@ -15,14 +15,30 @@ The fields of all records, in the order in which they are decoded, in which the 
 them, and in which they lie in a reply ([frames.md](frames.md)). Printed from the tables in the code
 by `scripts/refresh`; [records.json](records.json) holds the same for programs.
 
-- *key*: under which the message's dictionary has it. Keys are compared byte by byte; unknown ones
-  are passed over.
-- *type*: `Int` and `Int64` are both 64 bits, signed. A value of another kind is a `typeMismatch`, an
-  integer beyond 64 bits `outOfRange`.
+- *key*: under which the message's dictionary has it. Keys are compared byte by byte. An entry under
+  an unknown key is ignored, whatever its value.
+- *type*: `Int` and `Int64` are both 64 bits, signed. An integer of any size beyond that is
+  `outOfRange`, a value of another kind a `typeMismatch`.
 - *in a message*: a *required* key must be there, or the message is refused with `keyNotFound`.
 - *in the record*: an *optional* field may be absent; a list that is *always* there is empty where
   the message has none.
 - *label*: of the initialiser's argument.
+
+Some values fit in no field. Under a known key they are a `typeMismatch` (a wide integer under an
+integer's key: `outOfRange`), under an unknown key they are ignored like any other value:
+
+| value | binary | XML |
+|---|---|---|
+| integer beyond 64 bits, signed | of 16 bytes | any number of digits, decimal or hexadecimal |
+| real | of 4 or 8 bytes | digits with a point and an exponent, `nan`, `inf`, `infinity` |
+| date | any 8 bytes | `dddd-dd-ddTdd:dd:ddZ`, also where no calendar has it |
+| UID | of 1 to 16 bytes | none |
+| null, which is not absence | 0x00 | none |
+| set | counted as an array | none |
+
+Other bytes are not a property list, and `malformed` wherever they stand: integers of more than 16
+bytes, the fill byte 0x0F where an object should be, and the URLs, UUIDs, UTF-8 texts and ordered
+sets of later versions of the binary format.
 """
 
 

@@ -11,8 +11,8 @@
 ///     offset  = uint(offsetSize)                          from the start of the file
 ///     trailer = pad(5) sortVersion(1) offsetSize(1) referenceSize(1)
 ///               objectCount(8) topObject(8) offsetTable(8)
-///     object  = 0x08 | 0x09                               false, true
-///             | 0x1n byte{2^n}                            integer, n = 0..4; 8 bytes are signed
+///     object  = 0x00 | 0x08 | 0x09                        null, false, true
+///             | 0x1n byte{2^n}                            integer, n = 0..4; signed from 8 bytes
 ///             | 0x22 byte{4} | 0x23 byte{8}               real
 ///             | 0x33 byte{8}                              date
 ///             | 0x4c length byte*                         data
@@ -20,6 +20,7 @@
 ///             | 0x6c length unit*                         UTF-16 text, length in units
 ///             | 0x8n byte{n+1}                            UID
 ///             | 0xAc length reference*                    array
+///             | 0xCc length reference*                    set
 ///             | 0xDc length reference* reference*         dictionary: keys, then values
 ///     length  = nothing, when c < 15: the length is c     | integer object, when c = 15
 ///
@@ -41,8 +42,10 @@ enum class Marker : std::uint8_t {
   utf16 = 0x6,
   uid = 0x8,
   array = 0xA,
+  set = 0xC,
   dictionary = 0xD,
 };
+inline constexpr std::uint8_t kNull = 0x00;
 inline constexpr std::uint8_t kFalse = 0x08;
 inline constexpr std::uint8_t kTrue = 0x09;
 inline constexpr std::uint8_t kLengthFollows = 0x0F;

@@ -173,7 +173,8 @@ class BinaryReader {
     node = {Kind::boolean, false, 0, 0, 0};
     switch (static_cast<Marker>(marker >> 4)) {
       case Marker::simple:
-        if (marker != binary::kFalse && marker != binary::kTrue) break;
+        if (marker != binary::kFalse && marker != binary::kTrue && marker != binary::kNull) break;
+        if (marker == binary::kNull) node.kind = Kind::null;
         node.payload = marker == binary::kTrue ? 1 : 0;
         end = body;
         return true;
@@ -197,6 +198,7 @@ class BinaryReader {
       case Marker::utf16:
         return readUtf16(at, node, end);
       case Marker::array:
+      case Marker::set:
       case Marker::dictionary:
         return readContainer(at, node, end);
     }
@@ -219,14 +221,9 @@ class BinaryReader {
       node.payload = bigEndian(bytes, size);  // 8 bytes: two's complement already
       return true;
     }
-    const std::uint64_t high = bigEndian(bytes, 8);
     node.payload = bigEndian(bytes + 8, 8);
-    const bool topBit = (node.payload >> 63) != 0;
-    if (high == 0) {
-      if (topBit) node.kind = Kind::unsignedInteger;
-    } else if (high != std::numeric_limits<std::uint64_t>::max() || !topBit) {
-      return refuse("integer wider than 64 bits", at);
-    }
+    const bool negative = (node.payload >> 63) != 0;
+    if (bigEndian(bytes, 8) != 0 - std::uint64_t{negative}) node.kind = Kind::wideInteger;
     return true;
   }
 
@@ -309,7 +306,8 @@ class BinaryReader {
 
   [[nodiscard]] bool readContainer(std::size_t at, Node& node, std::size_t& end) {
     containers_.push(current_);
-    const bool dictionary = static_cast<Marker>(bytes_[at] >> 4) == Marker::dictionary;
+    const auto marker = static_cast<Marker>(bytes_[at] >> 4);
+    const bool dictionary = marker == Marker::dictionary;
     std::size_t body = 0;
     std::uint64_t count = 0;
     if (!readLength(at, count, body)) return false;
@@ -317,7 +315,7 @@ class BinaryReader {
     if (count > objectsEnd_) return refuse("object runs out of bounds", at);
     const std::size_t references = static_cast<std::size_t>(count) * (dictionary ? 2 : 1);
     if (!need(body, references * referenceSize_, at, end)) return false;
-    node.kind = dictionary ? Kind::dictionary : Kind::array;
+    node.kind = dictionary ? Kind::dictionary : marker == Marker::set ? Kind::set : Kind::array;
     node.count = static_cast<std::uint32_t>(count);
     node.payload = children_.size();
     return takeReferences(bytes_ + body, references, children_.extend(references));
@@ -369,7 +367,7 @@ class BinaryReader {
     return node.kind == Kind::dictionary ? document_.values(node) : document_.elements(node);
   }
   static bool isContainer(const Node& node) {
-    static_assert(Kind::dictionary < Kind::string && Kind::array < Kind::string);
+    static_assert(std::max({Kind::dictionary, Kind::array, Kind::set}) < Kind::string);
     return node.kind < Kind::string;
   }
 

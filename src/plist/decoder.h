@@ -121,7 +121,7 @@ template <Scalar T>
     return decoder.expect(std::same_as<T, String> ? Kind::string : Kind::data) &&
            decoder.chargeDelivered(decoder.node().count);
   } else {
-    if (decoder.node().kind != Kind::unsignedInteger) return decoder.expect(Kind::integer);
+    if (decoder.node().kind != Kind::wideInteger) return decoder.expect(Kind::integer);
     decoder.refuseOutOfRange();
     return false;
   }

@@ -8,12 +8,14 @@ std::string_view nameOf(Kind kind) noexcept {
       return "dictionary";
     case Kind::array:
       return "array";
+    case Kind::set:
+      return "set";
     case Kind::string:
       return "string";
     case Kind::data:
       return "data";
     case Kind::integer:
-    case Kind::unsignedInteger:
+    case Kind::wideInteger:
       return "integer";
     case Kind::boolean:
       return "boolean";
@@ -23,6 +25,8 @@ std::string_view nameOf(Kind kind) noexcept {
       return "date";
     case Kind::uid:
       return "UID";
+    case Kind::null:
+      return "null";
   }
   return "value";
 }

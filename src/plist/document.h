@@ -14,14 +14,17 @@ namespace ironmoat::plist {
 enum class Kind : std::uint8_t {
   dictionary,
   array,
+  set,
   string,
   data,
-  integer,          ///< fits in a signed 64-bit integer
-  unsignedInteger,  ///< 2^63 to 2^64 - 1: an integer that no field can hold
+  integer,  ///< fits in a signed 64-bit integer
   boolean,
+  // Fit in no field, so that their values are not kept:
+  wideInteger,  ///< an integer that needs more than 64 bits with a sign
   real,
   date,
   uid,
+  null,
 };
 
 /// For people: "dictionary", "data", "integer", ...
@@ -35,7 +38,7 @@ struct Node {
   Kind kind;
   bool transformed;       ///< string, data: the bytes stand in the side block, not in the source
   std::uint16_t height;   ///< containers on the longest way down, this one included; scalars 0
-  std::uint32_t count;    ///< dictionary: entries; array: elements; string, data: bytes
+  std::uint32_t count;    ///< dictionary: entries; array, set: elements; string, data: bytes
   std::uint64_t payload;  ///< containers: first child; string, data: offset; scalars: the value
 };
 static_assert(sizeof(Node) == 16);
@@ -58,8 +61,8 @@ class Document {
   [[nodiscard]] NodeIndex root() const noexcept { return root_; }
   [[nodiscard]] const Node& node(NodeIndex index) const noexcept { return nodes_[index]; }
 
-  [[nodiscard]] std::span<const NodeIndex> elements(const Node& array) const noexcept {
-    return children_.span(array.payload, array.count);
+  [[nodiscard]] std::span<const NodeIndex> elements(const Node& list) const noexcept {
+    return children_.span(list.payload, list.count);
   }
   [[nodiscard]] std::span<const NodeIndex> keys(const Node& dictionary) const noexcept {
     return children_.span(dictionary.payload, dictionary.count);

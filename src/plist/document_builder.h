@@ -49,9 +49,8 @@ class DocumentBuilder {
   void integer(std::int64_t value) {
     add({Kind::integer, false, 0, 0, static_cast<std::uint64_t>(value)});
   }
-  void unsignedInteger(std::uint64_t value) { add({Kind::unsignedInteger, false, 0, 0, value}); }
   void boolean(bool value) { add({Kind::boolean, false, 0, 0, value ? 1U : 0U}); }
-  /// A real, date or UID, of which only the kind matters.
+  /// A value of which only the kind matters, since it fits in no field.
   void opaque(Kind kind) { add({kind, false, 0, 0, 0}); }
 
   /// Nothing may be added afterwards.

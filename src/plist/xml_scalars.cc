@@ -49,15 +49,12 @@ bool addInteger(std::string_view text, DocumentBuilder& builder) {
   std::uint64_t magnitude = 0;
   const char* const end = text.data() + text.size();
   const auto [stopped, error] = std::from_chars(text.data(), end, magnitude, hexadecimal ? 16 : 10);
-  if (error != std::errc() || stopped != end) return false;
+  if (error == std::errc::invalid_argument || stopped != end) return false;
   constexpr std::uint64_t kMinimum = std::uint64_t{1} << 63;
-  if (negative) {
-    if (magnitude > kMinimum) return false;
-    builder.integer(static_cast<std::int64_t>(0 - magnitude));
-  } else if (magnitude >= kMinimum) {
-    builder.unsignedInteger(magnitude);
+  if (error != std::errc() || magnitude > (negative ? kMinimum : kMinimum - 1)) {
+    builder.opaque(Kind::wideInteger);
   } else {
-    builder.integer(static_cast<std::int64_t>(magnitude));
+    builder.integer(static_cast<std::int64_t>(negative ? 0 - magnitude : magnitude));
   }
   return true;
 }
@@ -83,15 +80,8 @@ bool isReal(std::string_view text) noexcept {
 bool isDate(std::string_view text) noexcept {
   constexpr std::string_view kShape = "dddd-dd-ddTdd:dd:ddZ";
   text = trimmed(text);
-  if (!std::equal(text.begin(), text.end(), kShape.begin(), kShape.end(),
-                  [](char c, char shape) { return shape == 'd' ? isDigit(c) : c == shape; })) {
-    return false;
-  }
-  const auto in = [text](std::size_t at, int least, int most) {
-    const int number = (text[at] - '0') * 10 + (text[at + 1] - '0');
-    return least <= number && number <= most;
-  };
-  return in(5, 1, 12) && in(8, 1, 31) && in(11, 0, 23) && in(14, 0, 59) && in(17, 0, 60);
+  return std::equal(text.begin(), text.end(), kShape.begin(), kShape.end(),
+                    [](char c, char shape) { return shape == 'd' ? isDigit(c) : c == shape; });
 }
 
 }  // namespace ironmoat::plist

@@ -81,10 +81,12 @@ class XmlWriter {
         return integer(static_cast<std::int64_t>(node.payload));
       case Kind::boolean:
         return line(node.payload != 0 ? "<true/>" : "<false/>");
-      case Kind::unsignedInteger:
+      case Kind::set:
+      case Kind::wideInteger:
       case Kind::real:
       case Kind::date:
       case Kind::uid:
+      case Kind::null:
         break;
     }
     throw std::invalid_argument("a value of a kind that is not written");

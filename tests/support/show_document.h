@@ -25,6 +25,9 @@ inline void show(const Document& document, NodeIndex index, std::string& out) {
         out += ": ";
         show(document, document.values(node)[i], out);
       });
+    case Kind::set:
+      out += "set ";
+      [[fallthrough]];
     case Kind::array:
       return showList('[', ']',
                       [&](std::uint32_t i) { show(document, document.elements(node)[i], out); });
@@ -42,15 +45,16 @@ inline void show(const Document& document, NodeIndex index, std::string& out) {
     case Kind::integer:
       out += std::to_string(static_cast<std::int64_t>(node.payload));
       return;
-    case Kind::unsignedInteger:
-      out += "unsigned " + std::to_string(node.payload);
-      return;
     case Kind::boolean:
       out += node.payload != 0 ? "true" : "false";
       return;
+    case Kind::wideInteger:
+      out += "wide ";
+      [[fallthrough]];
     case Kind::real:
     case Kind::date:
     case Kind::uid:
+    case Kind::null:
       out += nameOf(node.kind);
       return;
   }
