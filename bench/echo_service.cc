@@ -15,10 +15,11 @@
 #include <string>
 
 #include "confinement/confinement.h"
-#include "frames/brief_wait.h"
+#include "confinement/memory.h"
 #include "frames/frame.h"
 #include "frames/frame_assembler.h"
 #include "frames/record_codec.h"
+#include "frames/spin.h"
 #include "messages.h"
 #include "unpackers/corvel_payload_unpacker.h"
 
@@ -50,15 +51,13 @@ bool writeAll(std::string_view bytes) {
 }
 
 ssize_t readSome(std::span<char> room) {
-  static frames::BriefWait wait(std::chrono::microseconds(20));  // the service's
+  static frames::Spin spin;  // as the service does
   ssize_t count = -1;
-  while (count < 0) {
-    const auto look = [&] {
-      count = ::read(STDIN_FILENO, room.data(), room.size());
-      return count >= 0;
-    };
-    wait(look, [] { waitFor(STDIN_FILENO, true); });
-  }
+  const auto look = [&] {
+    count = ::read(STDIN_FILENO, room.data(), room.size());
+    return count >= 0;
+  };
+  while (!look() && !spin(look)) waitFor(STDIN_FILENO, true);
   return count;
 }
 

@@ -12,7 +12,7 @@
 #include <cstdlib>
 #include <string_view>
 
-#include "confinement/confinement.h"
+#include "confinement/memory.h"
 #include "heap_count.h"
 #include "messages.h"
 #include "shapes.h"

@@ -214,7 +214,7 @@ TYPED_TEST(AllocationTest, UnpackingAndServing) {
     BlockBuilder ranOut;
     frames::appendRefusal(
         ranOut, 7,
-        {DecodingError::Kind::limitExceeded, "", "the message takes more memory than there is"});
+        {DecodingError::Kind::notEnoughMemory, "", "not enough memory to decode this message"});
     sweep(serve, {ranOut.bytes(), ranOut.size()});
   }
   EXPECT_GT(allocations, 40);

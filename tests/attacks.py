@@ -24,7 +24,7 @@ import time
 import attack_messages
 
 KINDS = ["malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound",
-         "rejectedByHost"]
+         "rejectedByHost", "notEnoughMemory"]
 OUTPUT_TYPE = b"DrelUserPayload"
 
 
@@ -156,7 +156,7 @@ class Run:
         asked = self.heaviest * self.options.rounds
         begun, counts = time.monotonic(), collections.Counter()
         for number, outcome in self.pipelined(service, [message for _, _, message in asked]):
-            no_memory = outcome == "limitExceeded: the message takes more memory than there is"
+            no_memory = outcome.startswith("notEnoughMemory: ")
             counts["without memory" if no_memory else outcome.partition(":")[0]] += 1
             self.check(no_memory or outcome == asked[number][1],
                        f"at once: {outcome}, alone: {asked[number][1]}")

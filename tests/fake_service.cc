@@ -3,7 +3,7 @@
 // its `command`. How it starts depends on the name that it is run by.
 
 #include <signal.h>
-#include <sys/prctl.h>
+#include <sys/socket.h>
 #include <unistd.h>
 
 #include <charconv>
@@ -110,13 +110,24 @@ void serve(const frames::Request& request) {
   } else if (verb == "takeOver") {  // the next request will be the one to suffer
     takenOver = true;
     answer(id, number);
-  } else if (verb == "ignore") {  // this one only, as when one of several threads hangs
-  } else if (verb == "hang") {
+  } else if (verb == "hang" || verb == "ignore") {
     hang();
   } else if (verb == "close") {
     ::close(STDIN_FILENO);
     ::close(STDOUT_FILENO);
     hang();
+  } else if (verb == "stopReading") {  // the client's next write fails
+    ::shutdown(STDIN_FILENO, SHUT_RD);
+    std::this_thread::sleep_for(50ms);
+    ::close(STDIN_FILENO);
+    ::close(STDOUT_FILENO);
+    hang();
+  } else if (verb == "foresee") {  // a reply to what it will be asked next, it thinks
+    answer(id, number);
+    std::this_thread::sleep_for(5ms);
+    answer(id + 1, number + 40);
+  } else if (verb == "twiceOther") {  // the ids of two requests in flight, in the wrong order
+    answer(~id, number);
   } else if (verb == "nextId") {  // asked for soon, perhaps, but not yet
     answer(id + 1, number);
   } else if (verb == "twice") {
@@ -153,18 +164,20 @@ void serve(const frames::Request& request) {
 }  // namespace
 
 int main(int, char** arguments) {
-  ::prctl(PR_SET_PDEATHSIG, SIGKILL);
+  ::alarm(60);  // whatever becomes of the test
   const std::string name = std::filesystem::path(arguments[0]).filename();
   if (name == "silent") hang();
   if (name == "leaves") return 5;
-  if (name == "fails_to_confine") return 64;
+  if (name == "fails_to_confine") return 65;
   frames::Hello hello = frames::Hello::ours();
   if (name != "unconfined") hello.confinement = frames::kRequiredConfinement;
   if (name == "other_limits") hello.recordBytes /= 2;
   BlockBuilder greeting;
   frames::appendHello(greeting, hello);
   if (name == "garbled") greeting.bytes()[4] ^= 1;
+  if (name == "chatty") greeting.push('x');
   write(greeting);
+  if (name == "leaves_after_hello") return 0;
 
   frames::FrameAssembler assembler(frames::kMaxRequestBody, Sharing::oneThread);
   for (;;) {

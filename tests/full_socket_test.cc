@@ -1,4 +1,4 @@
-// Both directions of the connection full, and times through it. Part of faults_test.
+// Both directions of the connection full. Part of faults_test.
 
 #include <poll.h>
 #include <sys/socket.h>
@@ -36,25 +36,6 @@ std::size_t peakMemory(pid_t pid) {
   return 0;
 }
 constexpr std::size_t kMostMemory = frames::kSanitizedBuild ? 4096 : 256;  // MiB
-
-TEST_F(FaultsTest, BothDirectionsFullAndSlowReaders) {
-  Client::Options options = optionsFor(TEST_SERVER, 60s);
-  options.maxBytesInFlight = kRequests * (large(0).size() + 512);
-  Client client(options);
-  const auto start = Clock::now();
-  std::vector<Pending> all;
-  for (int i = 0; i < kRequests; ++i)
-    all.push_back(client.submit<VeskCommandResponse>(Data(large(i))));
-  for (int i = 0; i < kRequests; ++i) {
-    std::this_thread::sleep_for(5ms);
-    expectEcho(all[i].get(), i);
-  }
-  const std::chrono::duration<double> time = Clock::now() - start;
-  const std::size_t peak = peakMemory(serviceProcess());
-  std::printf("%d requests of %zu MiB in flight: %.1f s, service at most %zu MiB\n", kRequests,
-              large(0).size() >> 20, time.count(), peak);
-  EXPECT_LT(peak, kMostMemory);
-}
 
 /// Writes first, until nothing more is taken; then reads a little at a time. The server neither
 /// grows nor gives up.
@@ -114,36 +95,6 @@ TEST_F(FaultsTest, APeerThatHardlyReads) {
   std::printf("written before any reply was read: %zu MiB; service at most %zu MiB\n", unread >> 20,
               peak);
   EXPECT_LT(peak, kMostMemory);
-}
-
-/// The test server's unpacker is a bare echo, behind the same client, frames, host and confinement.
-TEST_F(FaultsTest, RoundTripsAndFirstReplies) {
-  const struct {
-    const char* name;
-    const char* program;
-  } rows[] = {{"echo", TEST_SERVER}, {"service", SERVICE}};
-  for (const int number : {2, 1}) {
-    const std::string size = ", " + std::to_string(message(number).size()) + " bytes";
-    for (const auto& row : rows) {
-      Client client(optionsFor(row.program));
-      const Data bytes = message(number);
-      Times times;
-      for (int i = 0; i < sized(500, 50'000); ++i) {
-        times.measure(
-            [&] { ASSERT_TRUE(client.unpack<VeskCommandResponse>(bytes).token.has_value()); });
-      }
-      times.print(std::string("round trip, ") + row.name + size);
-    }
-  }
-  for (const auto& row : rows) {
-    Times times;
-    for (int i = 0; i < sized(20, 1000); ++i) {
-      Client client(optionsFor(row.program));
-      times.measure(
-          [&] { ASSERT_TRUE(client.unpack<VeskCommandResponse>(message(2)).token.has_value()); });
-    }
-    times.print(std::string("start to first reply, ") + row.name);
-  }
 }
 
 }  // namespace

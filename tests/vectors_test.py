@@ -146,7 +146,7 @@ class PythonClient(unittest.TestCase):
             nested = head + struct.pack("<I", 1) + nested + bytes(4 * (lists - 1))
         for what, output_type, body in (
                 ("unknown status", response, b"\x04"),
-                ("unknown kind", response, b"\1\6" + refusal[2:]),
+                ("unknown kind", response, b"\1\7" + refusal[2:]),
                 ("path beyond the end", response, refusal[:-1]),
                 ("zero byte in a sentence", response, refusal + b"a\0"),
                 ("no UTF-8 in a sentence", response, b"\3\xff"),

@@ -13,7 +13,7 @@ import sys
 import time
 
 KINDS = ["malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound",
-         "rejectedByHost"]
+         "rejectedByHost", "notEnoughMemory"]
 CONFINED = 0b10_1111_1111  # the bits that a client insists on
 LIMITS = ["message", "memory", "delivered", "reply", "nesting"]  # in bytes, but for the last
 

@@ -1,79 +1,71 @@
 #pragma once
 
 #include <chrono>
-#include <cstddef>
+#include <functional>
 #include <memory>
-#include <string>
+#include <optional>
 
 #include "ironmoat/api.h"
+#include "ironmoat/client_options.h"
 #include "ironmoat/errors.h"
 #include "ironmoat/message_schema.h"
+#include "ironmoat/outcome.h"
 #include "ironmoat/pending.h"
+#include "ironmoat/stats.h"
 #include "ironmoat/values.h"
 
 namespace ironmoat {
 
-/// Hands messages to a service process of its own and gets records back.
+/// Hands messages to service processes and gets records back. Thread-safe; one client serves all
+/// threads of a daemon. For a daemon with an event loop there is EventLoopClient.
 ///
-/// The process is started on first use and again whenever it is gone; it ends with the client. When
-/// it dies or hangs, the messages it had been given are tried again one at a time on a fresh one:
-/// the message that is at fault fails, every other one gets its record. Each request has exactly
-/// one outcome.
+/// `R` is VeskCommandResponse, VeskCommandWebTunnelResponse or DrelUserPayload. Each request has
+/// exactly one outcome: a record, DecodingError (the message was rejected), ServiceError (the
+/// service gave no answer) or std::bad_alloc. A process that dies under a request is replaced and
+/// the request is sent once more; the message that is at fault fails, every other one gets its
+/// record.
 ///
-/// Any number of threads may use one client at once, with any number of requests in flight. The
-/// client keeps one thread, which takes none of the daemon's signals, and changes no signal's
-/// handling; a SIGCHLD comes when its process ends, and a handler that reaps it does no harm. No
-/// call is a point of cancellation. After fork() a client that was used belongs to the parent: in
-/// the child every request fails with `unavailable`, and destroying the copy does nothing.
+/// Processes are started when they are needed, the constructor starts none; a missing service is
+/// `unavailable`. The client changes no signal's handling. The daemon gets a SIGCHLD when a process
+/// ends; a handler that reaps it does no harm. No call is a point of cancellation. After fork() the
+/// client belongs to the parent: in the child every request fails with `unavailable`, and
+/// destroying the copy does nothing.
 class IRONMOAT_API Client {
  public:
-  struct Options {
-    /// Path of the service's executable, started with an empty environment. Empty: the service that
-    /// was installed with this library. The static library looks where it was configured to be
-    /// installed; the shared one first in its own installation, wherever that was moved to, when
-    /// nobody but root and this process's user can change what is there.
-    std::string program;
-    /// How long the service may work on one message, from 1 ms to a day (others are taken as the
-    /// nearest). A request that is past it is tried again, alone, and a second time when another
-    /// had been served before it, before it fails with `timedOut`; waiting for other requests does
-    /// not count.
-    std::chrono::milliseconds deadline{2000};
-    /// Bytes of requests without an outcome, with some 500 more for each request. `submit` and
-    /// `unpack` wait for room, in the order of the calls; a message that is larger goes alone.
-    /// Records are not counted: a message of 28 KB can become one of 64 MiB (limits.h), so that it
-    /// is the number of outcomes held that bounds the daemon's memory.
-    std::size_t maxBytesInFlight = std::size_t{64} << 20;
-  };
+  using Options = ClientOptions;
+  /// A request's own deadline, instead of ClientOptions::deadline.
+  using Deadline = std::optional<std::chrono::milliseconds>;
 
-  Client();
-  explicit Client(Options options);
+  explicit Client(Options options = {});
   Client(const Client&) = delete;
   Client& operator=(const Client&) = delete;
-  /// Requests still in flight fail with ServiceError `unavailable`. Leaves no process, thread or
-  /// descriptor behind.
+  /// Submitted requests without an outcome fail with `unavailable`. No other call may be under way.
+  /// Leaves no process, thread or descriptor behind.
   ~Client();
 
-  /// Waits for the record: R is VeskCommandResponse, VeskCommandWebTunnelResponse or
-  /// DrelUserPayload. Throws DecodingError when the message is refused, ServiceError when no answer
-  /// could be had, std::bad_alloc. The constructor does not look for the service: a missing one is
-  /// `unavailable` here.
+  /// The record; throws what the outcome is otherwise. Works on the calling thread, with a process
+  /// of its own; waits its turn, first come first served, while all processes are in use.
   template <MessageSchema R>
-  R unpack(const Data& message) {
-    return start<R>(message, true).get();
-  }
+  R unpack(const Data& message, Deadline deadline = {});
+  /// The same without exceptions for what comes of the message.
+  template <MessageSchema R>
+  Outcome<R> tryUnpack(const Data& message, Deadline deadline = {});
 
-  /// The same without waiting for the outcome, whose `get` throws what `unpack` would. `message` is
-  /// shared, not copied. Records wait in their outcomes, in the memory of whoever holds these.
+  /// Returns before there is an outcome. The client's one thread, started by the first call, sends
+  /// what was submitted and receives the replies. Waits while ClientOptions::maxBytesInFlight are
+  /// in flight. `message` is shared, not copied.
   template <MessageSchema R>
-  Pending<R> submit(const Data& message) {
-    return start<R>(message, false);
-  }
+  [[nodiscard]] Pending<R> submit(const Data& message, Deadline deadline = {});
+  /// Calls `completion` on the client's thread. It must not throw, and everything submitted waits
+  /// until it returns. It may submit, which does not wait there, but not destroy the client.
+  template <MessageSchema R>
+  void submit(const Data& message, std::function<void(Outcome<R>)> completion,
+              Deadline deadline = {});
+
+  [[nodiscard]] Stats stats() const noexcept;
 
  private:
-  template <MessageSchema R>
-  Pending<R> start(const Data& message, bool waits);
-
-  std::shared_ptr<client::Connection> connection_;
+  std::shared_ptr<client::Core> core_;
 };
 
 }  // namespace ironmoat

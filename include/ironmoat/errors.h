@@ -11,22 +11,22 @@
 
 namespace ironmoat {
 
-/// A message was refused. The same bytes give the same error, always: retrying is useless. The one
-/// exception is a `limitExceeded` for want of memory, where that is scarcer than the limits suppose
-/// (doc/faults.md).
+/// A message was rejected. The same bytes always give the same error, so that retrying is useless.
+/// The one exception is `notEnoughMemory`, which also depends on the machine.
 ///
-/// `what()` is a sentence for people. A service as it should be never repeats the sender's text in
-/// it or in `path()`; one that was taken over may say anything: escape both for a terminal or a
-/// log.
+/// `what()` is a description for people. A service never repeats the sender's text in it or in
+/// `path()`, but one that was taken over may say anything: escape both for a terminal or a log.
 class IRONMOAT_API DecodingError : public std::runtime_error {
  public:
   enum class Kind : std::uint8_t {
-    malformed,       ///< the bytes are no property list; `offset()` says where
-    limitExceeded,   ///< over one of ironmoat/limits.h
-    typeMismatch,    ///< a value of the wrong kind
-    outOfRange,      ///< an integer that does not fit its field
-    keyNotFound,     ///< a required key is missing
-    rejectedByHost,  ///< an output record's initialiser threw; `what()` is its description
+    malformed,        ///< the bytes are no property list; `offset()` says where
+    limitExceeded,    ///< over one of ironmoat/limits.h
+    typeMismatch,     ///< a value of the wrong kind
+    outOfRange,       ///< an integer that does not fit its field
+    keyNotFound,      ///< a required key is missing
+    rejectedByHost,   ///< an output record's initialiser threw; `what()` is its description
+    notEnoughMemory,  ///< decoding took more memory than the service has; see
+                      ///< `Stats::limitedMemory`
   };
 
   DecodingError(Kind kind, std::string path, const std::string& message,

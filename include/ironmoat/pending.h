@@ -7,20 +7,20 @@
 
 #include "ironmoat/api.h"
 #include "ironmoat/message_schema.h"
+#include "ironmoat/outcome.h"
 
 namespace ironmoat {
 
 namespace client {
-class Connection;
-class Request;
+struct Core;
+class SubmittedRequest;
 }  // namespace client
 
-/// The outcome of one request, used as a std::future is. Unlike one it lets the thread that waits
-/// read the replies itself, so that no other has to be woken for each.
+/// The outcome-to-be of a request, used as a std::future is.
 ///
-/// May outlive its client, whose end is an outcome, too; without being asked, the request goes on
-/// all the same. Any thread may use it, one at a time. After fork() it belongs to the parent: in
-/// the child what had no outcome then is `unavailable`.
+/// May outlive its client: destroying the client completes the request with `unavailable`.
+/// Destroying a Pending does not cancel its request. Any thread may use it, one at a time. After
+/// fork() it belongs to the parent: in the child a request without an outcome is `unavailable`.
 template <MessageSchema R>
 class IRONMOAT_API Pending {
  public:
@@ -28,15 +28,17 @@ class IRONMOAT_API Pending {
   Pending(Pending&&) noexcept = default;
   Pending& operator=(Pending&&) noexcept = default;
 
-  /// It stands for a request, and `get` was not called: required by all below.
+  /// Stands for a request whose outcome was not taken: required by everything below.
   [[nodiscard]] bool valid() const noexcept { return request_ != nullptr; }
 
-  /// Waits for the record. Throws DecodingError when the message is refused, ServiceError when no
-  /// answer could be had, std::bad_alloc.
+  /// Waits for the record. Throws DecodingError when the message was rejected, ServiceError when
+  /// the service gave no answer, and std::bad_alloc.
   R get();
+  /// Waits for the outcome; throws nothing for what it is.
+  Outcome<R> outcome();
   void wait() const { static_cast<void>(waitUntil(Clock::time_point::max())); }
   // NOLINTBEGIN(readability-identifier-naming): std::future's names
-  /// `ready` or, when the time is up, `timeout`; with no time at all it looks what has come.
+  /// `ready`, or `timeout` when the time is up. A time of zero or less only looks.
   template <class Rep, class Period>
   std::future_status wait_for(const std::chrono::duration<Rep, Period>& time) const {
     const Seconds seconds = time;
@@ -54,14 +56,14 @@ class IRONMOAT_API Pending {
  private:
   friend class Client;
   using Clock = std::chrono::steady_clock;
-  using Seconds = std::chrono::duration<long double>;  // no time overflows in it
+  using Seconds = std::chrono::duration<long double>;  // no time overflows it
 
-  Pending(std::shared_ptr<client::Request> request, std::shared_ptr<client::Connection> connection)
-      : request_(std::move(request)), connection_(std::move(connection)) {}
+  Pending(std::shared_ptr<client::SubmittedRequest> request, std::shared_ptr<client::Core> core)
+      : request_(std::move(request)), core_(std::move(core)) {}
   std::future_status waitUntil(Clock::time_point until) const;
 
-  std::shared_ptr<client::Request> request_;
-  std::shared_ptr<client::Connection> connection_;
+  std::shared_ptr<client::SubmittedRequest> request_;
+  std::shared_ptr<client::Core> core_;
 };
 
 }  // namespace ironmoat

@@ -1,127 +1,175 @@
 #include "ironmoat/client.h"
 
-#include <exception>
+#include <pthread.h>
+
 #include <memory>
 #include <new>
-#include <optional>
 #include <string>
+#include <system_error>
 #include <utility>
 
-#include "client/connection.h"
-#include "client/default_program.h"
-#include "frames/record_codec.h"
+#include "client/core.h"
+#include "client/early_failure.h"
+#include "client/record_request.h"
 #include "ironmoat/command_response.h"
-#include "ironmoat/limits.h"
 #include "ironmoat/user_payload.h"
 #include "ironmoat/web_tunnel_response.h"
-#include "values/host_rejection.h"
 
 namespace ironmoat {
 
 namespace {
 
-template <MessageSchema R>
-class RequestFor final : public client::Request {
+using client::Core;
+using client::RecordRequest;
+using client::Request;
+using client::SubmittedRequest;
+
+/// A call on the stack of the thread that makes it.
+class Call : public Request {
  public:
-  explicit RequestFor(const Data& message) : Request(R::schemaName, message) {}
+  using Request::Request;
+  void deliver() noexcept override {}
+};
 
-  /// The outcome, once; requires that there is one.
-  R take() {
-    if (error_ != nullptr) std::rethrow_exception(std::move(error_));
-    return *std::move(record_);
-  }
-
- protected:
-  void giveError(std::exception_ptr error) noexcept override { error_ = std::move(error); }
-  void give(const frames::Reply& reply) override {
-    switch (reply.status) {
-      case frames::Status::record:
-        return giveRecord(reply.body);
-      case frames::Status::refused:
-        return giveError(std::make_exception_ptr(frames::parseRefusal(reply.body)));
-      case frames::Status::notServed:
-      case frames::Status::failed:
-        return giveError(std::make_exception_ptr(
-            ServiceError(ServiceError::Kind::unavailable, frames::parseSentence(reply.body))));
-    }
-    throw frames::FrameError("a reply of unknown status");
-  }
+template <MessageSchema R>
+class CompletedRequest final : public RecordRequest<R, SubmittedRequest> {
+ public:
+  CompletedRequest(const Data& message, client::Clock::duration deadline,
+                   std::function<void(Outcome<R>)> completion)
+      : RecordRequest<R, SubmittedRequest>(message, deadline, true),
+        completion_(std::move(completion)) {}
+  void deliver() noexcept override { completion_(this->take()); }
 
  private:
-  void giveRecord(const Data& body) {
-    try {
-      withHostRejections([&] { record_.emplace(InPlace{body}); });
-    } catch (const frames::RecordError&) {
-      throw;
-    } catch (...) {  // a DecodingError, or std::bad_alloc
-      giveError(std::current_exception());
-    }
-  }
-
-  /// Becomes the record where that is to stand, which spares the largest one a move of 2 KB.
-  struct InPlace {
-    const Data& body;
-    operator R() const { return frames::decodeRecord<R>(body); }  // NOLINT(*-explicit-*)
-  };
-
-  std::optional<R> record_;
-  std::exception_ptr error_;
+  std::function<void(Outcome<R>)> completion_;
 };
+
+/// The calling thread is not cancelled while it has what others wait for.
+class Uncancelled {
+ public:
+  Uncancelled() noexcept { ::pthread_setcancelstate(PTHREAD_CANCEL_DISABLE, &before_); }
+  Uncancelled(const Uncancelled&) = delete;
+  Uncancelled& operator=(const Uncancelled&) = delete;
+  ~Uncancelled() { ::pthread_setcancelstate(before_, nullptr); }
+
+ private:
+  int before_ = 0;
+};
+
+client::Clock::duration deadlineOf(const Core& core, Client::Deadline own) noexcept {
+  return own ? client::validDeadline(*own) : core.settings.deadline;
+}
+
+void run(Core& core, Request& request) {
+  if (failsEarly(request, core.forkMark, core.counters)) return;
+  const Uncancelled whole;
+  const client::InFlight counted(core.counters, request.message().size());
+  core.pool.run(std::shared_ptr<Request>(std::shared_ptr<void>(), &request));
+}
+
+void submitTo(Core& core, const std::shared_ptr<SubmittedRequest>& request) {
+  const Uncancelled whole;
+  try {
+    if (!failsEarly(*request, core.forkMark, core.counters)) return core.engine.submit(request);
+  } catch (const std::system_error& error) {
+    request->fail(ServiceError(ServiceError::Kind::unavailable,
+                               std::string("cannot start the client's thread: ") + error.what()));
+  }
+  client::SharedEngine::complete(*request);
+}
 
 }  // namespace
 
-Client::Client() : Client(Options()) {}
-
-Client::Client(Options options) {
-  if (options.program.empty()) options.program = client::defaultProgram();
-  connection_ = std::make_shared<client::Connection>(std::move(options));
-}
+Client::Client(Options options) : core_(std::make_shared<Core>(std::move(options))) {}
 
 Client::~Client() {
-  if (connection_->inForkedChild()) {
-    // Everything that its end would do acts on the parent's service: it is never to end.
-    static_cast<void>(new (std::nothrow) std::shared_ptr(connection_));
+  if (core_->forkMark.inCopy()) {
+    // Everything that its end would do acts on the parent's processes: it is never to end.
+    static_cast<void>(new (std::nothrow) std::shared_ptr(core_));
   } else {
-    connection_->stop();
+    const Uncancelled whole;
+    core_->engine.stop();
+    core_->pool.end();
   }
 }
 
 template <MessageSchema R>
-Pending<R> Client::start(const Data& message, bool waits) {
-  using Then = client::Connection::Then;
-  auto request = std::make_shared<RequestFor<R>>(message);
-  Pending<R> outcome(request, connection_);
-  if (message.size() > limits::messageBytes) {
-    request->fail(std::make_exception_ptr(
-        DecodingError(DecodingError::Kind::limitExceeded, "",
-                      "message of " + std::to_string(message.size()) + " bytes, more than " +
-                          std::to_string(limits::messageBytes))));
-  } else {
-    connection_->submit(std::move(request), waits ? Then::waits : Then::returns);
+R Client::unpack(const Data& message, Deadline deadline) {
+  RecordRequest<R, Call> request(message, deadlineOf(*core_, deadline));
+  run(*core_, request);
+  return request.takeRecord();
+}
+
+template <MessageSchema R>
+Outcome<R> Client::tryUnpack(const Data& message, Deadline deadline) {
+  try {
+    RecordRequest<R, Call> request(message, deadlineOf(*core_, deadline));
+    run(*core_, request);
+    return request.take();
+  } catch (const std::bad_alloc& error) {
+    return Outcome<R>(error);
   }
-  return outcome;
+}
+
+template <MessageSchema R>
+Pending<R> Client::submit(const Data& message, Deadline deadline) {
+  auto request =
+      std::make_shared<RecordRequest<R, SubmittedRequest>>(message, deadlineOf(*core_, deadline));
+  submitTo(*core_, request);
+  return Pending<R>(std::move(request), core_);
+}
+
+template <MessageSchema R>
+void Client::submit(const Data& message, std::function<void(Outcome<R>)> completion,
+                    Deadline deadline) {
+  submitTo(*core_, std::make_shared<CompletedRequest<R>>(message, deadlineOf(*core_, deadline),
+                                                         std::move(completion)));
+}
+
+Stats Client::stats() const noexcept {
+  Stats stats = core_->counters.snapshot();
+  if (!core_->forkMark.inCopy()) core_->engine.addTo(stats);
+  return stats;
 }
 
 template <MessageSchema R>
 std::future_status Pending<R>::waitUntil(Clock::time_point until) const {
-  return request_->isDone() || connection_->await(*request_, until) ? std::future_status::ready
-                                                                    : std::future_status::timeout;
+  if (request_->isDone()) return std::future_status::ready;
+  if (core_->forkMark.inCopy()) {
+    request_->fail(ServiceError(ServiceError::Kind::unavailable,
+                                "this request belongs to the process that forked this one"));
+    return std::future_status::ready;
+  }
+  const Uncancelled whole;
+  return core_->engine.await(*request_, until) ? std::future_status::ready
+                                               : std::future_status::timeout;
+}
+
+template <MessageSchema R>
+Outcome<R> Pending<R>::outcome() {
+  wait();
+  core_.reset();
+  const std::shared_ptr<SubmittedRequest> request = std::move(request_);
+  return static_cast<RecordRequest<R, SubmittedRequest>&>(*request).take();
 }
 
 template <MessageSchema R>
 R Pending<R>::get() {
   wait();
-  connection_.reset();
-  const std::shared_ptr<client::Request> request = std::move(request_);
-  return static_cast<RequestFor<R>&>(*request).take();
+  core_.reset();
+  const std::shared_ptr<SubmittedRequest> request = std::move(request_);
+  return static_cast<RecordRequest<R, SubmittedRequest>&>(*request).takeRecord();
 }
 
-// Two lines for each record that the service serves.
-template Pending<VeskCommandResponse> Client::start(const Data&, bool);
-template Pending<VeskCommandWebTunnelResponse> Client::start(const Data&, bool);
-template Pending<DrelUserPayload> Client::start(const Data&, bool);
-template class Pending<VeskCommandResponse>;
-template class Pending<VeskCommandWebTunnelResponse>;
-template class Pending<DrelUserPayload>;
+#define IRONMOAT_CLIENT_FOR(R)                                                          \
+  template R Client::unpack(const Data&, Deadline);                                     \
+  template Outcome<R> Client::tryUnpack(const Data&, Deadline);                         \
+  template Pending<R> Client::submit(const Data&, Deadline);                            \
+  template void Client::submit(const Data&, std::function<void(Outcome<R>)>, Deadline); \
+  template class Pending<R>
+
+IRONMOAT_CLIENT_FOR(VeskCommandResponse);
+IRONMOAT_CLIENT_FOR(VeskCommandWebTunnelResponse);
+IRONMOAT_CLIENT_FOR(DrelUserPayload);
 
 }  // namespace ironmoat

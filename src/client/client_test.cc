@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <poll.h>
 #include <pthread.h>
 #include <signal.h>
 #include <sys/wait.h>
@@ -9,15 +10,16 @@
 
 #include <atomic>
 #include <cerrno>
-#include <exception>
 #include <filesystem>
+#include <future>
 #include <memory>
+#include <mutex>
 #include <string>
 #include <thread>
 #include <vector>
 
-#include "client/connection.h"
 #include "ironmoat/command_response.h"
+#include "ironmoat/event_loop_client.h"
 #include "ironmoat/limits.h"
 #include "support/leaves_nothing.h"
 
@@ -60,23 +62,80 @@ std::vector<Pending> submitEchoes(Client& client, int count) {
   return all;
 }
 
-/// What comes of it, as text: the record's number, or the error.
-template <class Call>
-std::string textOf(Call record) {
+using Outcome = ironmoat::Outcome<ironmoat::VeskCommandResponse>;
+
+/// An outcome as text: the record's number, or the error.
+std::string inWords(const Outcome& outcome) {
+  if (outcome) return std::to_string(outcome->command);
+  if (const auto* const error = outcome.serviceError()) {
+    return std::string(nameOf(error->kind())) + ": " + error->what();
+  }
+  const auto* const error = outcome.decodingError();
+  return std::string(nameOf(error->kind())) + " at " + error->path() + ": " + error->what();
+}
+std::string outcome(Client& client, const std::string& message) {
+  return inWords(client.tryUnpack<VeskCommandResponse>(Data(message)));
+}
+std::string outcome(Pending& pending) { return inWords(pending.outcome()); }
+
+/// A loop around an EventLoopClient, until `count` completions were called.
+class Loop {
+ public:
+  explicit Loop(Client::Options options) : client_(std::move(options)) {}
+  EventLoopClient::Handle submit(const std::string& message) {
+    const std::size_t index = outcomes_.size();
+    outcomes_.emplace_back();
+    return client_.submit<VeskCommandResponse>(Data(message), [this, index](Outcome outcome) {
+      outcomes_[index] = inWords(outcome);
+      ++completed_;
+    });
+  }
+  const std::vector<std::string>& run(std::size_t count) {
+    while (completed_ < count) {
+      pollfd ready = {client_.fd(), POLLIN, 0};
+      ::poll(&ready, 1, client_.timeout());
+      client_.dispatch();
+    }
+    return outcomes_;
+  }
+  EventLoopClient& client() { return client_; }
+
+ private:
+  EventLoopClient client_;
+  std::vector<std::string> outcomes_;
+  std::size_t completed_ = 0;
+};
+
+/// Every way to get an outcome.
+std::string throughUnpack(Client::Options options, const std::string& message) {
+  Client client(std::move(options));
   try {
-    return std::to_string(record().command);
+    return std::to_string(client.unpack<VeskCommandResponse>(Data(message)).command);
   } catch (const ServiceError& error) {
     return std::string(nameOf(error.kind())) + ": " + error.what();
   } catch (const DecodingError& error) {
     return std::string(nameOf(error.kind())) + " at " + error.path() + ": " + error.what();
   }
 }
-std::string outcome(Client& client, const std::string& message) {
-  return textOf([&] { return client.unpack<VeskCommandResponse>(Data(message)); });
+std::string throughPending(Client::Options options, const std::string& message) {
+  Client client(std::move(options));
+  Pending pending = submit(client, message);
+  return outcome(pending);
 }
-std::string outcome(Pending& pending) {
-  return textOf([&] { return pending.get(); });
+std::string throughCompletion(Client::Options options, const std::string& message) {
+  Client client(std::move(options));
+  std::promise<std::string> outcome;
+  client.submit<VeskCommandResponse>(
+      Data(message), [&](Outcome completed) { outcome.set_value(inWords(completed)); });
+  return outcome.get_future().get();
 }
+std::string throughLoop(Client::Options options, const std::string& message) {
+  Loop loop(std::move(options));
+  loop.submit(message);
+  return loop.run(1)[0];
+}
+constexpr auto kWays = {throughUnpack, throughPending, throughCompletion, throughLoop};
+
 void expectEchoes(std::vector<Pending>& all) {
   for (std::size_t i = 0; i < all.size(); ++i) EXPECT_EQ(outcome(all[i]), std::to_string(i));
 }
@@ -86,18 +145,30 @@ class ClientTest : public testing::LeavesNothing {
   static void TearDownTestSuite() { std::filesystem::remove_all(ownFolder()); }
 };
 
-TEST_F(ClientTest, EachKindOfReplyIsItsOutcome) {
-  Client client(fake());
-  EXPECT_EQ(outcome(client, "echo -3"), "-3");
-  EXPECT_EQ(outcome(client, "refuse"), "typeMismatch at a[1].b: expected data");
-  EXPECT_EQ(outcome(client, "notServed"), "unavailable: nobody unpacks this");
-  EXPECT_EQ(outcome(client, std::string(limits::messageBytes + 1, 'x')),
-            "limitExceeded at : message of 16777217 bytes, more than 16777216");
-  EXPECT_EQ(outcome(client, "echo 1" + std::string(limits::messageBytes - 6, ' ')), "1");
+TEST_F(ClientTest, GivesEachReplyAsItsOutcomeInEveryWay) {
+  const struct {
+    std::string message;
+    std::string outcome;
+  } rows[] = {
+      {"echo -3", "-3"},
+      {"refuse", "typeMismatch at a[1].b: expected data"},
+      {"notServed", "unavailable: nobody unpacks this"},
+      {"exit 3", "crashed: the service exited with status 3 over this message"},
+      {"hang", "timedOut: no reply within 200 ms"},
+      {std::string(limits::messageBytes + 1, 'x'),
+       "limitExceeded at : message of 16777217 bytes exceeds the limit of 16777216"},
+      {"echo 1" + std::string(limits::messageBytes - 6, ' '), "1"},
+  };
+  for (const auto& row : rows) {
+    const bool hangs = row.message == "hang";
+    for (const auto way : kWays) {
+      EXPECT_EQ(way(fake(hangs ? 200ms : 20s), row.message), row.outcome);
+    }
+  }
 }
 
 // S14, S15.
-TEST_F(ClientTest, TheCulpritFailsAndItsNeighboursDoNot) {
+TEST_F(ClientTest, FailsTheCulpritAndNotItsNeighbours) {
   const struct {
     std::string message;
     std::string service;
@@ -106,7 +177,9 @@ TEST_F(ClientTest, TheCulpritFailsAndItsNeighboursDoNot) {
       {"words", "was killed by SIGABRT (last words of it) over this message"},
       {"exit 3", "exited with status 3 over this message"},
       {"close", "closed its connection over this message"},
+      {"stopReading", "closed its connection over this message"},
       {"nextId", "sent a broken frame over this message: a reply to no request"},
+      {"twiceOther", "sent a broken frame over this message: a reply to no request"},
       {"absurdLength", "sent a broken frame over this message: "},
       {"badRecord", "sent a broken record over this message: "},
       {"badStatus", "sent a broken frame over this message: "},
@@ -127,16 +200,31 @@ TEST_F(ClientTest, TheCulpritFailsAndItsNeighboursDoNot) {
   }
 }
 
-TEST_F(ClientTest, ATakenOverServiceHarmsNobodyElse) {
-  Client client(fake(300ms));
-  for (const char* first : {"takeOver 1", "twice 1", "unasked 1"}) {
+TEST_F(ClientTest, BelievesNothingThatWasNotAskedFor) {
+  for (const char* first : {"takeOver 1", "twice 1", "unasked 1", "foresee 1"}) {
+    Client client(fake(300ms));
     EXPECT_EQ(outcome(client, first), "1") << "answered before it shows";
-    EXPECT_EQ(outcome(client, "echo 2"), "2");
+    std::this_thread::sleep_for(20ms);
+    const auto start = std::chrono::steady_clock::now();
+    EXPECT_EQ(outcome(client, "echo 2"), "2") << first;
+    EXPECT_LT(std::chrono::steady_clock::now() - start, 200ms) << first << " waited for a deadline";
+    EXPECT_EQ(client.stats().started, 2U) << first;
   }
 }
 
-TEST_F(ClientTest, OnlyTheRequestThatHangsTimesOut) {
-  for (const char* message : {"ignore", "hang", "drip"}) {
+TEST_F(ClientTest, StopsStartingAServiceThatNeverAnswers) {
+  for (const char* name : {"chatty", "leaves_after_hello", "leaves"}) {
+    Client client(options(fakeCalled(name), 2s));
+    for (int i = 0; i < 3; ++i) {
+      const std::string got = outcome(client, "echo 1");
+      EXPECT_TRUE(got.starts_with("unavailable: ") || got.starts_with("crashed: ")) << got;
+    }
+    EXPECT_LE(client.stats().started, 7U) << name;
+  }
+}
+
+TEST_F(ClientTest, TimesOutOnlyTheRequestThatHangs) {
+  for (const char* message : {"hang", "drip"}) {
     Client client(fake(300ms));
     auto before = submitEchoes(client, 10);
     Pending culprit = submit(client, message);
@@ -212,23 +300,6 @@ TEST_F(ClientTest, OutcomesComeWhoeverWaitsForThem) {
   expectEchoes(unheard);
 }
 
-/// What submits and then waits can be held up in between, for longer than the deadline.
-TEST_F(ClientTest, WhoComesLateToWaitIsHeard) {
-  struct Plain final : client::Request {
-    Plain() : Request(VeskCommandResponse::schemaName, Data("echo 1")) {}
-    void give(const frames::Reply& /*reply*/) override {}
-    void giveError(std::exception_ptr /*error*/) noexcept override {}
-  };
-  client::Connection connection(fake(20ms));
-  for (const auto late : {0ms, 40ms}) {
-    const auto request = std::make_shared<Plain>();
-    std::this_thread::sleep_for(late);  // the client's thread falls asleep
-    connection.submit(request, client::Connection::Then::waits);
-    std::this_thread::sleep_for(late);
-    EXPECT_TRUE(connection.await(*request, std::chrono::steady_clock::now() + 10s));
-  }
-}
-
 TEST_F(ClientTest, WhoeverIsCancelledHoldsUpNobody) {
   Client::Options all = fake();
   all.maxBytesInFlight = 1200;
@@ -256,20 +327,20 @@ TEST_F(ClientTest, WhoeverIsCancelledHoldsUpNobody) {
   EXPECT_EQ(outcome(client, "echo 4"), "4");
 }
 
-TEST_F(ClientTest, WhatCannotServeIsUnavailable) {
+TEST_F(ClientTest, IsUnavailableWithoutAUsableService) {
   const struct {
     std::string program;
     std::string outcome;
   } rows[] = {
       {"/nonexistent/service", "cannot start /nonexistent/service: No such file or directory"},
       {"/", "cannot start /: Permission denied"},
-      {"/bin/ls", "/bin/ls sent a broken frame: "},
-      {fakeCalled("leaves"), "leaves exited with status 5 before it greeted"},
-      {fakeCalled("fails_to_confine"), "cannot be had: system call filter) before it greeted"},
-      {fakeCalled("unconfined"), "unconfined cannot be used: it is not confined: "},
-      {fakeCalled("garbled"), "garbled sent a broken frame: "},
-      {fakeCalled("other_limits"), "other_limits cannot be used: its limits are not those"},
-      {fakeCalled("silent"), "silent did not greet in time"},
+      {"/bin/ls", "/bin/ls is unusable: "},
+      {fakeCalled("leaves"), "leaves exited with status 5 before its hello"},
+      {fakeCalled("fails_to_confine"), "part of its sandbox: no new privileges) before its hello"},
+      {fakeCalled("unconfined"), "unconfined is unusable: its sandbox lacks: "},
+      {fakeCalled("garbled"), "garbled is unusable: "},
+      {fakeCalled("other_limits"), "other_limits is unusable: its limits differ"},
+      {fakeCalled("silent"), "silent sent no hello before the start deadline"},
   };
   for (const auto& row : rows) {
     Client client(options(row.program, 1ms));
@@ -290,7 +361,126 @@ TEST_F(ClientTest, AServiceThatComesBackIsUsed) {
   EXPECT_EQ(outcome(client, "echo 1"), "1");
 }
 
-TEST_F(ClientTest, TheServiceInheritsNothing) {
+/// Calls `act` in so many threads at once and waits for them.
+template <class Act>
+void inThreads(int count, Act act) {
+  std::vector<std::thread> threads;
+  for (int i = 0; i < count; ++i) threads.emplace_back([&act, i] { act(i); });
+  for (std::thread& thread : threads) thread.join();
+}
+
+TEST_F(ClientTest, RunsAsManyProcessesAsAreBusyUpToTheLimit) {
+  Client::Options all = fake();
+  all.processes = 3;
+  all.idleTime = 500ms;
+  Client client(all);
+  for (int i = 0; i < 5; ++i) EXPECT_EQ(outcome(client, "echo 1"), "1");
+  EXPECT_EQ(client.stats().started, 1U) << "one caller at a time";
+  const auto start = std::chrono::steady_clock::now();
+  inThreads(6, [&](int) { EXPECT_EQ(outcome(client, "slow 100"), "100"); });
+  const auto took = std::chrono::steady_clock::now() - start;
+  EXPECT_GE(took, 200ms);
+  EXPECT_EQ(client.stats().started, 3U);
+  std::this_thread::sleep_for(600ms);
+  for (int i = 0; i < 5; ++i) EXPECT_EQ(outcome(client, "echo 1"), "1");
+  EXPECT_EQ(client.stats().started - client.stats().ended, 1U) << "idle ones have been ended";
+}
+
+TEST_F(ClientTest, ServesCallersInTheirOrder) {
+  Client::Options all = fake();
+  all.processes = 1;
+  Client client(all);
+  std::mutex mutex;
+  std::vector<int> order;
+  inThreads(5, [&](int i) {
+    std::this_thread::sleep_for(i * 40ms);
+    EXPECT_EQ(outcome(client, i == 0 ? "slow 300" : "slow 1"), i == 0 ? "300" : "1");
+    const std::lock_guard lock(mutex);
+    order.push_back(i);
+  });
+  EXPECT_EQ(order, (std::vector<int>{0, 1, 2, 3, 4}));
+}
+
+TEST_F(ClientTest, LetsNothingSlowOrLargeHoldUpOthers) {
+  Client::Options all = fake();
+  all.processes = 2;
+  Loop loop(all);
+  loop.submit("slow 400");
+  loop.submit("slow 5" + std::string(std::size_t{1} << 20, ' '));
+  for (int i = 0; i < 20; ++i) loop.submit("echo " + std::to_string(i));
+  const auto start = std::chrono::steady_clock::now();
+  EXPECT_EQ(loop.run(21)[0], "") << "the slow one is the last";
+  EXPECT_LT(std::chrono::steady_clock::now() - start, 300ms);
+  EXPECT_EQ(loop.run(22)[0], "400");
+}
+
+TEST_F(ClientTest, ReplacesProcessesWithoutARequestNoticing) {
+  Client::Options old = fake();
+  old.requestsPerProcess = 10;
+  Client client(old);
+  for (int i = 0; i < 200; ++i) {
+    ASSERT_EQ(outcome(client, "echo 1"), "1");
+    std::this_thread::sleep_for(100us);
+  }
+  EXPECT_GE(client.stats().retired, 4U);
+  EXPECT_EQ(client.stats().retried, 0U);
+
+  Client slow(fake(100ms));
+  for (int i = 0; i < 3; ++i) EXPECT_EQ(outcome(slow, "slow 70"), "70");
+  for (int i = 0; i < 50 && slow.stats().retired == 0; ++i) {
+    std::this_thread::sleep_for(1ms);
+    EXPECT_EQ(outcome(slow, "echo 1"), "1");
+  }
+  EXPECT_EQ(slow.stats().retired, 1U) << "answers just in time, again and again";
+}
+
+TEST_F(ClientTest, CountsWhatItDoes) {
+  Client client(fake(200ms));
+  for (const char* message : {"echo 1", "echo 2", "refuse", "exit 1", "hang", "notServed"}) {
+    outcome(client, message);
+  }
+  Pending pending = submit(client, "slow 50");
+  EXPECT_EQ(client.stats().inFlight, 1U);
+  EXPECT_EQ(client.stats().bytesInFlight, 7U);
+  EXPECT_EQ(outcome(pending), "50");
+  const Stats stats = client.stats();
+  EXPECT_EQ(stats.accepted, 3U);
+  EXPECT_EQ(stats.rejected[static_cast<int>(DecodingError::Kind::typeMismatch)], 1U);
+  EXPECT_EQ(stats.crashed, 1U);
+  EXPECT_EQ(stats.timedOut, 1U);
+  EXPECT_EQ(stats.unavailable, 1U);
+  EXPECT_EQ(stats.retried, 1U);
+  EXPECT_EQ(stats.started - stats.ended, 2U);
+  EXPECT_EQ(stats.inFlight, 0U);
+}
+
+TEST_F(ClientTest, TakesADeadlineForEachRequest) {
+  Client client(fake(20s));
+  const auto late = client.tryUnpack<VeskCommandResponse>(Data(std::string("hang")), 100ms);
+  EXPECT_EQ(inWords(late), "timedOut: no reply within 100 ms");
+  Pending pending = client.submit<VeskCommandResponse>(Data(std::string("hang")), 100ms);
+  EXPECT_EQ(outcome(pending), "timedOut: no reply within 100 ms");
+}
+
+TEST_F(ClientTest, CancelsARequestOfALoop) {
+  Loop loop(fake(20s));
+  loop.submit("slow 50");
+  const auto inFlight = loop.submit("hang");
+  loop.client().dispatch();
+  const auto unsent = loop.submit("hang");
+  EXPECT_TRUE(loop.client().cancel(unsent));
+  loop.run(1);
+  EXPECT_TRUE(loop.client().cancel(inFlight));
+  loop.submit("echo 7");
+  const auto done = loop.submit("echo 8");
+  const auto outcomes = loop.run(3);
+  EXPECT_EQ(outcomes[1] + outcomes[2], "");
+  EXPECT_EQ(outcomes[3] + outcomes[4], "78");
+  EXPECT_FALSE(loop.client().cancel(done));
+  EXPECT_EQ(loop.client().stats().cancelled, 1U) << "the other has not been answered yet";
+}
+
+TEST_F(ClientTest, GivesTheServiceNothingOfTheDaemons) {
   const int descriptor = ::open("/dev/null", O_RDONLY);  // without CLOEXEC
   sigset_t blocked;
   sigset_t before;

@@ -1,13 +1,15 @@
 #pragma once
 
-#include <string>
-
 #include "frames/frame.h"
 
 namespace ironmoat::client {
 
-/// Why a service that greets so is not to be used, by its limits or by a part of its confinement
-/// that is missing; empty when it may be.
-std::string objectionTo(const frames::Hello& hello);
+/// Throws frames::FrameError unless a service with this hello has this library's limits and every
+/// required part of the sandbox.
+void requireUsable(const frames::Hello& hello);
+
+/// The service runs in an address space below the one that the limits suppose, so that it may
+/// reject a good message for want of memory.
+[[nodiscard]] bool hasLimitedMemory(const frames::Hello& hello) noexcept;
 
 }  // namespace ironmoat::client

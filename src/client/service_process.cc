@@ -20,14 +20,14 @@ namespace ironmoat::client {
 
 namespace {
 
-constexpr std::size_t kMostWords = 400;
+constexpr std::size_t kMaxWords = 400;
 constexpr auto kPidfd = static_cast<idtype_t>(3);  // P_PIDFD, which older <sys/wait.h> lack
 
 [[noreturn]] void throwStartError(const std::string& program, int error) {
   const bool passing =
       error == EAGAIN || error == ENOMEM || error == EMFILE || error == ENFILE || error == ETXTBSY;
   throw StartError("cannot start " + program + ": " + std::generic_category().message(error),
-                   passing);
+                   !passing);
 }
 
 /// posix_spawn's attribute objects, which want to be given back.
@@ -45,7 +45,8 @@ struct SpawnSettings {
     sigemptyset(&none);
     posix_spawnattr_setsigdefault(&attributes, &all);
     posix_spawnattr_setsigmask(&attributes, &none);
-    posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF | POSIX_SPAWN_SETSIGMASK);
+    posix_spawnattr_setflags(&attributes,
+                             POSIX_SPAWN_SETSIGDEF | POSIX_SPAWN_SETSIGMASK | POSIX_SPAWN_SETSID);
     error = posix_spawn_file_actions_adddup2(&actions, socket, STDIN_FILENO);
     if (error == 0) error = posix_spawn_file_actions_adddup2(&actions, socket, STDOUT_FILENO);
     if (error == 0) error = posix_spawn_file_actions_adddup2(&actions, words, STDERR_FILENO);
@@ -59,23 +60,10 @@ struct SpawnSettings {
   }
 };
 
-/// A pidfd of our child, or -1. Where the daemon lets its children be reaped by themselves, the id
-/// may have passed to a stranger by now: a process that is no child of ours is not taken.
-int pidfdOfChild(pid_t pid) noexcept {
-  const int fd = static_cast<int>(::syscall(SYS_pidfd_open, pid, 0));
-  siginfo_t info;
-  if (fd >= 0 && ::waitid(kPidfd, static_cast<id_t>(fd), &info, WEXITED | WNOHANG | WNOWAIT) != 0) {
-    ::close(fd);
-    errno = ECHILD;
-    return -1;
-  }
-  return fd;
-}
-
 std::string exitWord(int status) {
   std::string word = "exited with status " + std::to_string(status);
   if (const auto* const lack = frames::lackToldBy(status)) {
-    word += " (this part of its confinement cannot be had: " + std::string(lack->name) + ")";
+    word += " (unavailable part of its sandbox: " + std::string(lack->name) + ")";
   }
   return word;
 }
@@ -89,8 +77,9 @@ ServiceProcess ServiceProcess::start(const std::string& program) {
   }
   FileDescriptor ours(ends[0]);
   FileDescriptor theirs(ends[1]);
-  // The end that is read does not wait; the service's does, so that abort's words come whole.
-  if (::pipe2(ends, O_CLOEXEC) != 0) throwStartError(program, errno);
+  // Packet mode tells the service what the pipe is for. Its end blocks, so that the last words of
+  // abort() arrive whole.
+  if (::pipe2(ends, O_CLOEXEC | O_DIRECT) != 0) throwStartError(program, errno);
   FileDescriptor words(ends[0]);
   FileDescriptor theirWords(ends[1]);
   // Above the standard three, also in a daemon that has closed its own: otherwise the child's dup2
@@ -102,7 +91,7 @@ ServiceProcess ServiceProcess::start(const std::string& program) {
     *end = FileDescriptor(moved);
   }
   if (::fcntl(ours.get(), F_SETFL, O_NONBLOCK) != 0 ||
-      ::fcntl(words.get(), F_SETFL, O_NONBLOCK) != 0) {
+      ::fcntl(words.get(), F_SETFL, O_NONBLOCK | O_DIRECT) != 0) {
     throwStartError(program, errno);
   }
 
@@ -115,64 +104,83 @@ ServiceProcess ServiceProcess::start(const std::string& program) {
                                   arguments, environment);
   if (error != 0) throwStartError(program, error);
 
-  const int pidfd = pidfdOfChild(pid);
-  if (pidfd < 0) {
-    const int reason = errno;
-    if (reason != ECHILD) {  // ours still, and not yet reaped: the id is good
-      ::kill(pid, SIGKILL);
-      while (::waitpid(pid, nullptr, 0) < 0 && errno == EINTR) {
-      }
+  ServiceProcess process(std::move(ours), std::move(words));
+  if (!process.adopt(pid)) throwStartError(program, ECHILD);
+  return process;
+}
+
+ServiceProcess& ServiceProcess::operator=(ServiceProcess&& other) noexcept {
+  end();
+  socket_ = std::move(other.socket_);
+  words_ = std::move(other.words_);
+  pidfd_ = std::move(other.pidfd_);
+  pid_ = std::exchange(other.pid_, 0);
+  return *this;
+}
+
+/// False when the daemon lets its children be reaped by themselves and this one is gone already:
+/// its id may have passed to another process. Without a pidfd (Linux before 5.4, valgrind, some
+/// filters) the id is used for as long as the process is our child.
+bool ServiceProcess::adopt(pid_t pid) noexcept {
+  pid_ = pid;
+  pidfd_ = FileDescriptor(static_cast<int>(::syscall(SYS_pidfd_open, pid, 0)));
+  siginfo_t info = {};
+  if (pidfd_ &&
+      ::waitid(kPidfd, static_cast<id_t>(pidfd_.get()), &info, WEXITED | WNOHANG | WNOWAIT) != 0) {
+    const bool isStranger = errno == ECHILD;
+    pidfd_.reset();
+    if (isStranger) pid_ = 0;
+  }
+  return pid_ != 0;
+}
+
+bool ServiceProcess::reap(std::chrono::milliseconds time) noexcept {
+  using Clock = std::chrono::steady_clock;
+  const auto until = Clock::now() + time;
+  while (pid_ != 0) {
+    siginfo_t info = {};
+    const int result =
+        pidfd_ ? ::waitid(kPidfd, static_cast<id_t>(pidfd_.get()), &info, WEXITED | WNOHANG)
+               : ::waitid(P_PID, static_cast<id_t>(pid_), &info, WEXITED | WNOHANG);
+    if (result != 0 && errno != EINTR) {
+      pid_ = 0;  // reaped by others
+    } else if (result == 0 && info.si_pid != 0) {
+      pid_ = 0;
+      status_ = info;
+    } else {
+      const auto left = std::chrono::ceil<std::chrono::milliseconds>(until - Clock::now()).count();
+      if (left <= 0) return false;
+      pollfd ended = {pidfd_.get(), POLLIN, 0};
+      ::poll(&ended, 1, pidfd_ ? static_cast<int>(left) : 1);
     }
-    throwStartError(program, reason);
   }
-  return {std::move(ours), std::move(words), FileDescriptor(pidfd)};
+  return true;
 }
 
-ServiceProcess::ServiceProcess(FileDescriptor socket, FileDescriptor words,
-                               FileDescriptor pidfd) noexcept
-    : socket_(std::move(socket)), words_(std::move(words)), pidfd_(std::move(pidfd)) {}
-
-ServiceProcess::~ServiceProcess() {
-  if (!pidfd_) return;
-  kill();
-  siginfo_t info;
-  while (::waitid(kPidfd, static_cast<id_t>(pidfd_.get()), &info, WEXITED) != 0 && errno == EINTR) {
+void ServiceProcess::end() noexcept {
+  socket_.reset();
+  words_.reset();
+  if (reap(std::chrono::milliseconds(0))) return;
+  if (pidfd_) {
+    ::syscall(SYS_pidfd_send_signal, pidfd_.get(), SIGKILL, nullptr, 0);
+  } else {
+    ::kill(pid_, SIGKILL);
   }
-}
-
-void ServiceProcess::kill() const noexcept {
-  ::syscall(SYS_pidfd_send_signal, pidfd_.get(), SIGKILL, nullptr, 0);
-}
-
-bool ServiceProcess::endsWithin(std::chrono::milliseconds grace) const noexcept {
-  pollfd ended = {pidfd_.get(), POLLIN, 0};
-  int count = 0;
-  do {
-    count = ::poll(&ended, 1, static_cast<int>(grace.count()));
-  } while (count < 0 && errno == EINTR);
-  return count > 0;
+  reap(kMaxWait);
 }
 
 std::string ServiceProcess::lastWord(std::chrono::milliseconds grace) {
-  const bool byItself = endsWithin(grace);
-  if (!byItself) kill();
-  siginfo_t info = {};
-  int result = 0;
-  do {
-    result = ::waitid(kPidfd, static_cast<id_t>(pidfd_.get()), &info, WEXITED);
-  } while (result != 0 && errno == EINTR);
-  pidfd_.reset();
-  if (!byItself) return "closed its connection";
+  if (!reap(grace)) return "closed its connection";
   // The daemon's own wait calls, or its ignoring SIGCHLD, can have taken the status.
-  if (result != 0) return "ended, and its status is lost";
+  if (status_.si_pid == 0) return "ended with an unknown status";
   std::string word;
-  if (info.si_code == CLD_EXITED) {
-    word = exitWord(info.si_status);
+  if (status_.si_code == CLD_EXITED) {
+    word = exitWord(status_.si_status);
   } else {
-    const char* name = ::sigabbrev_np(info.si_status);
+    const char* name = ::sigabbrev_np(status_.si_status);
     word = "was killed by ";
     word += name != nullptr ? std::string("SIG").append(name)
-                            : std::string("signal ").append(std::to_string(info.si_status));
+                            : std::string("signal ").append(std::to_string(status_.si_status));
   }
   if (const std::string words = wordsOnStandardError(); !words.empty()) {
     word.append(" (").append(words).append(")");
@@ -181,10 +189,15 @@ std::string ServiceProcess::lastWord(std::chrono::milliseconds grace) {
 }
 
 std::string ServiceProcess::wordsOnStandardError() const {
-  char text[kMostWords];
-  const ssize_t size = ::read(words_.get(), text, sizeof text);
+  char text[kMaxWords];
+  std::size_t size = 0;
+  // A packet for each write, or a part of one.
+  for (ssize_t count = 1; count > 0 && size < sizeof text;) {
+    count = ::read(words_.get(), text + size, sizeof text - size);
+    if (count > 0) size += static_cast<std::size_t>(count);
+  }
   std::string words;
-  for (ssize_t i = 0; i < size; ++i) {
+  for (std::size_t i = 0; i < size; ++i) {
     const bool shows = text[i] > ' ' && text[i] <= '~';
     if (shows) words += text[i];
     if (!shows && !words.empty() && words.back() != ' ') words += ' ';

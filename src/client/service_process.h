@@ -3,8 +3,10 @@
 #include <sys/types.h>
 
 #include <chrono>
+#include <csignal>
 #include <stdexcept>
 #include <string>
+#include <utility>
 
 #include "client/file_descriptor.h"
 
@@ -13,50 +15,58 @@ namespace ironmoat::client {
 /// A process could not be started; `what()` says which program and why.
 class StartError : public std::runtime_error {
  public:
-  /// `passing`: it may work in a moment (memory or descriptors ran out), so trying again is
-  /// sensible.
-  StartError(const std::string& message, bool passing)
-      : std::runtime_error(message), passing_(passing) {}
-  [[nodiscard]] bool passing() const noexcept { return passing_; }
+  /// `lasting`: trying again is useless. Otherwise memory or descriptors ran out.
+  StartError(const std::string& message, bool lasting)
+      : std::runtime_error(message), lasting_(lasting) {}
+  [[nodiscard]] bool lasting() const noexcept { return lasting_; }
 
  private:
-  bool passing_;
+  bool lasting_;
 };
 
-/// One running service, with a socket to its standard input and output, and a pipe from its
-/// standard error. Whatever the daemon does with SIGCHLD and with wait calls of its own, the
-/// process is signalled and reaped through a pidfd: a process id that was given to someone else is
-/// never touched.
+/// One running service, with a socket to its standard input and output and a pipe from its standard
+/// error. Closing the pipe makes the kernel kill the service, so that its end needs no permission
+/// and does not depend on who dies. A process id that may belong to another process by now is never
+/// signalled, whatever the daemon does with SIGCHLD and its own wait calls.
 class ServiceProcess {
  public:
-  /// Starts `program` with nothing of the daemon's but the socket and the pipe: no other
-  /// descriptor, no environment, no signal handler or mask. Throws StartError.
+  /// Starts `program`, in a session of its own, with nothing of the daemon's but the socket and the
+  /// pipe: no other descriptor, no environment, no signal handler or mask. Throws StartError.
   static ServiceProcess start(const std::string& program);
 
-  ServiceProcess(ServiceProcess&&) noexcept = default;
-  ServiceProcess& operator=(ServiceProcess&&) = delete;
-  /// Kills it when it still runs, and reaps it.
-  ~ServiceProcess();
+  ServiceProcess(ServiceProcess&& other) noexcept { *this = std::move(other); }
+  ServiceProcess& operator=(ServiceProcess&&) noexcept;
+  /// Kills the process if it still runs, and reaps it. One that cannot be killed is left to itself
+  /// after kMaxWait.
+  ~ServiceProcess() { end(); }
 
-  /// Nonblocking, ours alone.
+  /// Nonblocking; owned by this object.
   [[nodiscard]] int socket() const noexcept { return socket_.get(); }
-  /// Readable once the process has ended.
+  /// Readable once the process has ended; -1 where the kernel has no pidfd for it.
   [[nodiscard]] int endedFd() const noexcept { return pidfd_.get(); }
 
-  /// Waits up to `grace` for it to end by itself, kills it otherwise, and says how it ended: "was
-  /// killed by SIGSEGV", "exited with status 3"; behind it in brackets the first of what it wrote
-  /// to standard error, in printable ASCII alone. To be called once.
+  /// How the process ended: "was killed by SIGSEGV", "exited with status 3"; then in brackets the
+  /// start of what it wrote to standard error, printable ASCII only. Waits up to `grace` for that
+  /// end; "closed its connection" if it has not ended by then. To be called once.
   [[nodiscard]] std::string lastWord(std::chrono::milliseconds grace);
 
  private:
-  ServiceProcess(FileDescriptor socket, FileDescriptor words, FileDescriptor pidfd) noexcept;
-  [[nodiscard]] bool endsWithin(std::chrono::milliseconds grace) const noexcept;
-  void kill() const noexcept;
+  static constexpr auto kMaxWait = std::chrono::milliseconds(1000);
+
+  ServiceProcess(FileDescriptor socket, FileDescriptor words) noexcept
+      : socket_(std::move(socket)), words_(std::move(words)) {}
+  [[nodiscard]] bool adopt(pid_t pid) noexcept;
+  /// Reaps the process if it ends within `time`; false if it runs on. Sets `status_` if it was not
+  /// reaped by others.
+  bool reap(std::chrono::milliseconds time) noexcept;
+  void end() noexcept;
   [[nodiscard]] std::string wordsOnStandardError() const;
 
   FileDescriptor socket_;
   FileDescriptor words_;
   FileDescriptor pidfd_;
+  pid_t pid_ = 0;  // 0 once it is reaped
+  siginfo_t status_ = {};
 };
 
 }  // namespace ironmoat::client

@@ -1,9 +1,11 @@
 #include "confinement/confinement.h"
 
-#include <malloc.h>
-#include <pthread.h>
+#include <fcntl.h>
+#include <linux/capability.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -11,6 +13,7 @@
 #include <bit>
 #include <cerrno>
 #include <csignal>
+#include <exception>
 #include <string>
 
 #include "confinement/seccomp_filter.h"
@@ -22,17 +25,12 @@ using frames::Confinement;
 
 namespace {
 
-constexpr std::size_t kStack = std::size_t{8} << 20;  // of a thread
-
-// Measured with two threads, the worst messages known (64 MiB of records, 64 MiB of data, the rest
-// of 16 MiB to be skipped) take the process to 256 MiB, two at once to 520; so about four fit, and
-// more take turns. A message that is tried alone has room for all that its limits allow, in buffers
-// that double as they grow, beside those that wait.
+// A message has room for all that its limits allow, in buffers that double as they grow. Measured:
+// the worst messages known take the process to 256 MiB.
 constexpr std::size_t kOneMessage =
     2 * (limits::messageBytes + limits::recordBytes + limits::deliveredBytes + limits::replyBytes);
-constexpr std::size_t kWaiting = (std::size_t{kMostThreads} - 1) * 2 * limits::messageBytes;
-constexpr std::size_t kRest = std::size_t{64} << 20;  // programs, free memory in pieces
-static_assert(kOneMessage + kWaiting + kMostThreads * kStack + kRest <= kAddressSpace);
+constexpr std::size_t kRest = std::size_t{64} << 20;  // programs, stack, free memory in pieces
+static_assert(kOneMessage + kRest <= kAddressSpace);
 
 // Linux 6.3; <sys/prctl.h> may be older.
 constexpr int kSetDenyWriteExecute = 65;
@@ -67,6 +65,34 @@ constexpr std::array kZeroLimits = {
     Limit{Confinement::noProcesses, RLIMIT_NPROC, 0},
 };
 
+/// The kernel kills this process once the reading end of its standard error is closed, as the death
+/// of the daemon does: unlike a parent-death signal this does not depend on which thread started
+/// the process, and needs no permission. Only for a pipe in packet mode, by which a client says
+/// that the pipe is for this alone: reading from it kills, too.
+bool endWithReaderOfStandardError() noexcept {
+  struct stat what = {};
+  const int flags = ::fcntl(STDERR_FILENO, F_GETFL);
+  return flags >= 0 && (flags & O_DIRECT) != 0 && ::fstat(STDERR_FILENO, &what) == 0 &&
+         S_ISFIFO(what.st_mode) && ::fcntl(STDERR_FILENO, F_SETSIG, SIGKILL) == 0 &&
+         ::fcntl(STDERR_FILENO, F_SETOWN, ::getpid()) == 0 &&
+         ::fcntl(STDERR_FILENO, F_SETFL, flags | O_ASYNC) == 0;
+}
+
+bool dropCapabilities() noexcept {
+  __user_cap_header_struct header = {_LINUX_CAPABILITY_VERSION_3, 0};
+  const __user_cap_data_struct none[_LINUX_CAPABILITY_U32S_3] = {};
+  return ::syscall(SYS_capset, &header, none) == 0;
+}
+
+/// The first exception of a process sets up the unwinder, which wakes waiters that there cannot be:
+/// a call that the filter does not allow.
+void throwOnce() noexcept {
+  try {
+    throw std::exception();
+  } catch (const std::exception&) {
+  }
+}
+
 class Parts {
  public:
   /// Does `act`, which returns whether it worked, unless a sanitizer is in the way.
@@ -93,35 +119,13 @@ int CannotConfine::exitStatus() const noexcept {
   return frames::kCannotConfineStatus + std::countr_zero(static_cast<std::uint32_t>(part_));
 }
 
-void prepareMemory() noexcept {
-  // More arenas would make a thread that finds one busy map another, ask /sys for the number of
-  // processors and call mprotect as it grows, which is forbidden; and each one hoards memory of
-  // its own under the one limit.
-  ::mallopt(M_ARENA_MAX, 1);
-  // Setting either ends glibc's own adjusting of both. By default the lists of one message go back
-  // to the kernel when it is done, and their pages are faulted in and zeroed again for the next:
-  // 3-5 times the time of a message of many records. The first is the highest that glibc takes.
-  ::mallopt(M_MMAP_THRESHOLD, 32 << 20);
-  ::mallopt(M_TRIM_THRESHOLD, 128 << 20);
-  // Not what the daemon's own limit happens to be: a message of the deepest nesting takes under
-  // 1 MiB, several times that with a sanitizer.
-  pthread_attr_t attributes;
-  if (::pthread_attr_init(&attributes) == 0) {
-    ::pthread_attr_setstacksize(&attributes, kStack);
-    ::pthread_setattr_default_np(&attributes);
-    ::pthread_attr_destroy(&attributes);
-  }
-}
-
-void giveBackMemory() noexcept { ::malloc_trim(0); }
-
 std::uint32_t confine() {
+  throwOnce();
   Parts parts;
-  // The client's thread that starts the service outlives it, unless its whole process dies: then
-  // this does not depend on our noticing the end of input. Who starts a service from a thread of
-  // its own gets what he asked for. A parent that is gone by now is noticed by the end of input.
-  parts.require(Confinement::endsWithParent,
-                [] { return ::prctl(PR_SET_PDEATHSIG, SIGKILL) == 0; });
+  parts.require(Confinement::endsWithParent, [] {
+    return endWithReaderOfStandardError() || ::prctl(PR_SET_PDEATHSIG, SIGKILL) == 0;
+  });
+  if (::setsid() >= 0 || ::getsid(0) == ::getpid()) parts.inForce(Confinement::ownSession);
   parts.require(Confinement::notDumpable, [] { return ::prctl(PR_SET_DUMPABLE, 0) == 0; });
 
   // A limit does not touch what is open already.
@@ -130,12 +134,20 @@ std::uint32_t confine() {
     parts.require(zero.part, [&] { return limit(zero.resource, zero.most); });
   }
   parts.require(Confinement::addressSpaceLimit, [] { return limit(RLIMIT_AS, kAddressSpace); });
+  rlimit memory = {};
+  if (::getrlimit(RLIMIT_AS, &memory) == 0 && memory.rlim_cur >= kAddressSpace) {
+    parts.inForce(Confinement::fullMemory);
+  }
+  if (::prctl(PR_SET_SPECULATION_CTRL, PR_SPEC_STORE_BYPASS, PR_SPEC_FORCE_DISABLE, 0, 0) == 0) {
+    parts.inForce(Confinement::noStoreBypass);
+  }
 
   ::prctl(kSetDenyWriteExecute, kRefuseExecGain, 0, 0, 0);
   const int denied = ::prctl(kGetDenyWriteExecute, 0, 0, 0, 0);
   if (denied > 0 && (static_cast<unsigned>(denied) & kRefuseExecGain) != 0) {
     parts.inForce(Confinement::noNewCode);
   }
+  parts.require(Confinement::noCapabilities, [] { return dropCapabilities(); });
   parts.require(Confinement::noNewPrivileges,
                 [] { return ::prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0; });
   parts.require(Confinement::systemCallFilter, [] { return filterSystemCalls(); });

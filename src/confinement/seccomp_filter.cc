@@ -1,6 +1,5 @@
 #include "confinement/seccomp_filter.h"
 
-#include <linux/futex.h>
 #include <seccomp.h>
 #include <sys/mman.h>
 #include <unistd.h>
@@ -43,7 +42,6 @@ class Filter {
     }
     // Left alone, calls in another architecture's numbers would kill a single thread only.
     check(::seccomp_attr_set(context_, SCMP_FLTATR_ACT_BADARCH, SCMP_ACT_KILL_PROCESS));
-    check(::seccomp_attr_set(context_, SCMP_FLTATR_CTL_TSYNC, 1));
   }
   Filter(const Filter&) = delete;
   Filter& operator=(const Filter&) = delete;
@@ -88,7 +86,7 @@ bool filterSystemCalls() noexcept {
   filter.allow(SCMP_SYS(write), {is(0, STDERR_FILENO)});
   filter.allow(SCMP_SYS(pselect6), {atMost(0, STDOUT_FILENO + 1)});
 
-  // Memory: private, of no file, never executable. glibc releases a thread's stack with madvise.
+  // Memory: private, of no file, never executable.
   filter.allow(SCMP_SYS(brk));
   filter.allow(SCMP_SYS(mmap), {has(2, kAll & ~std::uint64_t{PROT_READ | PROT_WRITE}, 0),
                                 has(3, kInt, MAP_PRIVATE | MAP_ANONYMOUS), has(4, kInt, kInt)});
@@ -96,18 +94,10 @@ bool filterSystemCalls() noexcept {
   filter.allow(SCMP_SYS(munmap));
   filter.allow(SCMP_SYS(madvise), {is(2, MADV_DONTNEED)});
 
-  // Threads: mutexes, condition variables, atomics and joining all come down to these two.
-  constexpr std::uint64_t kOperation =
-      kAll & ~std::uint64_t{FUTEX_PRIVATE_FLAG | FUTEX_CLOCK_REALTIME};
-  filter.allow(SCMP_SYS(futex), {has(1, kOperation, FUTEX_WAIT)});
-  filter.allow(SCMP_SYS(futex), {has(1, kOperation, FUTEX_WAIT_BITSET)});
-  filter.allow(SCMP_SYS(futex), {has(1, kOperation, FUTEX_WAKE)});
-  filter.allow(SCMP_SYS(sched_yield));
   filter.allow(SCMP_SYS(clock_gettime), {atMost(0, CLOCK_BOOTTIME)});
   filter.allow(SCMP_SYS(restart_syscall));  // how a wait goes on after SIGSTOP and SIGCONT
 
-  // The end, in order and by abort(). A thread blocks all signals as it ends.
-  filter.allow(SCMP_SYS(exit));
+  // The end, in order and by abort(). The process has one thread: no futex.
   filter.allow(SCMP_SYS(exit_group));
   filter.allow(SCMP_SYS(rt_sigprocmask));
   filter.allow(SCMP_SYS(getpid));

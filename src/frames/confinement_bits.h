@@ -16,14 +16,19 @@ enum class Confinement : std::uint32_t {
   noFileGrowth = 1U << 4U,       ///< file size limit 0
   noOpenFiles = 1U << 5U,        ///< the standard three descriptors and, limit 0, no other
   noProcesses = 1U << 6U,        ///< process limit 0, threads included
-  addressSpaceLimit = 1U << 7U,  ///< of confinement/confinement.h or a lower one it was given
+  addressSpaceLimit = 1U << 7U,  ///< of confinement/confinement.h or an inherited lower one
   noNewCode = 1U << 8U,          ///< memory once writable never becomes executable; Linux 6.3
-  endsWithParent = 1U << 9U,     ///< killed when the thread that started it ends
+  endsWithParent = 1U << 9U,     ///< killed when the process that started it ends
+  noCapabilities = 1U << 10U,    ///< none of root's privileges, also when started by root
+  ownSession = 1U << 11U,        ///< no signal from a terminal or a process group reaches it
+  noStoreBypass = 1U << 12U,     ///< speculative store bypass is off, where processors have it
+  fullMemory = 1U << 13U,        ///< the address space limit is not a lower one that was inherited
 };
 
 struct ConfinementName {
   Confinement part;
   std::string_view name;
+  bool required = true;  ///< where it is not to be had, the service does not serve
 };
 inline constexpr std::array kConfinementNames = {
     ConfinementName{Confinement::systemCallFilter, "system call filter"},
@@ -34,8 +39,12 @@ inline constexpr std::array kConfinementNames = {
     ConfinementName{Confinement::noOpenFiles, "no open files"},
     ConfinementName{Confinement::noProcesses, "no processes"},
     ConfinementName{Confinement::addressSpaceLimit, "address space limit"},
-    ConfinementName{Confinement::noNewCode, "no new code"},
+    ConfinementName{Confinement::noNewCode, "no new code", false},
     ConfinementName{Confinement::endsWithParent, "ends with parent"},
+    ConfinementName{Confinement::noCapabilities, "no capabilities"},
+    ConfinementName{Confinement::ownSession, "own session", false},
+    ConfinementName{Confinement::noStoreBypass, "no store bypass", false},
+    ConfinementName{Confinement::fullMemory, "full memory", false},
 };
 
 /// A service that cannot have a part exits with this plus the number of its bit.
@@ -67,8 +76,7 @@ inline constexpr bool kSanitizedBuild = false;
 inline constexpr std::uint32_t kRequiredConfinement = [] {
   std::uint32_t bits = 0;
   for (const ConfinementName& known : kConfinementNames) {
-    const bool everywhere = known.part != Confinement::noNewCode;
-    if (everywhere && (!kSanitizedBuild || standsSanitizers(known.part))) {
+    if (known.required && (!kSanitizedBuild || standsSanitizers(known.part))) {
       bits |= static_cast<std::uint32_t>(known.part);
     }
   }

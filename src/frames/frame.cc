@@ -219,7 +219,7 @@ Reply parseReply(const Data& body) {
 DecodingError parseRefusal(const Data& body) {
   Parser parser(body);
   const auto kind = parser.number<std::uint8_t>();
-  if (kind > static_cast<std::uint8_t>(DecodingError::Kind::rejectedByHost)) {
+  if (kind > static_cast<std::uint8_t>(DecodingError::Kind::notEnoughMemory)) {
     throw FrameError("the refusal has an unknown kind");
   }
   const auto offset = parser.number<std::uint64_t>();

@@ -74,6 +74,11 @@ std::optional<Data> FrameAssembler::next() {
   return std::nullopt;
 }
 
+void FrameAssembler::wipeSpare() noexcept {
+  std::memset(buffer_.get(), 0, first_);
+  std::memset(buffer_.get() + last_, 0, kBuffer - last_);
+}
+
 Data FrameAssembler::takeLarge() {
   largeDone_ = false;
   return dataOf(large_.finish());

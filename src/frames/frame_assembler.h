@@ -27,11 +27,11 @@ class FrameAssembler {
   /// more than `maxBody`; the connection is then of no more use.
   [[nodiscard]] std::optional<Data> next();
 
-  /// Bytes that came and that `next` has not yet given out, a large frame's apart.
-  [[nodiscard]] std::size_t buffered() const noexcept { return last_ - first_; }
-
   /// Part of a frame has come and the rest has not.
   [[nodiscard]] bool midFrame() const noexcept { return remaining_ != 0 || first_ != last_; }
+
+  /// Overwrites the part of the buffer whose bytes `next` has already given out.
+  void wipeSpare() noexcept;
 
  private:
   [[nodiscard]] Data takeLarge();

@@ -78,7 +78,7 @@ TEST(FrameTest, BrokenBodiesAreRefused) {
       {reply, kRefusalBody, 1 + refused.size()},
       {reply, number(1, 8) + "\4", 0},
       {refusal, refused, 1 + 3},
-      {refusal, "\6" + refused.substr(1), 0},
+      {refusal, "\7" + refused.substr(1), 0},
       {refusal, "\0"s + number(0, 8) + "\1\0\xC3\xA9"s, 0},
       {refusal, "\0"s + number(0, 8) + "\0\0\xC3"s, 1},
       {sentence, "zero\0byte"s, 1 + 4},

@@ -6,16 +6,12 @@
 #include <csignal>
 #include <cstdlib>
 #include <exception>
-#include <latch>
 #include <new>
-#include <system_error>
-#include <thread>
 
 #include "confinement/confinement.h"
+#include "confinement/memory.h"
 #include "frames/frame.h"
-#include "host/connection.h"
-#include "host/memory_turns.h"
-#include "host/worker.h"
+#include "host/request_loop.h"
 #include "ironmoat/errors.h"
 #include "values/host_rejection.h"
 
@@ -70,7 +66,7 @@ void IronmoatServer::serve(const Data& request, BlockBuilder& reply) const {
   } catch (const std::bad_alloc&) {
     frames::appendRefusal(
         reply, frames::requestId(request).value_or(0),
-        {DecodingError::Kind::limitExceeded, "", "the message takes more memory than there is"});
+        {DecodingError::Kind::notEnoughMemory, "", "not enough memory to decode this message"});
   }
 }
 
@@ -91,36 +87,10 @@ void IronmoatServer::run() {
   static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
   static_cast<void>(std::signal(SIGXFSZ, SIG_IGN));
   confinement::prepareMemory();
-  host::ReplySink sink(STDOUT_FILENO);
-  host::RequestSource source(STDIN_FILENO);
-  host::MemoryTurns turns;
-
-  // This thread serves nothing: its stack would have to grow, which is fatal at the limit of the
-  // address space. Those of the others are there already.
-  constexpr unsigned kFewest = 2;
-  const unsigned threads =
-      std::clamp(std::thread::hardware_concurrency(), kFewest, confinement::kMostThreads);
-  std::latch started(threads);
-  std::latch confined(1);
-  std::vector<std::jthread> workers;
-  // Without its threads there is no service, and unwinding would wait for those that wait for us.
-  const auto start = [&]() noexcept {
-    workers.emplace_back([&] {
-      started.count_down();
-      confined.wait();
-      host::Worker(*this, source, sink, turns).run();
-    });
-  };
-  for (unsigned i = 0; i < threads; ++i) start();
-  started.wait();
-
+  host::RequestLoop loop(*this, STDIN_FILENO, STDOUT_FILENO);
   frames::Hello hello = frames::Hello::ours();
   if (confine_ == Confine::yes) hello.confinement = confineOrExit();
-  BlockBuilder greeting;
-  frames::appendHello(greeting, hello);
-  sink.add(greeting);
-  sink.flush();
-  confined.count_down();
+  loop.run(hello);
 }
 
 }  // namespace ironmoat

@@ -15,7 +15,7 @@
 namespace ironmoat {
 
 namespace host {
-class Worker;
+class RequestLoop;
 }
 
 /// Serves unpack requests over the process's standard input and output: one connected stream
@@ -42,10 +42,10 @@ class IronmoatServer {
     });
   }
 
-  /// Confines the process for good, then serves until the end of input, on several threads, and
-  /// returns once every reply is written. Also returns when the peer breaks the protocol or stops
-  /// reading: there is nothing left to do. Where it cannot be confined, the process ends with an
-  /// exit status that says why (frames::lackToldBy), nothing having been read or written.
+  /// Sandboxes the process for good, then serves on the calling thread until the end of input.
+  /// Also returns when the peer breaks the protocol or stops reading. Where the sandbox is not to
+  /// be had, the process ends with an exit status that says which part (frames::lackToldBy); it has
+  /// then read and written nothing.
   virtual void run();
 
   /// One request: the frame body of a request to the whole frame of its reply. Never throws for
@@ -53,7 +53,7 @@ class IronmoatServer {
   void serve(const Data& request, BlockBuilder& reply) const;
 
  private:
-  friend class host::Worker;
+  friend class host::RequestLoop;
 
   /// Unpacks the message and appends the record. Throws what the unpacker does.
   using Handler = std::function<void(const Data& message, BlockBuilder& reply)>;

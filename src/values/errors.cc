@@ -16,6 +16,8 @@ std::string_view nameOf(DecodingError::Kind kind) noexcept {
       return "keyNotFound";
     case DecodingError::Kind::rejectedByHost:
       return "rejectedByHost";
+    case DecodingError::Kind::notEnoughMemory:
+      return "notEnoughMemory";
   }
   return "unknown";
 }

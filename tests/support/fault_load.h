@@ -13,6 +13,7 @@
 #include <fstream>
 #include <future>
 #include <mutex>
+#include <set>
 #include <string>
 #include <thread>
 #include <utility>
@@ -81,7 +82,7 @@ struct Tally {
       const bool killed = what.find("was killed by SIGKILL") != std::string::npos;
       if (killed && error.kind() == ServiceError::Kind::crashed) {
         ++crashed;
-      } else if (what.ends_with("was killed by SIGKILL before it greeted") ||
+      } else if (what.ends_with("was killed by SIGKILL before its hello") ||
                  what == "the client was destroyed") {
         ++unavailable;
       } else {
@@ -141,29 +142,35 @@ class Load {
   std::vector<std::thread> threads_;
 };
 
-/// The process that a client of this process runs, or 0. The main thread's children are no such.
-inline pid_t serviceProcess() {
+/// The services that clients of this process run, whichever thread started them.
+inline std::vector<pid_t> serviceProcesses() {
+  std::vector<pid_t> all;
   for (const auto& task : std::filesystem::directory_iterator("/proc/self/task")) {
-    if (task.path().filename() == std::to_string(::getpid())) continue;
     std::ifstream children(task.path() / "children");
-    if (pid_t pid = 0; children >> pid) return pid;
+    for (pid_t pid = 0; children >> pid;) {
+      std::string name;
+      std::getline(std::ifstream("/proc/" + std::to_string(pid) + "/comm"), name);
+      if (name == "VeskIronmoatSer" || name == "test_server") all.push_back(pid);
+    }
   }
-  return 0;
+  return all;
 }
 
 /// Kills each process once; says whether there was one to kill.
 class Killer {
  public:
   bool operator()() {
-    const pid_t pid = serviceProcess();
-    if (pid == 0 || pid == last_) return false;
-    last_ = pid;
-    ::kill(pid, SIGKILL);
+    const std::vector<pid_t> all = serviceProcesses();
+    const auto next =
+        std::find_if(all.begin(), all.end(), [this](pid_t pid) { return !killed_.contains(pid); });
+    if (next == all.end()) return false;
+    killed_.insert(*next);
+    ::kill(*next, SIGKILL);
     return true;
   }
 
  private:
-  pid_t last_ = 0;
+  std::set<pid_t> killed_;
 };
 
 class Times {

@@ -1,0 +1,105 @@
+#include "confinement/memory.h"
+
+#include <malloc.h>
+#include <sys/mman.h>
+#include <sys/resource.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+#include <cstring>
+#include <new>
+#include <utility>
+
+#include "frames/confinement_bits.h"
+
+namespace ironmoat::confinement {
+
+namespace {
+
+// A message of the deepest nesting takes under 1 MiB, several times that with a sanitizer.
+constexpr std::size_t kStack = std::size_t{2} << 20;
+
+constexpr std::uintptr_t kPage = 4096;
+constexpr int kTopPad = 128 << 10;  // by which the heap grows at least
+std::uintptr_t stackEnd = 0;        // the lowest address that belongs to the stack for certain
+
+[[gnu::noinline]] void growStack() noexcept {
+  volatile char below[kStack];
+  below[0] = 0;
+  stackEnd = reinterpret_cast<std::uintptr_t>(below);
+}
+
+/// Overwrites what lies just below the caller's frame and releases the pages below that.
+[[gnu::noinline]] void wipeStack() noexcept {
+  volatile char below[2 * kPage];
+  for (volatile char& byte : below) byte = 0;
+  const std::uintptr_t first = (stackEnd + kPage - 1) / kPage * kPage;
+  const std::uintptr_t last = reinterpret_cast<std::uintptr_t>(below) / kPage * kPage;
+  if (stackEnd == 0 || first >= last) return;
+  ::madvise(reinterpret_cast<void*>(first), last - first, MADV_DONTNEED);
+}
+
+/// Where the heap ends. No system call.
+const void* heapEnd() noexcept { return ::sbrk(0); }
+
+struct Piece {
+  Piece* next;
+};
+
+/// Overwrites free pieces of `size` bytes and puts them before `taken`, until the heap would grow.
+Piece* overwritePieces(std::size_t size, Piece* taken) noexcept {
+  for (;;) {
+    const void* const end = heapEnd();
+    void* const memory = std::malloc(size);
+    if (memory == nullptr) return taken;
+    if (heapEnd() != end) {
+      std::free(memory);
+      return taken;
+    }
+    ::explicit_bzero(memory, ::malloc_usable_size(memory));
+    taken = new (memory) Piece{taken};
+  }
+}
+
+}  // namespace
+
+void prepareMemory() noexcept {
+  // One heap that grows and shrinks at its end: lists of megabytes are then neither mapped and
+  // faulted in anew for each message nor copied as they grow. What is kept is released when the
+  // service has nothing to do.
+  ::mallopt(M_MMAP_MAX, 0);
+  ::mallopt(M_TRIM_THRESHOLD, 512 << 20);
+  rlimit stack = {};
+  if (::getrlimit(RLIMIT_STACK, &stack) == 0 && stack.rlim_cur < 2 * kStack) {
+    stack.rlim_cur = std::min<rlim_t>(stack.rlim_max, 2 * kStack);
+    ::setrlimit(RLIMIT_STACK, &stack);
+  }
+  growStack();
+}
+
+void releaseMemory() noexcept { ::malloc_trim(0); }
+
+void wipeAndReleaseMemory() noexcept {
+  // Whole free pages go back to the kernel. What is free in pages that are also in use is taken
+  // from malloc piece by piece, from large to small.
+  releaseMemory();
+  if constexpr (!frames::kSanitizedBuild) {
+    ::mallopt(M_TOP_PAD, 0);  // so that the heap hardly grows for what does not fit
+    Piece* taken = nullptr;
+    for (std::size_t size = std::size_t{64} << 10; size > 1024; size /= 2) {
+      taken = overwritePieces(size, taken);
+    }
+    for (std::size_t size = 1024; size >= sizeof(Piece); size -= 16) {
+      taken = overwritePieces(size, taken);
+    }
+    while (taken != nullptr) std::free(std::exchange(taken, taken->next));
+    ::mallopt(M_TOP_PAD, kTopPad);
+    releaseMemory();
+  }
+  wipeStack();
+}
+
+}  // namespace ironmoat::confinement
