@@ -32,6 +32,9 @@ struct Decoding {
   std::optional<DecodingError> refusal = {};  ///< once a decoder has refused the message
 };
 
+template <class Keys>
+class KeyedDecodingContainer;
+
 /// A decoder positioned on one value of a document. Lives on the stack, below its parent's; knows
 /// the way from the top, so that a refusal can name it.
 ///
@@ -56,6 +59,12 @@ class Decoder {
         node_(node) {}
   Decoder(const Decoder&) = delete;
   Decoder& operator=(const Decoder&) = delete;
+
+  /// The current value as a dictionary. False, with a rejection, when it is not one.
+  template <class Keys>
+  [[nodiscard]] KeyedDecodingContainer<Keys> container() const {
+    return KeyedDecodingContainer<Keys>(*this);
+  }
 
   [[nodiscard]] const Document& document() const noexcept { return document_; }
   [[nodiscard]] const Node& node() const noexcept { return document_.node(node_); }
@@ -169,14 +178,69 @@ template <class T>
 template <class Keys>
 class KeyedDecodingContainer {
  public:
-  explicit KeyedDecodingContainer(const Decoder& decoder) : decoder_(decoder) {}
+  using KeySet = std::array<std::uint64_t, (Keys::count + 63) / 64>;  ///< bit i % 64 of word i / 64
 
-  /// Finds the entries; before anything else.
-  [[nodiscard]] bool scan() {
-    if (!decoder_.expect(Kind::dictionary)) return false;
-    const Node& dictionary = decoder_.node();
-    if (!decoder_.chargeScanned(dictionary.count)) return false;
+  explicit KeyedDecodingContainer(const Decoder& decoder)
+      : decoder_(decoder),
+        open_(decoder.expect(Kind::dictionary) && decoder.chargeScanned(decoder.node().count)) {
+    if (open_) findEntries();
+  }
+
+  /// Whether there is a dictionary. Everything below requires it.
+  explicit operator bool() const noexcept { return open_; }
+
+  [[nodiscard]] bool contains(Keys key) const noexcept {
+    return ((seen_[key.index() / 64] >> (key.index() % 64)) & 1) != 0;
+  }
+
+  /// The entry under `key`, which is required.
+  template <class T>
+  [[nodiscard]] bool decode(T& value, Keys key) const {
+    if (contains(key)) {
+      return decodeInto(Decoder(decoder_, key.stringValue(), values_[key.index()]), value);
+    }
+    decoder_.refuseMissing(key.stringValue());
+    return false;
+  }
+  /// The entry under `key`, if there is one; `value` must be absent so far. In line, so that a
+  /// caller that knows of the entry need not have it tested.
+  template <class T>
+  [[nodiscard, gnu::always_inline]] bool decodeIfPresent(Optional<T>& value, Keys key) const {
+    return !contains(key) || decodeEntry(value, key);
+  }
+
+  /// Calls `visit(key)` in the order of the cases, for each that has an entry and each in
+  /// `required`, as long as it returns true; returns whether it always did.
+  template <class Visitor>
+  [[nodiscard]] bool forEach(const KeySet& required, Visitor&& visit) const {
+    for (std::size_t word = 0; word < seen_.size(); ++word) {
+      for (std::uint64_t left = seen_[word] | required[word]; left != 0; left &= left - 1) {
+        if (!visit(Keys::at(word * 64 + static_cast<std::size_t>(std::countr_zero(left))))) {
+          return false;
+        }
+      }
+    }
+    return true;
+  }
+
+ private:
+  static constexpr std::size_t kAhead = 16;
+
+  template <class T>
+  [[nodiscard]] bool decodeEntry(Optional<T>& value, Keys key) const {
+    const Decoder decoder(decoder_, key.stringValue(), values_[key.index()]);
+    if constexpr (Scalar<T>) {
+      if (!admitsScalar<T>(decoder)) return false;
+      std::construct_at(&value, scalar<T>(decoder));  // absent so far: it owns nothing
+      return true;
+    } else {
+      value = Optional<T>(T{});
+      return decodeInto(decoder, *value);
+    }
+  }
+  void findEntries() {
     const Document& document = decoder_.document();
+    const Node& dictionary = decoder_.node();
     const auto keys = document.keys(dictionary);
     const auto values = document.values(dictionary);
     const auto& find = Keys::finder();
@@ -192,57 +256,12 @@ class KeyedDecodingContainer {
       seen_[key->index() / 64] |= std::uint64_t{1} << (key->index() % 64);
       values_[key->index()] = values[i];
     }
-    return true;
   }
-
-  [[nodiscard]] bool contains(Keys key) const noexcept {
-    return ((seen_[key.index() / 64] >> (key.index() % 64)) & 1) != 0;
-  }
-
-  /// The entry under `key` into a record's member: a plain member is required; an optional one must
-  /// have been seen, and be absent so far.
-  template <class T>
-  [[nodiscard]] bool decodeField(Keys key, T& value) const {
-    if (contains(key)) {
-      return decodeInto(Decoder(decoder_, key.stringValue(), values_[key.index()]), value);
-    }
-    decoder_.refuseMissing(key.stringValue());
-    return false;
-  }
-  template <class T>
-  [[nodiscard]] bool decodeField(Keys key, Optional<T>& value) const {
-    const Decoder decoder(decoder_, key.stringValue(), values_[key.index()]);
-    if constexpr (Scalar<T>) {
-      if (!admitsScalar<T>(decoder)) return false;
-      std::construct_at(&value, scalar<T>(decoder));  // absent so far: it owns nothing
-      return true;
-    } else {
-      value = Optional<T>(T{});
-      return decodeInto(decoder, *value);
-    }
-  }
-
-  /// Calls `visit(key)` in the order of the cases, for each that was seen and each in `required`,
-  /// as long as it returns true; returns whether it always did.
-  template <class Visitor>
-  [[nodiscard]] bool forEach(const std::array<std::uint64_t, (Keys::count + 63) / 64>& required,
-                             Visitor&& visit) const {
-    for (std::size_t word = 0; word < seen_.size(); ++word) {
-      for (std::uint64_t left = seen_[word] | required[word]; left != 0; left &= left - 1) {
-        if (!visit(Keys::at(word * 64 + static_cast<std::size_t>(std::countr_zero(left))))) {
-          return false;
-        }
-      }
-    }
-    return true;
-  }
-
- private:
-  static constexpr std::size_t kAhead = 16;
 
   const Decoder& decoder_;
-  std::array<std::uint64_t, (Keys::count + 63) / 64> seen_{};
+  KeySet seen_{};
   std::array<NodeIndex, Keys::count> values_;  // NOLINT: read only where seen_ says so
+  bool open_;
 };
 
 }  // namespace ironmoat::plist

@@ -126,6 +126,40 @@ TEST(KeyedRecordTest, SharedValuesArePaidForEachTime) {
             "entries");
 }
 
+/// Decodes by hand through what the tables are decoded through.
+struct ThreeFields {
+  Int command = 0;
+  Optional<Int> version;
+  Optional<String> userAgent;
+
+  [[nodiscard]] bool decode(const plist::Decoder& decoder) {
+    const auto container = decoder.container<Keys>();
+    return container && container.decode(command, Keys::of<&Payload::command>()) &&
+           container.decodeIfPresent(version, Keys::of<&Payload::version>()) &&
+           container.decodeIfPresent(userAgent, Keys::of<&Payload::userAgent>());
+  }
+};
+
+TEST(KeyedDecodingContainerTest, RequiredEntriesMustBeThereAndOptionalOnesMayBeAbsent) {
+  const auto decodeInto = [](ThreeFields& fields, std::string_view value) {
+    const std::string message = "<plist>" + std::string(value) + "</plist>";
+    const auto refusal =
+        plist::PropertyListDecoder().decode(Data(std::string_view(message)), fields);
+    return refusal ? testing::inWords(*refusal) : "accepted";
+  };
+  ThreeFields fields;
+  EXPECT_EQ(decodeInto(fields,
+                       "<dict><key>ua</key><string>x</string><key>c</key>"
+                       "<integer>7</integer></dict>"),
+            "accepted");
+  EXPECT_EQ(fields.command, 7);
+  EXPECT_FALSE(fields.version.has_value());
+  EXPECT_EQ(fields.userAgent, String("x"));
+  ThreeFields none;
+  EXPECT_EQ(decodeInto(none, "<dict/>"), "keyNotFound c: required key is missing");
+  EXPECT_EQ(decodeInto(none, "<array/>"), "typeMismatch: expected dictionary, found array");
+}
+
 TEST(CodingKeysTest, AreTheTable) {
   const Keys command = Keys::of<&Payload::command>();
   EXPECT_EQ(command.stringValue(), "c");
