@@ -38,11 +38,11 @@ template <class Output, class Wire>
 List<Output> convertList(Optional<List<Wire>>& wire) {
   List<Output> output;
   if (!wire) return output;
-  WireElements<Wire> elements(std::move(*wire));
+  Consumable<List<Wire>> elements(std::move(*wire));
   output.reserve(elements.size());
   while (!elements.done()) {
     output.emplace_back(
-        [&] { return elements.template consumeCurrent<Output>(convertParts(elements.current())); });
+        [&] { return elements.template consume<Output>(convertParts(elements.current())); });
   }
   return output;
 }
@@ -73,10 +73,10 @@ Converted convertParts(VeskCorvelProtocolPayload& wire) {
 }  // namespace
 
 DrelUserPayload VeskCorvelPayloadUnpacker::unpack(const Data& message) const {
-  WireRecord<VeskCorvelProtocolPayload> wire;
-  decodeMessage(message, wire.fields());
+  Consumable<VeskCorvelProtocolPayload> wire;
+  decodeMessage(message, wire.current());
   return DrelUserPayload(
-      [&] { return wire.consume<DrelUserPayload>(convertParts(wire.fields())); });
+      [&] { return wire.consume<DrelUserPayload>(convertParts(wire.current())); });
 }
 
 }  // namespace ironmoat

@@ -6,7 +6,8 @@
 namespace ironmoat {
 
 /// The header block conversion, shared by the two records that carry one: absent stays absent, and
-/// a present block goes through its initialiser, also when all its fields are absent.
+/// a present block goes through its initialiser, also when all its fields are absent. Moves out of
+/// the block.
 Optional<DrelUserPayloadHttpHeaders> convertHeaderBlock(
     Optional<VeskCorvelProtocolHttpHeaders>& block);
 
