@@ -1,5 +1,6 @@
 // VeskIronmoatService: seven steps without a branch, then the host has the process. It reads no
-// command line, no environment and no configuration, and writes nothing but frames.
+// command line, no environment and no configuration, and writes nothing but frames. When its
+// sandbox or an abort kills it, one line on standard error says why.
 
 #include "host/server.h"
 #include "service/preferences_store.h"
