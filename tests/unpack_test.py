@@ -9,6 +9,7 @@ import os
 import pathlib
 import pty
 import re
+import shutil
 import subprocess
 import sys
 import tempfile
@@ -49,6 +50,10 @@ class InFolder(unittest.TestCase):
     def write(self, name, content):
         with open(name, "wb") as file:
             file.write(content)
+
+    def script(self, name, commands):
+        self.write(name, f"#!/bin/sh\n{commands}\n".encode())
+        os.chmod(name, 0o755)
 
     def expect(self, result, status, output, errors=""):
         self.assertEqual((result.returncode, result.stdout.decode(), result.stderr.decode()),
@@ -99,6 +104,20 @@ class CommandLine(InFolder):
             self.assertEqual(result.returncode, 2)
             self.assertEqual([(line["file"], line["error"]["kind"]) for line in lines_of(result)],
                              [("good", "unavailable"), ("bad", "unavailable")])
+
+    def test_no_service_that_others_can_replace(self):
+        os.mkdir("open")
+        tool = shutil.copy(TOOL, "open")
+        self.script("open/VeskIronmoatService", "touch ran")
+        os.chmod("open", 0o777)
+        result = subprocess.run([tool, "good"], capture_output=True, timeout=60)
+        self.assertEqual(result.returncode, 2)
+        self.assertRegex(result.stderr.decode(), "other users can replace '.*/open/VeskIronmoatServ")
+        hidden = "mount -t tmpfs none /proc && exec "
+        if not subprocess.run(["unshare", "-m", "sh", "-c", hidden + "true"]).returncode:
+            subprocess.run(["unshare", "-m", "sh", "-c", hidden + '"$0" good', tool], cwd="open",
+                           capture_output=True, timeout=60)
+        self.assertFalse(os.path.exists("ran") or os.path.exists("open/ran"))
 
     def test_too_long_messages_are_not_read_whole(self):
         for name, size in (("huge", 5 << 30), ("longest", MESSAGE_BYTES)):

@@ -2,11 +2,12 @@
 
 #include <dlfcn.h>
 #include <sys/auxv.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <filesystem>
 #include <system_error>
+
+#include "client/trusted_path.h"
 
 namespace ironmoat::client {
 
@@ -15,21 +16,6 @@ namespace {
 namespace fs = std::filesystem;
 
 constexpr const char* kName = "VeskIronmoatService";
-
-/// Nobody but root and this process's user can put another file in the place of `path`, which is
-/// absolute and without links. A tree's being beside the library does not say so: below /tmp/lib
-/// lies /tmp/libexec, which anyone could have made.
-bool isOutOfOthersReach(fs::path path) {
-  for (;; path = path.parent_path()) {
-    struct stat status = {};
-    if (::lstat(path.c_str(), &status) != 0) return false;
-    if (status.st_uid != 0 && status.st_uid != ::geteuid()) return false;
-    // In a sticky folder others cannot touch what is not theirs.
-    const bool sticky = S_ISDIR(status.st_mode) && (status.st_mode & S_ISVTX) != 0;
-    if ((status.st_mode & (S_IWGRP | S_IWOTH)) != 0 && !sticky) return false;
-    if (!path.has_relative_path()) return true;
-  }
-}
 
 /// Empty when there is none.
 std::string programOfThisInstallation() {
@@ -44,6 +30,8 @@ std::string programOfThisInstallation() {
   if (error || !file.filename().string().starts_with("libironmoat.so")) return {};
   const fs::path program =
       fs::canonical(file.parent_path() / IRONMOAT_LIBEXEC_FROM_LIB / kName, error);
+  // Being beside the library proves nothing: below /tmp/lib lies /tmp/libexec, which anyone could
+  // have made.
   if (error || !isOutOfOthersReach(program)) return {};
   return ::access(program.c_str(), X_OK) == 0 ? program.string() : std::string();
 }

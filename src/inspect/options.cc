@@ -11,13 +11,6 @@ namespace ironmoat::inspect {
 
 namespace {
 
-std::string quoted(std::string_view text) {
-  std::string out = "'";
-  appendHarmless(out, text);
-  out += '\'';
-  return out;
-}
-
 void setAction(Options& options, Action action) {
   if (options.action != Action::unpack && options.action != action) {
     throw UsageError("options '--schema' and '--self-test' exclude one another");
@@ -38,7 +31,7 @@ void setOutput(Options& options, Output output) {
     if (!known.empty()) known += ", ";
     known += type.name;
   }
-  throw UsageError("unknown type " + quoted(name) + ": one of " + known.append(others));
+  throw UsageError("unknown type " + inQuotes(name) + ": one of " + known.append(others));
 }
 
 void setType(Options& options, std::string_view name) {
@@ -55,7 +48,7 @@ void setSchema(Options& options, std::string_view name) {
 
 void setFormat(Options& options, std::string_view name) {
   if (name != "text" && name != "json") {
-    throw UsageError("unknown format " + quoted(name) + ": text or json");
+    throw UsageError("unknown format " + inQuotes(name) + ": text or json");
   }
   options.format = name == "text" ? Format::text : Format::json;
 }
@@ -106,16 +99,16 @@ std::size_t takeOption(Options& options, std::string_view argument,
   for (const Setting& setting : kSettings) {
     if (const auto value = valueIn(argument, setting.name)) return setting.set(options, *value), 0;
     if (argument != setting.name) continue;
-    if (rest.empty()) throw UsageError("option " + quoted(argument) + " needs a value");
+    if (rest.empty()) throw UsageError("option " + inQuotes(argument) + " needs a value");
     return setting.set(options, rest.front()), 1;
   }
-  throw UsageError("unknown option " + quoted(argument));
+  throw UsageError("unknown option " + inQuotes(argument));
 }
 
 void checkFiles(Options& options) {
   if (options.action != Action::unpack) {
     const char* name = options.action == Action::selfTest ? "--self-test" : "--schema";
-    if (!options.files.empty()) throw UsageError("option " + quoted(name) + " goes without files");
+    if (!options.files.empty()) throw UsageError("option " + inQuotes(name) + " goes without files");
     return;
   }
   if (options.files.empty()) options.files.emplace_back(kStandardInput);

@@ -63,6 +63,12 @@ void appendHarmless(std::string& out, std::string_view text) {
   }
 }
 
+std::string inQuotes(std::string_view text) {
+  std::string out = "'";
+  appendHarmless(out, text);
+  return out += '\'';
+}
+
 void TextView::label(std::string_view name, std::size_t indent) {
   out_.append(indent, ' ');
   out_ += colours_.label;

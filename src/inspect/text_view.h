@@ -32,6 +32,8 @@ struct Colours {
 /// Appends `text` so that it shows on a terminal and does nothing else there: what is not visible
 /// as itself is written out, as in `\n` or `\u{202e}`, and a byte that is no text as `\x{ff}`.
 void appendHarmless(std::string& out, std::string_view text);
+/// The same in single quotes.
+std::string inQuotes(std::string_view text);
 /// Appends one character so, which is the first of `text`; returns the columns that it takes.
 std::size_t appendHarmless(std::string& out, std::string_view text, const CodePoint& point);
 
