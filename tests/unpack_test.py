@@ -4,15 +4,18 @@
 """
 
 import contextlib
+import fcntl
 import json
 import os
 import pathlib
 import pty
 import re
 import shutil
+import struct
 import subprocess
 import sys
 import tempfile
+import termios
 import threading
 import unittest
 
@@ -22,22 +25,28 @@ from message_model import RECORDS, binary, xml  # noqa: E402
 
 TOOL = None
 MESSAGE_BYTES = 16 << 20
+GOOD = binary({"c": 5, "qai": "é"})
+BAD = xml({"c": 5, "U": "text"})
 
 
-def unpack(*arguments, **options):
+def run(*arguments, **options):
     if "input" not in options:
         options["stdin"] = subprocess.DEVNULL
     pipes = {"stdout": subprocess.PIPE, "stderr": subprocess.PIPE}
-    return subprocess.run([TOOL, "--type", "command-response", *arguments], timeout=250,
-                          **pipes | options)
+    return subprocess.run(arguments, timeout=250, **pipes | options)
 
 
-def lines_of(result):
-    return [json.loads(line) for line in result.stdout.decode().split("\n")[:-1]]
+def unpack(*arguments, **options):
+    return run(TOOL, "--type", "command-response", *arguments, **options)
+
+
+def lines(*arguments, **options):
+    output = unpack("--format=json", *arguments, **options).stdout.decode()
+    return [json.loads(line) for line in output.split("\n")[:-1]]
 
 
 def error(content, *arguments):
-    return lines_of(unpack("--format=json", *arguments, input=content))[0]["error"]
+    return lines(*arguments, input=content)[0]["error"]
 
 
 class InFolder(unittest.TestCase):
@@ -46,14 +55,14 @@ class InFolder(unittest.TestCase):
         self.addCleanup(folder.cleanup)
         self.addCleanup(os.chdir, os.getcwd())
         os.chdir(folder.name)
+        self.write("good", GOOD)
+        self.write("bad", BAD)
 
-    def write(self, name, content):
+    def write(self, name, content, mode=0o644):
+        os.makedirs(os.path.dirname(name) or b".", exist_ok=True)
         with open(name, "wb") as file:
             file.write(content)
-
-    def script(self, name, commands):
-        self.write(name, f"#!/bin/sh\n{commands}\n".encode())
-        os.chmod(name, 0o755)
+        os.chmod(name, mode)
 
     def expect(self, result, status, output, errors=""):
         self.assertEqual((result.returncode, result.stdout.decode(), result.stderr.decode()),
@@ -61,19 +70,12 @@ class InFolder(unittest.TestCase):
 
 
 class CommandLine(InFolder):
-    def setUp(self):
-        super().setUp()
-        self.write("good", binary({"c": 5, "qai": "é"}))
-        self.write("bad", xml({"c": 5, "U": "text"}))
-
-    def test_exit_status_and_lines(self):
+    def test_prints_a_line_for_each_file_and_exits_with_the_highest_status(self):
         good = '{"file": "good", "record": {"command": 5, "applicationId": "é"}}\n'
-        offset = xml({"c": 5, "U": "text"}).index(b"<string>")
         bad = ('{"file": "bad", "error": {"kind": "typeMismatch", "path": "U", '
-               f'"message": "expected data, found string", "offset": {offset}, '
+               f'"message": "expected data, found string", "offset": {BAD.index(b"<string>")}, '
                '"line": 8, "column": 2}}\n')
-        unreadable = ('{"file": "%s", "error": {"kind": "unreadable", "path": "", '
-                      '"message": "%s"}}\n')
+        unreadable = '{"file": "%s", "error": {"kind": "unreadable", "path": "", "message": "%s"}}\n'
         missing = unreadable % ("missing", "No such file or directory")
         folder = unreadable % (".", "Is a directory")
         for files, status, output in (
@@ -81,73 +83,84 @@ class CommandLine(InFolder):
                 (["missing", "good", ".", "bad"], 2, missing + good + folder + bad)):
             self.expect(unpack("--format=json", *files), status, output)
 
-    def test_standard_input(self):
-        for arguments in ([], ["good", "-", "bad"]):
-            result = unpack("--format=json", *arguments, input=binary({"c": 5}))
-            self.assertEqual([line["file"] for line in lines_of(result)], arguments or ["-"])
+    def test_reads_the_files_that_it_is_told_to(self):
+        for name in ("spool/b", "spool/a/z", "spool/a/y", "spool/-", "two\nlines"):
+            self.write(name, GOOD)
+        os.symlink("../good", "spool/link")
+        os.mkfifo("spool/fifo")
+        self.write("list", b"good\n\nspool\n")
+        for arguments, content, files in (
+                ([], GOOD, ["-"]), (["good", "-", "bad"], GOOD, ["good", "-", "bad"]),
+                (["-r", "good", "spool"], b"",
+                 ["good", "spool/-", "spool/a/y", "spool/a/z", "spool/b"]),
+                (["--files-from=list"], b"", ["good", "spool"]),
+                (["-r", "bad", "--files-from=list"], b"",
+                 ["bad", "good", "spool/-", "spool/a/y", "spool/a/z", "spool/b"]),
+                (["--files-from=-"], b"two\nlines\0good\0", ["two\nlines", "good"]),
+                (["--files-from=-"], b"", [])):
+            self.assertEqual([line["file"] for line in lines(*arguments, input=content)], files)
+        for arguments in (["-", "-"], ["-", "--files-from=-"], ["--files-from=missing"]):
+            self.assertEqual(unpack(*arguments, input=b"good").returncode, 2)
 
-    def test_wrong_usage_reads_nothing(self):
-        result = unpack("good", "--nonsense")
-        self.assertEqual((result.returncode, result.stdout), (2, b""))
-        self.assertIn(b"--help", result.stderr)
+    def test_reads_nothing_when_usage_is_wrong(self):
+        self.expect(unpack("good", "--nonsense"), 2, "", "vesk-unpack: not a valid option: "
+                    "'--nonsense'\nTry 'vesk-unpack --help'.\n")
 
-    def test_help_and_version(self):
-        for arguments, text in ((["--help", "good"], rb"([^\n]{0,80}\n)+"),
-                                (["--version"], rb"vesk-unpack \d+\.\d+\.\d+\n")):
+    def test_prints_help_and_version(self):
+        for arguments, text in ((["--help", "good"], rb"([^\n]{0,80}\n)+"), (
+                ["--version"], rb"vesk-unpack \d+\.\d+\.\d+, frames version \d+\n")):
             result = unpack(*arguments)
             self.assertEqual((result.returncode, result.stderr), (0, b""))
-            self.assertTrue(re.fullmatch(text, result.stdout), result.stdout)
+            self.assertRegex(result.stdout, b"^" + text + b"$")
 
-    def test_no_service(self):
-        for program in ("/nonexistent/service", "/bin/true"):
-            result = unpack("--format=json", "--service", program, "good", "bad")
-            self.assertEqual(result.returncode, 2)
-            self.assertEqual([(line["file"], line["error"]["kind"]) for line in lines_of(result)],
-                             [("good", "unavailable"), ("bad", "unavailable")])
+    def test_says_why_there_is_no_service(self):
+        self.write("lacks", b"#!/bin/sh\nexit 65\n", 0o755)
+        for program, why in (("/nonexistent/service", "No such file"), ("/bin/true", "status 0"),
+                             ("./lacks", "no new privileges")):
+            for line in lines("--service", program, "good", "bad"):
+                self.assertEqual(line["error"]["kind"], "unavailable")
+                self.assertIn(why, line["error"]["message"])
+            self.assertEqual(unpack("--service", program, "good").returncode, 2)
 
-    def test_no_service_that_others_can_replace(self):
-        os.mkdir("open")
-        tool = shutil.copy(TOOL, "open")
-        self.script("open/VeskIronmoatService", "touch ran")
+    def test_starts_no_service_that_others_can_replace(self):
+        self.write("open/VeskIronmoatService", b"#!/bin/sh\ntouch ran\n", 0o755)
         os.chmod("open", 0o777)
-        result = subprocess.run([tool, "good"], capture_output=True, timeout=60)
+        tool = os.path.abspath(shutil.copy(TOOL, "open"))
+        result = run(tool, "good")
         self.assertEqual(result.returncode, 2)
         self.assertRegex(result.stderr.decode(), "other users can replace '.*/open/VeskIronmoatServ")
-        hidden = "mount -t tmpfs none /proc && exec "
-        if not subprocess.run(["unshare", "-m", "sh", "-c", hidden + "true"]).returncode:
-            subprocess.run(["unshare", "-m", "sh", "-c", hidden + '"$0" good', tool], cwd="open",
-                           capture_output=True, timeout=60)
+        hidden = ["unshare", "-m", "sh", "-c", 'mount -t tmpfs none /proc && exec "$@"', "sh"]
+        if run(*hidden, "true").returncode == 0:
+            result = run(*hidden, tool, "../good", cwd="open")
+            self.assertIn(b"../good", result.stdout + result.stderr)
         self.assertFalse(os.path.exists("ran") or os.path.exists("open/ran"))
 
-    def test_too_long_messages_are_not_read_whole(self):
+    def test_rejects_messages_that_are_too_long_without_reading_them_whole(self):
         for name, size in (("huge", 5 << 30), ("longest", MESSAGE_BYTES)):
             self.write(name, b"")
             os.truncate(name, size)
-        errors = [line["error"] for line in lines_of(
-            unpack("--format=json", "huge", "/dev/zero", "longest"))]
-        self.assertEqual([error["message"] for error in errors[:2]], [
-            f"message of {5 << 30} bytes, more than {MESSAGE_BYTES}",
-            f"message of more than {MESSAGE_BYTES} bytes"])
-        self.assertEqual([error["kind"] for error in errors],
-                         ["limitExceeded", "limitExceeded", "malformed"])
+        too_long = ("limitExceeded", f"message exceeds the limit of {MESSAGE_BYTES} bytes")
+        errors = [line["error"] for line in lines("huge", "/dev/zero", "longest")]
+        self.assertEqual([(each["kind"], each["message"]) for each in errors[:2]], [too_long] * 2)
+        self.assertEqual(errors[2]["kind"], "malformed")
 
-    def test_file_names_that_are_no_text(self):
+    def test_takes_file_names_that_are_not_text(self):
         self.write(b'n\xff\n"\xc3\xa9\x1b', binary({"c": 1}))
-        self.assertEqual(lines_of(unpack("--format=json", b'n\xff\n"\xc3\xa9\x1b')),
+        self.assertEqual(lines(b'n\xff\n"\xc3\xa9\x1b'),
                          [{"file": 'n\ufffd\n"é\x1b', "record": {"command": 1}}])
 
-    def test_output_that_cannot_be_written(self):
-        for arguments in (["good"], ["--help"]):
+    def test_fails_when_output_cannot_be_written(self):
+        for arguments in (["good"], ["good", "bad"], ["--help"]):
             with open("/dev/full", "wb") as full:
                 result = unpack(*arguments, stdout=full)
             self.assertEqual(result.returncode, 2)
-            self.assertIn(b"standard output", result.stderr)
+            self.assertIn(b"standard output: No space left", result.stderr)
 
 
 class Companions(unittest.TestCase):
     """The man page and the completions know what the tool does."""
 
-    def test_all_options_are_known(self):
+    def test_know_all_options(self):
         options = set(re.findall(r"^  (--[a-z-]+)", unpack("--help").stdout.decode(), re.MULTILINE))
         self.assertGreater(len(options), 8)
         page = (PROJECT / "doc/man/vesk-unpack.1").read_text().replace("Fl Fl ", "--")
@@ -163,7 +176,7 @@ class Companions(unittest.TestCase):
             ["bash", "-c", script, "bash", PROJECT / "packaging/completion/vesk-unpack.bash",
              "vesk-unpack", *words], cwd=PROJECT / "examples", text=True).split()
 
-    def test_completions_of_values(self):
+    def test_complete_values(self):
         types = ["payload", "command-response", "web-tunnel-response"]
         for words, expected in (
                 (["--type", ""], [*types, "auto"]), (["--type", "=", "pay"], ["payload"]),
@@ -172,10 +185,10 @@ class Companions(unittest.TestCase):
             self.assertEqual(self.completions(*words), expected)
 
 
-class Places(InFolder):
-    """Where a message is wrong is told alike for both forms and all encodings."""
+class Positions(InFolder):
+    """The tool shows where a message is wrong alike for both formats and all encodings."""
 
-    def test_offsets_are_those_of_the_value_at_fault(self):
+    def test_are_those_of_the_value_at_fault_in_text(self):
         body = ('<plist version=">1"><dict><!-- <dict> --><key>c</key><integer>5</integer>'
                 '<key><![CDATA[<s>]]></key><?a <b>?><array ><data/><true/></array>'
                 '<key>é&lt;</key><dict/>\n%s</dict></plist>')
@@ -194,7 +207,7 @@ class Places(InFolder):
                     "kind": kind, "path": path, "offset": len((mark + ahead).encode(encoding)),
                     "line": 1 + ahead.count("\n"), "column": len(ahead) - ahead.rindex("\n")})
 
-    def test_offsets_in_the_binary_form(self):
+    def test_are_offsets_of_the_value_at_fault_in_binary_messages(self):
         filler = {str(number): number for number in range(300)}  # for offsets of two bytes
         for message, path, marker in (({"c": 5, "U": "found me"}, "U", b"\x58found me"),
                                       ({"c": 5, "s": 2**64 - 1}, "s", b"\x14" + bytes(8)),
@@ -204,7 +217,7 @@ class Places(InFolder):
             self.assertEqual((found["path"], found["offset"]), (path, content.index(marker)))
             self.assertNotIn("line", found)
 
-    def test_a_key_in_the_wrong_case_is_hinted_at(self):
+    def test_come_with_a_hint_when_a_key_differs_only_in_case(self):
         for message, hinted in (({"C": 5}, True), ({"d": 1, "cc": 1, "\u0421": 1}, False)):
             for content in (binary(message), xml(message)):
                 found = error(content)
@@ -213,7 +226,7 @@ class Places(InFolder):
 
 
 class Types(InFolder):
-    def test_schemas_are_the_tables(self):
+    def test_have_the_schemas_of_the_tables(self):
         page = json.loads((PROJECT / "doc/records.json").read_text())["records"]
 
         def reached(name):
@@ -221,7 +234,7 @@ class Types(InFolder):
             return {name}.union(*(reached(each) for each in inner & set(page) - {name}))
 
         for kind, (_, output) in RECORDS.items():
-            records = lines_of(unpack("--format=json", "--schema", kind))[0]["records"]
+            records = lines("--schema", kind)[0]["records"]
             self.assertEqual(records[0]["name"], output)
             self.assertEqual({record["name"]: record["fields"] for record in records}, {
                 name: [{"key": field["key"], "name": field["name"], "label": field["label"],
@@ -232,7 +245,7 @@ class Types(InFolder):
             self.assertEqual(sum(line.startswith("  ") for line in text.splitlines()),
                              sum(len(record["fields"]) for record in records))
 
-    def test_auto_takes_the_record_that_got_most(self):
+    def test_are_chosen_by_auto_for_the_record_that_got_most(self):
         rows = [
             ({"c": 5}, "command-response", ["web-tunnel-response", "payload"]),
             ({"c": 5, "i": 7}, "command-response", ["web-tunnel-response"]),
@@ -242,14 +255,13 @@ class Types(InFolder):
         ]
         for number, (message, _, _) in enumerate(rows):
             self.write(str(number), binary(message))
-        result = unpack("--type=auto", "--format=json", *map(str, range(len(rows))))
-        self.assertEqual(result.returncode, 0)
-        self.assertEqual([(line["type"], line["asWell"]) for line in lines_of(result)],
+        found = lines("--type=auto", *map(str, range(len(rows))))
+        self.assertEqual([(line["type"], line["asWell"]) for line in found],
                          [(kind, as_well) for _, kind, as_well in rows])
-        self.assertIn("0 (command-response; as well: web-tunnel-response, payload)\n",
-                      unpack("--type=auto", "0").stdout.decode())
+        self.expect(unpack("--type=auto", "0"), 0,
+                    "0 (command-response; also fits: web-tunnel-response, payload)\n  command  5\n")
 
-    def test_auto_when_no_type_fits(self):
+    def test_are_all_reported_when_none_fits(self):
         found = error(xml({"c": 5, "i": True}), "--type=auto")
         self.assertEqual(found["kind"], "noTypeFits")
         self.assertEqual([(each["type"], each["path"], each["message"]) for each in found["types"]],
@@ -258,37 +270,51 @@ class Types(InFolder):
                           ("payload", "i", "expected string, found boolean")])
         for content, kind, service in ((b"", "malformed", []), (xml({"C": 1}), "keyNotFound", []),
                                        (b"", "unavailable", ["--service=/bin/true"])):
-            found = error(content, "--type=auto", *service)  # all say the same
+            found = error(content, "--type=auto", *service)  # the same for all types
             self.assertEqual((found["kind"], "types" in found), (kind, False))
 
-    def test_quiet_and_summary(self):
-        self.write("good", xml({"c": 5}))
-        self.write("bad", xml({}))
+    def test_are_hinted_at_when_none_is_given(self):
+        hint = "(decoded as payload; --type auto tries all types)\n"
+        for arguments, hinted in (([], True), (["--type=payload"], False), (["good"], False),
+                                  (["--format=json"], False), (["--summary"], False),
+                                  (["missing"], False)):
+            result = run(TOOL, *arguments, input=xml({"C": 5}))
+            self.assertEqual(result.stderr.decode().endswith(hint), hinted)
+
+
+class Output(InFolder):
+    def test_is_only_the_exit_status_or_a_summary_when_asked_for(self):
         self.write("junk", b"")
         for files, status in ((["good"], 0), (["good", "bad"], 1), (["bad", "missing"], 2)):
             self.expect(unpack("--quiet", *files), status, "")
         files = ["good", "bad", "junk", "missing", "bad", *["good"] * 9]
-        self.expect(unpack("--summary", *files), 2, "14  messages\n"
-                                                    "10  accepted\n"
-                                                    " 2  keyNotFound\n"
-                                                    " 1  malformed\n"
-                                                    " 1  unreadable\n")
-        self.assertEqual(lines_of(unpack("--summary", "--format=json", "--type=auto", *files)), [
-            {"messages": 14, "accepted": 10, "types": {"command-response": 10},
-             "errors": {"keyNotFound": 2, "malformed": 1, "unreadable": 1}}])
+        result = unpack("--summary", *files)
+        self.assertRegex(result.stdout.decode(), r"""^14  messages in \d+\.\d{3} s \(\d+/s, \d+\.\d\d MB/s\)
+10  accepted \(71\.4 %\)
+ 1  malformed \(7\.1 %\)
+ 2  typeMismatch \(14\.3 %\)
+ 1  unreadable \(7\.1 %\)
+$""")
+        summary, = lines("--summary", "--type=auto", *files)
+        self.assertLess(0, summary.pop("seconds"))
+        self.assertEqual(summary, {
+            "messages": 14, "accepted": 10, "types": {"command-response": 10},
+            "errors": {"malformed": 1, "typeMismatch": 2, "unreadable": 1}, "bytes": 10 * len(GOOD) + 2 * len(BAD)})
 
+    def test_keeps_integers_exact_when_asked_to(self):
+        line, = lines("--exact-integers", input=binary({"c": 5, "i": 2**63 - 1}))
+        self.assertEqual(line["record"], {"command": "5", "messageId": "9223372036854775807"})
 
-class Text(InFolder):
-    def test_a_record_and_a_refusal(self):
+    def test_shows_records_and_rejections_as_text(self):
         self.write("good", xml({"c": 5, "U": bytes(range(16)), "qai": "a.b", "qrss": False}))
-        self.write("bad", xml({"c": 5, "U": "text"}))
         record = ("good\n"
                   "  command        5\n"
                   "  messageUUID    00010203 04050607 08090a0b 0c0d0e0f (16 bytes)\n"
                   '  applicationId  "a.b"\n'
                   "  sharedSession  false\n")
+        result = unpack("good", "bad", "missing", "good", stderr=subprocess.STDOUT)
         self.assertEqual(
-            unpack("good", "bad", "missing", "good", stderr=subprocess.STDOUT).stdout.decode(),
+            result.stdout.decode(),
             record + "vesk-unpack: bad: typeMismatch at U: expected data, found string\n"
             "  line 8, column 2\n"
             "    <string>text</string>\n"
@@ -296,7 +322,7 @@ class Text(InFolder):
             "vesk-unpack: missing: unreadable: No such file or directory\n"
             "\n" + record)
 
-    def test_nothing_of_the_sender_steers_a_terminal(self):
+    def test_holds_nothing_of_the_sender_that_controls_a_terminal(self):
         nasty = "\x1b]0;owned\x07\x9b2J\r\n\u202e" + "a" * 10_000
         names = [f"\x1b[31m{name}\n" for name in ("good", "bad", "missing")]
         self.write(names[0], binary({"c": 5, "qai": nasty, "\x1b[2J": 1}))
@@ -306,9 +332,10 @@ class Text(InFolder):
         self.assertEqual(len(output.splitlines()), 8)
         self.assertLess(max(map(len, output.splitlines())), 600)
 
-    def on_terminal(self, *arguments, **environment):
+    def on_terminal(self, *arguments, columns=80, **environment):
         """Standard output and standard error as a terminal gets them."""
         master, slave = pty.openpty()
+        fcntl.ioctl(slave, termios.TIOCSWINSZ, struct.pack("4H", 24, columns, 0, 0))
         with os.fdopen(master, "rb", buffering=0) as terminal:
             process = subprocess.Popen([TOOL, "--type=command-response", *arguments], stdout=slave,
                                        stderr=slave, stdin=subprocess.DEVNULL,
@@ -319,24 +346,29 @@ class Text(InFolder):
                 while part := terminal.read(65536):
                     output += part
             process.wait(timeout=60)
-        return output.decode()
+        return output.decode().replace("\r\n", "\n")
 
-    def test_colours_on_a_terminal_only(self):
-        self.write("good", xml({"c": 5}))
+    def test_has_colours_on_a_terminal_only(self):
         self.assertIn("\x1b[", self.on_terminal("good", "missing"))
         for environment in ({"NO_COLOR": "1"}, {"TERM": "dumb"}):
             self.assertNotIn("\x1b", self.on_terminal("good", "missing", **environment))
         self.assertNotIn("\x1b[", self.on_terminal("--format=json", "good"))
 
-    def test_progress_shows_and_goes_away(self):
-        self.write("good", xml({"c": 5}))
+    def test_wraps_descriptions_at_the_width_of_the_terminal(self):
+        for columns, words in ((40, ":\n    expected data, found string"),
+                               (64, ": expected data, found string"),
+                               (63, ": expected data, found\n    string")):
+            shown = self.on_terminal("bad", columns=columns, NO_COLOR="1")
+            self.assertIn("vesk-unpack: bad: typeMismatch at U" + words + "\n  line 8", shown)
+
+    def test_has_a_progress_line_on_a_terminal_that_goes_away(self):
         os.mkfifo("slow")
-        feeder = threading.Timer(0.5, self.write, ("slow", xml({"c": 5})))
+        feeder = threading.Timer(0.5, self.write, ("slow", GOOD))
         feeder.start()
         output = self.on_terminal("slow", "good")
         feeder.join()
         self.assertIn("1 of 2 messages", output)
-        on_screen = "\n".join(re.sub(".*\r\x1b\\[K", "", line) for line in output.split("\r\n"))
+        on_screen = re.sub(".*\r\x1b\\[K", "", output)
         self.assertNotIn("of 2 messages", on_screen)
 
 

@@ -7,7 +7,7 @@ _vesk_unpack() {
   for ((i = 1; i < COMP_CWORD; ++i)); do
     [[ ${COMP_WORDS[i]} != -- ]] || option=files
   done
-  # '=' is a word of its own: --type = pay
+  # Bash makes '=' a word of its own: --type = pay
   if [[ $word == = ]]; then
     word=
   elif [[ $option == = ]]; then
@@ -19,8 +19,8 @@ _vesk_unpack() {
     --format) mapfile -t COMPREPLY < <(compgen -W 'text json' -- "$word") ;;
     *)
       if [[ $word == -* && $option != files ]]; then
-        mapfile -t COMPREPLY < <(compgen -W '--type --format --summary --quiet --schema --service
-          --self-test --help --version' -- "$word")
+        mapfile -t COMPREPLY < <(compgen -W '--type --format --exact-integers --recursive --files-from
+          --summary --quiet --schema --service --self-test --help --version' -- "$word")
       else
         compopt -o filenames 2>/dev/null
         mapfile -t COMPREPLY < <(compgen -f -- "$word")

@@ -7,38 +7,43 @@ std::string_view helpText() noexcept {
        vesk-unpack --schema TYPE [--format FORMAT]
        vesk-unpack --self-test
 
-Has each FILE, one property-list message (binary or XML), unpacked by the
-service VeskIronmoatService in a process of its own, and prints the record, or
-why the message was refused and where. Without FILE, or for -, reads standard
-input.
+Sends each FILE, one property-list message (binary or XML), to the service
+VeskIronmoatService, which parses it in a sandboxed process, and prints the
+record, or why and where the service rejected the message. Without FILE, or for
+-, reads standard input.
 
-  --type TYPE        what the messages are: payload (default), command-response,
-                     web-tunnel-response; or auto, to try all of them and take
-                     the record that got most of the message
+  --type TYPE        decode messages as payload (default), command-response or
+                     web-tunnel-response; or auto, which tries all types and
+                     takes the record that got most of the message
   --format FORMAT    text (default), for people: records on standard output,
-                     refusals on standard error, long values cut; or
+                     rejections on standard error, long values cut; or
                      json, for programs: one line for each FILE, in order,
                      {"file": F, "record": {...}} or
                      {"file": F, "error": {"kind": K, "path": P, "message": M}}
-  --summary          print only how many messages were accepted, and how many
-                     failed with each kind of error
-  --quiet, -q        print nothing: the exit status tells
+  --exact-integers   in JSON, write the integers of records as strings, for
+                     programs that would round them to 53 bits
+  --recursive, -r    read all regular files in each FILE that is a folder
+  --files-from LIST  read the files that LIST names, too, one a line, or
+                     NUL-separated; LIST may be - for standard input
+  --summary          print only how many messages the service accepted, how many
+                     failed with each kind of error, and how fast
+  --quiet, -q        print nothing; only set the exit status
   --schema TYPE      show the fields of the record TYPE, of the records in it,
                      and their keys in messages and in the paths of errors
-  --service PROGRAM  use this service, not the one that came with this tool
-  --self-test        show what confines the service, and what comes of what is
-                     forbidden to it
-  --help, -h         print this
-  --version          print the version
+  --service PROGRAM  start this service, not the one that came with this tool
+  --self-test        show the service's sandbox, and try what it forbids
+  --help, -h         print this help
+  --version          print the version, and that of the frames on the wire
 
 Kinds of error: malformed, limitExceeded, typeMismatch, outOfRange, keyNotFound,
-rejectedByHost (the message was refused), noTypeFits (every type refused it, for
-different reasons), crashed, timedOut (the service failed over it), unavailable
-(no service could be had), unreadable (FILE could not be read).
+rejectedByHost (the service rejected the message), noTypeFits (it rejected the
+message as each type, for different reasons), crashed, timedOut (it failed on
+the message), unavailable (no service could be started), unreadable (FILE could
+not be read).
 
-Exit status: 0 all unpacked; 1 some message refused, or the service failed over
-it, or it is not confined as it has to be; 2 wrong usage, a FILE that could not
-be read, no service, output not writable.
+Exit status: 0 if the service accepted all messages; 1 if it rejected or failed
+on one, or its sandbox is incomplete; 2 for wrong usage, a FILE that could not
+be read, no service, or output that could not be written.
 )";
 }
 

@@ -1,83 +1,57 @@
 #include "inspect/json.h"
 
-#include <array>
+#include <algorithm>
 
-#include "inspect/code_points.h"
+#include "inspect/terminal_text.h"
 
 namespace ironmoat::inspect {
 
-namespace {
-
-constexpr std::string_view kHexDigits = "0123456789abcdef";
-
-void appendEscape(std::string& out, char32_t value) {
-  switch (value) {
-    case '"':
-      out += "\\\"";
-      return;
-    case '\\':
-      out += "\\\\";
-      return;
-    case '\n':
-      out += "\\n";
-      return;
-    case '\r':
-      out += "\\r";
-      return;
-    case '\t':
-      out += "\\t";
-      return;
-    default:  // every other one that is escaped is below U+10000
-      out += "\\u";
-      for (int shift = 12; shift >= 0; shift -= 4) out += kHexDigits[(value >> shift) & 0xF];
-  }
+// A value or name follows another one unless it comes first in its brackets or behind a name.
+void JsonWriter::separate() {
+  static constexpr std::string_view kNoComma = "{[ \n";
+  if (!out_.empty() && kNoComma.find(out_.back()) == kNoComma.npos) out_ += ", ";
 }
 
-bool isPlain(char c) noexcept { return c >= ' ' && c <= '~' && c != '"' && c != '\\'; }
-
-}  // namespace
-
-void appendJsonText(std::string& out, std::string_view text) {
-  out += '"';
-  std::size_t copied = 0;  // text before this is in `out`
-  std::size_t at = 0;
-  while (at < text.size()) {
-    if (isPlain(text[at])) {
-      ++at;
-      continue;
-    }
-    const CodePoint point = firstCodePoint(text.substr(at));
-    const bool escaped = isControl(point.value) || point.value == '"' || point.value == '\\';
-    if (escaped || !point.wellFormed) {
-      out += text.substr(copied, at - copied);
-      if (escaped) {
-        appendEscape(out, point.value);
-      } else {
-        out += "\xEF\xBF\xBD";
-      }
-      copied = at + point.length;
-    }
-    at += point.length;
-  }
-  out += text.substr(copied);
-  out += '"';
+void JsonWriter::integer(std::string_view digits) {
+  if (integers_ == Integers::strings) return text(digits);
+  separate();
+  out_ += digits;
 }
 
-void appendJsonBytes(std::string& out, std::span<const std::uint8_t> bytes) {
+void JsonWriter::text(std::string_view text) {
+  separate();
+  out_ += '"';
+  while (!text.empty()) {
+    const CodePoint point = firstCodePoint(text);
+    if (!point.wellFormed) {
+      out_ += "\xEF\xBF\xBD";
+    } else if (point.value == '"' || point.value == '\\') {
+      out_.append(1, '\\').append(text, 0, 1);
+    } else if (point.value == '\n' || point.value == '\t' || point.value == '\r') {
+      out_ += point.value == '\n' ? "\\n" : point.value == '\t' ? "\\t" : "\\r";
+    } else if (isControl(point.value)) {
+      out_ += formatted("\\u%04x", static_cast<unsigned>(point.value));
+    } else {
+      out_ += text.substr(0, point.length);
+    }
+    text.remove_prefix(point.length);
+  }
+  out_ += '"';
+}
+
+void JsonWriter::bytes(std::span<const std::uint8_t> bytes) {
   static constexpr std::string_view kDigits =
       "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
-  out += '"';
-  while (!bytes.empty()) {
-    const std::size_t count = bytes.size() < 3 ? bytes.size() : 3;
+  separate();
+  out_ += '"';
+  for (; !bytes.empty(); bytes = bytes.subspan(std::min<std::size_t>(3, bytes.size()))) {
     std::uint32_t group = 0;
-    for (std::size_t i = 0; i < 3; ++i) group = (group << 8U) | (i < count ? bytes[i] : 0U);
-    std::array<char, 4> digits = {kDigits[group >> 18U], kDigits[(group >> 12U) & 63U],
-                                  kDigits[(group >> 6U) & 63U], kDigits[group & 63U]};
-    for (std::size_t i = count + 1; i < digits.size(); ++i) digits[i] = '=';
-    out.append(digits.data(), digits.size());
-    bytes = bytes.subspan(count);
+    for (std::size_t i = 0; i < 3; ++i) group = group << 8U | (i < bytes.size() ? bytes[i] : 0U);
+    for (std::size_t i = 0; i < 4; ++i) {
+      out_ += i <= bytes.size() ? kDigits[group >> (18 - 6 * i) & 63U] : '=';
+    }
   }
-  out += '"';
+  out_ += '"';
 }
 
 }  // namespace ironmoat::inspect

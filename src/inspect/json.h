@@ -5,53 +5,81 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <type_traits>
 
 #include "inspect/present_fields.h"
 #include "ironmoat/values.h"
 
 namespace ironmoat::inspect {
 
-/// Appends a JSON string. What is not well-formed UTF-8 becomes U+FFFD. No character that could
-/// end a line or steer a terminal is left unescaped.
-void appendJsonText(std::string& out, std::string_view text);
+/// Whether integers become JSON numbers or strings.
+enum class Integers : std::uint8_t { numbers, strings };
 
-/// Appends a JSON string of standard base64, padded.
-void appendJsonBytes(std::string& out, std::span<const std::uint8_t> bytes);
+/// Appends JSON to a string, with commas where they belong. Output never contains a character that
+/// ends a line or controls a terminal; bytes that are not UTF-8 become U+FFFD.
+class JsonWriter {
+ public:
+  /// `out` must outlive the writer. Several writers may take turns on it.
+  explicit JsonWriter(std::string& out, Integers integers = Integers::numbers)
+      : out_(out), integers_(integers) {}
 
-/// Appends a field's value: a nested record is an object of the fields that are there.
-template <class T>
-void appendJson(std::string& out, const T& value) {
-  if constexpr (std::same_as<T, Bool>) {
-    out += value ? "true" : "false";
-  } else if constexpr (std::integral<T>) {
-    out += std::to_string(value);
-  } else if constexpr (std::same_as<T, String>) {
-    appendJsonText(out, value.view());
-  } else if constexpr (std::same_as<T, Data>) {
-    appendJsonBytes(out, value.bytes());
-  } else if constexpr (kIsList<T>) {
-    out += '[';
-    bool first = true;
-    for (const auto& element : value) {
-      if (!first) out += ", ";
-      first = false;
-      appendJson(out, element);
-    }
-    out += ']';
-  } else {
-    static_assert(Record<T>);
-    out += '{';
-    bool first = true;
-    forEachPresentField(value, [&](std::string_view name, const auto& present) {
-      if (!first) out += ", ";
-      first = false;
-      out += '"';
-      out += name;
-      out += "\": ";
-      appendJson(out, present);
-    });
-    out += '}';
+  /// `bracket`: one of `{ [`
+  JsonWriter& open(char bracket) {
+    separate();
+    out_ += bracket;
+    return *this;
   }
-}
+  /// `bracket`: one of `} ]`
+  JsonWriter& close(char bracket) {
+    out_ += bracket;
+    return *this;
+  }
+  /// Names the value that comes next.
+  JsonWriter& name(std::string_view name) {
+    text(name);
+    out_ += ": ";
+    return *this;
+  }
+  template <class T>
+  JsonWriter& member(std::string_view name, const T& value) {
+    return this->name(name).value(value);
+  }
+
+  /// A record is an object of its present fields; bytes are in base64.
+  template <class T>
+  JsonWriter& value(const T& value) {
+    if constexpr (std::same_as<T, bool>) {
+      separate();
+      out_ += value ? "true" : "false";
+    } else if constexpr (std::integral<T>) {
+      integer(std::to_string(value));
+    } else if constexpr (std::convertible_to<T, std::string_view>) {
+      text(value);
+    } else if constexpr (std::same_as<T, String>) {
+      text(value.view());
+    } else if constexpr (std::same_as<T, Data>) {
+      bytes(value.bytes());
+    } else if constexpr (Record<T>) {
+      open('{');
+      forEachPresentField(
+          value, [&](std::string_view field, const auto& present) { member(field, present); });
+      close('}');
+    } else {
+      open('[');
+      for (const auto& element : value) this->value(element);
+      close(']');
+    }
+    return *this;
+  }
+
+ private:
+  void separate();
+  void integer(std::string_view digits);
+  void text(std::string_view text);
+  void bytes(std::span<const std::uint8_t> bytes);
+
+  std::string& out_;
+  const Integers integers_;
+};
 
 }  // namespace ironmoat::inspect

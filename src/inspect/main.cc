@@ -5,40 +5,41 @@
 #include <span>
 #include <string>
 
-#include "inspect/confinement_report.h"
+#include "frames/frame.h"
 #include "inspect/options.h"
-#include "inspect/record_types.h"
+#include "inspect/self_test.h"
 #include "inspect/service_program.h"
 #include "inspect/terminal.h"
 #include "inspect/unpack_files.h"
 
 namespace {
 
-using ironmoat::inspect::Action;
-using ironmoat::inspect::ExitStatus;
-using ironmoat::inspect::Options;
-using ironmoat::inspect::Terminal;
+using namespace ironmoat;
+using namespace ironmoat::inspect;
 
-ExitStatus run(std::span<const char* const> arguments, Terminal& terminal) {
-  const Options options = ironmoat::inspect::parseOptions(arguments);
-  if (options.action == Action::unpack) return ironmoat::inspect::unpackFiles(options, terminal);
-  if (options.action == Action::showSchema) {
-    std::string text;
-    ironmoat::inspect::recordType(options.schema)
-        ->showSchema(options.format, terminal.outputColours(), text);
-    terminal.print(text);
-    terminal.flush();
-    return ironmoat::inspect::allUnpacked;
+int run(std::span<const char* const> arguments, Terminal& terminal) {
+  const Options options = parseOptions(arguments);
+  switch (options.action) {
+    case Action::unpack:
+      return unpackFiles(options, terminal);
+    case Action::selfTest:
+      return selfTest(std::cout, options.service.empty() ? serviceProgram() : options.service);
+    case Action::showSchema: {
+      const auto schemas = recordType(options.schema)->schemas();
+      terminal.print(options.format == Format::json
+                         ? schemasAsJson(schemas)
+                         : schemasAsText(schemas, terminal.outputStyle().colours));
+      break;
+    }
+    case Action::showHelp:
+      terminal.print(helpText());
+      break;
+    case Action::showVersion:
+      terminal.print("vesk-unpack " IRONMOAT_VERSION ", frames version " +
+                     std::to_string(frames::kVersion) + '\n');
   }
-  if (options.action == Action::selfTest) {
-    return static_cast<ExitStatus>(ironmoat::inspect::selfTest(
-        std::cout,
-        options.service.empty() ? ironmoat::inspect::serviceProgram() : options.service));
-  }
-  terminal.print(options.action == Action::showHelp ? ironmoat::inspect::helpText()
-                                                    : "vesk-unpack " IRONMOAT_VERSION "\n");
-  terminal.flush();
-  return ironmoat::inspect::allUnpacked;
+  terminal.finish();
+  return allUnpacked;
 }
 
 }  // namespace
@@ -48,11 +49,11 @@ int main(int argc, char** argv) {
   try {
     const std::span<const char* const> all(argv, static_cast<std::size_t>(argc));
     return run(all.subspan(std::min<std::size_t>(1, all.size())), terminal);
-  } catch (const ironmoat::inspect::UsageError& error) {
-    terminal.lastWords(std::string("vesk-unpack: ") + error.what() +
-                       "\nTry 'vesk-unpack --help'.\n");
+  } catch (const UsageError& error) {
+    terminal.printError(std::string("vesk-unpack: ") + error.what() +
+                        "\nTry 'vesk-unpack --help'.\n");
   } catch (const std::exception& error) {
-    terminal.lastWords(std::string("vesk-unpack: ") + error.what() + '\n');
+    terminal.printError(std::string("vesk-unpack: ") + error.what() + '\n');
   }
-  return ironmoat::inspect::cannotWork;
+  return cannotWork;
 }

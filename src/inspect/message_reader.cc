@@ -1,15 +1,17 @@
 #include "inspect/message_reader.h"
 
 #include <fcntl.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <filesystem>
+#include <limits>
 #include <string_view>
 #include <system_error>
 
-#include "inspect/options.h"
+#include "client/file_descriptor.h"
+#include "inspect/terminal_text.h"
 #include "ironmoat/errors.h"
 #include "ironmoat/limits.h"
 
@@ -17,56 +19,95 @@ namespace ironmoat::inspect {
 
 namespace {
 
-constexpr std::size_t kFirstRead = std::size_t{64} << 10;
+namespace fs = std::filesystem;
 
-[[noreturn]] void throwErrno() { throw std::system_error(errno, std::generic_category()); }
-
-[[noreturn]] void throwTooLong(const std::string& sentence) {
-  throw DecodingError(DecodingError::Kind::limitExceeded, "", sentence);
+/// Reads `file` into `buffer`, which it only makes longer, up to one byte more than `limit`;
+/// returns the number of bytes. Asks for at most twice what came, so that a small file costs a
+/// small buffer.
+std::size_t readInto(std::string& buffer, const std::string& file, std::size_t limit) {
+  constexpr std::size_t kFirstRead = std::size_t{64} << 10;
+  client::FileDescriptor opened;
+  if (file != kStandardInput) {
+    opened = client::FileDescriptor(::open(file.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY));
+    if (!opened) throw std::system_error(errno, std::generic_category(), inQuotes(file));
+  }
+  std::size_t filled = 0;
+  while (filled <= limit) {
+    if (filled == buffer.size()) {
+      buffer.resize(std::min(std::max(kFirstRead, 2 * filled), limit + 1));
+    }
+    const ssize_t got = ::read(opened ? opened.get() : STDIN_FILENO, buffer.data() + filled,
+                               buffer.size() - filled);
+    if (got == 0) break;
+    if (got < 0 && errno != EINTR)
+      throw std::system_error(errno, std::generic_category(), inQuotes(file));
+    if (got > 0) filled += static_cast<std::size_t>(got);
+  }
+  return filled;
 }
 
-class File {
- public:
-  explicit File(const std::string& name)
-      : descriptor_(::open(name.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY)) {
-    if (descriptor_ < 0) throwErrno();
+void addListed(std::vector<std::string>& files, const std::string& list) {
+  std::string names;
+  names.resize(readInto(names, list, std::numeric_limits<std::size_t>::max() / 4));
+  const char separator = names.find('\0') == names.npos ? '\n' : '\0';
+  for (std::size_t start = 0; start < names.size();) {
+    const std::size_t end = std::min(names.find(separator, start), names.size());
+    if (end != start) files.push_back(names.substr(start, end - start));
+    start = end + 1;
   }
-  File(const File&) = delete;
-  File& operator=(const File&) = delete;
-  ~File() { ::close(descriptor_); }
-  [[nodiscard]] int descriptor() const noexcept { return descriptor_; }
+}
 
- private:
-  int descriptor_;
-};
+/// Appends the files in `folder`. Symbolic links are left out, so that whoever fills the folder
+/// cannot point at files elsewhere; so are FIFOs and devices, which might block.
+void addFolder(std::vector<std::string>& files, const fs::path& folder) {
+  std::vector<std::string> found;
+  for (std::vector<fs::path> folders = {folder}; !folders.empty();) {
+    const fs::path next = std::move(folders.back());
+    folders.pop_back();
+    std::error_code error;
+    std::error_code ignored;
+    fs::directory_iterator entry(next, error);
+    for (; !error && entry != fs::directory_iterator(); entry.increment(error)) {
+      const fs::file_type type = entry->symlink_status(ignored).type();
+      if (type == fs::file_type::directory) folders.push_back(entry->path());
+      if (type == fs::file_type::regular) found.push_back(entry->path());
+    }
+    if (error) found.push_back(next);
+  }
+  std::sort(found.begin(), found.end());
+  files.insert(files.end(), found.begin(), found.end());
+}
 
 }  // namespace
 
 Data MessageReader::read(const std::string& file) {
-  const std::size_t size =
-      file == kStandardInput ? readToEnd(STDIN_FILENO) : readToEnd(File(file).descriptor());
+  const std::size_t size = readInto(buffer_, file, limits::messageBytes);
+  if (size > limits::messageBytes) {
+    throw DecodingError(
+        DecodingError::Kind::limitExceeded, "",
+        "message exceeds the limit of " + std::to_string(limits::messageBytes) + " bytes");
+  }
   return Data(std::string_view(buffer_.data(), size));
 }
 
-// Asks for no more than twice what came, so that a small message costs a small buffer.
-std::size_t MessageReader::readToEnd(int descriptor) {
-  const std::string most = std::to_string(limits::messageBytes);
-  struct stat status = {};
-  if (::fstat(descriptor, &status) != 0) throwErrno();
-  if (S_ISREG(status.st_mode) && status.st_size > static_cast<off_t>(limits::messageBytes)) {
-    throwTooLong("message of " + std::to_string(status.st_size) + " bytes, more than " + most);
+std::vector<std::string> filesOf(const Options& options) {
+  std::vector<std::string> named = options.files;
+  if (!options.filesFrom.empty()) addListed(named, options.filesFrom);
+  const auto uses = std::count(named.begin(), named.end(), kStandardInput);
+  if (uses + (options.filesFrom == kStandardInput ? 1 : 0) > 1) {
+    throw UsageError("standard input can be read only once");
   }
-  std::size_t filled = 0;
-  while (filled <= limits::messageBytes) {
-    if (filled == buffer_.size()) {
-      buffer_.resize(std::min(std::max(kFirstRead, 2 * filled), limits::messageBytes + 1));
+  if (!options.recursive) return named;
+  std::vector<std::string> files;
+  for (const std::string& file : named) {
+    std::error_code ignored;
+    if (file != kStandardInput && fs::is_directory(file, ignored)) {
+      addFolder(files, file);
+    } else {
+      files.push_back(file);
     }
-    const ssize_t got = ::read(descriptor, buffer_.data() + filled, buffer_.size() - filled);
-    if (got == 0) return filled;
-    if (got < 0 && errno != EINTR) throwErrno();
-    if (got > 0) filled += static_cast<std::size_t>(got);
   }
-  throwTooLong("message of more than " + most + " bytes");
+  return files;
 }
 
 }  // namespace ironmoat::inspect

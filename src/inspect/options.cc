@@ -1,140 +1,130 @@
 #include "inspect/options.h"
 
+#include <getopt.h>
+
 #include <algorithm>
-#include <array>
-#include <optional>
 
 #include "inspect/record_types.h"
-#include "inspect/text_view.h"
+#include "inspect/terminal_text.h"
 
 namespace ironmoat::inspect {
 
 namespace {
 
-void setAction(Options& options, Action action) {
-  if (options.action != Action::unpack && options.action != action) {
-    throw UsageError("options '--schema' and '--self-test' exclude one another");
+template <class T>
+void setOnce(T& setting, T value, const char* options) {
+  if (setting != T{} && setting != value) {
+    throw UsageError(std::string("options ") + options + " cannot be used together");
   }
-  options.action = action;
+  setting = value;
+}
+
+void setAction(Options& options, Action action) {
+  setOnce(options.action, action, "'--schema' and '--self-test'");
 }
 
 void setOutput(Options& options, Output output) {
-  if (options.output != Output::each && options.output != output) {
-    throw UsageError("options '--quiet' and '--summary' exclude one another");
-  }
-  options.output = output;
+  setOnce(options.output, output, "'--quiet' and '--summary'");
 }
 
-[[noreturn]] void refuseType(std::string_view name, std::string_view others) {
-  std::string known;
-  for (const RecordType& type : recordTypes()) {
-    if (!known.empty()) known += ", ";
-    known += type.name;
-  }
-  throw UsageError("unknown type " + inQuotes(name) + ": one of " + known.append(others));
+std::string typeNamed(std::string_view name, std::string_view others) {
+  if (recordType(name) != nullptr || (!others.empty() && name == kAutoType))
+    return {name.begin(), name.end()};
+  std::string message = "not a valid type: " + inQuotes(name) + "; expected";
+  for (const RecordType& type : recordTypes()) message.append(" ").append(type.name);
+  throw UsageError(message.append(others));
 }
 
-void setType(Options& options, std::string_view name) {
-  if (name != kAutoType && recordType(name) == nullptr) refuseType(name, ", auto");
-  options.type = name;
-  options.typeGiven = true;
+Format formatNamed(std::string_view name) {
+  if (name == "text") return Format::text;
+  if (name == "json") return Format::json;
+  throw UsageError("not a valid format: " + inQuotes(name) + "; expected text json");
 }
 
-void setSchema(Options& options, std::string_view name) {
-  setAction(options, Action::showSchema);
-  if (recordType(name) == nullptr) refuseType(name, "");
-  options.schema = name;
-}
+using Value = std::string_view;
 
-void setFormat(Options& options, std::string_view name) {
-  if (name != "text" && name != "json") {
-    throw UsageError("unknown format " + inQuotes(name) + ": text or json");
-  }
-  options.format = name == "text" ? Format::text : Format::json;
-}
-
-void setService(Options& options, std::string_view program) {
-  if (program.empty()) throw UsageError("option '--service' needs a program");
-  options.service = program;
-}
-
-struct Flag {
-  std::string_view name;
-  void (*set)(Options&);
+struct KnownOption {
+  const char* name;
+  char letter;  // or 0
+  bool hasValue;
+  void (*set)(Options&, Value);
 };
-constexpr std::array kFlags = {
-    Flag{"--quiet", [](Options& options) { setOutput(options, Output::nothing); }},
-    Flag{"-q", [](Options& options) { setOutput(options, Output::nothing); }},
-    Flag{"--summary", [](Options& options) { setOutput(options, Output::summary); }},
-    Flag{"--self-test", [](Options& options) { setAction(options, Action::selfTest); }},
-    Flag{"--help", [](Options& options) { options.action = Action::showHelp; }},
-    Flag{"-h", [](Options& options) { options.action = Action::showHelp; }},
-    Flag{"--version", [](Options& options) { options.action = Action::showVersion; }},
+constexpr KnownOption kKnown[] = {
+    {"type", 0, true,
+     [](Options& o, Value v) { o.type = typeNamed(v, " auto"), o.typeGiven = true; }},
+    {"format", 0, true, [](Options& o, Value v) { o.format = formatNamed(v); }},
+    {"exact-integers", 0, false, [](Options& o, Value) { o.integers = Integers::strings; }},
+    {"recursive", 'r', false, [](Options& o, Value) { o.recursive = true; }},
+    {"files-from", 0, true, [](Options& o, Value v) { o.filesFrom = v; }},
+    {"summary", 0, false, [](Options& o, Value) { setOutput(o, Output::summary); }},
+    {"quiet", 'q', false, [](Options& o, Value) { setOutput(o, Output::nothing); }},
+    {"service", 0, true, [](Options& o, Value v) { o.service = v; }},
+    {"schema", 0, true,
+     [](Options& o, Value v) { setAction(o, Action::showSchema), o.schema = typeNamed(v, ""); }},
+    {"self-test", 0, false, [](Options& o, Value) { setAction(o, Action::selfTest); }},
+    {"help", 'h', false, [](Options& o, Value) { o.action = Action::showHelp; }},
+    {"version", 0, false, [](Options& o, Value) { o.action = Action::showVersion; }},
 };
-
-struct Setting {
-  std::string_view name;
-  void (*set)(Options&, std::string_view value);
-};
-constexpr std::array kSettings = {
-    Setting{"--type", setType},
-    Setting{"--format", setFormat},
-    Setting{"--service", setService},
-    Setting{"--schema", setSchema},
-};
-
-/// What stands after `name` and '=' in `argument`, if that is `name=value`.
-std::optional<std::string_view> valueIn(std::string_view argument, std::string_view name) {
-  if (!argument.starts_with(name) || argument.substr(name.size(), 1) != "=") return std::nullopt;
-  return argument.substr(name.size() + 1);
-}
-
-/// Sets what `argument` asks for, with the first of `rest` for its value where it has none in
-/// itself; returns how many of those it took.
-std::size_t takeOption(Options& options, std::string_view argument,
-                       std::span<const char* const> rest) {
-  for (const Flag& flag : kFlags) {
-    if (argument == flag.name) return flag.set(options), 0;
-  }
-  for (const Setting& setting : kSettings) {
-    if (const auto value = valueIn(argument, setting.name)) return setting.set(options, *value), 0;
-    if (argument != setting.name) continue;
-    if (rest.empty()) throw UsageError("option " + inQuotes(argument) + " needs a value");
-    return setting.set(options, rest.front()), 1;
-  }
-  throw UsageError("unknown option " + inQuotes(argument));
-}
+constexpr int kFirstCode = 256;  // getopt's of the first row; above all letters
 
 void checkFiles(Options& options) {
-  if (options.action != Action::unpack) {
-    const char* name = options.action == Action::selfTest ? "--self-test" : "--schema";
-    if (!options.files.empty()) throw UsageError("option " + inQuotes(name) + " goes without files");
-    return;
+  const bool none = options.files.empty() && options.filesFrom.empty();
+  if (options.action == Action::unpack) {
+    if (none) options.files.emplace_back(kStandardInput);
+  } else if (!none) {
+    const char* const name = options.action == Action::selfTest ? "self-test" : "schema";
+    throw UsageError(std::string("unexpected file beside option '--") + name + '\'');
   }
-  if (options.files.empty()) options.files.emplace_back(kStandardInput);
-  if (std::count(options.files.begin(), options.files.end(), kStandardInput) > 1) {
-    throw UsageError("standard input can be read only once");
+}
+
+/// Sets what getopt has found; `code` is its result, `last` the argument that it took last.
+void take(Options& options, int code, const char* last) {
+  const Value value = ::optarg == nullptr ? "" : ::optarg;
+  const int subject = code == '?' || code == ':' ? ::optopt : code;
+  const auto* const known =
+      std::find_if(std::begin(kKnown), std::end(kKnown), [&](const auto& row) {
+        return subject == row.letter || subject == kFirstCode + (&row - kKnown);
+      });
+  if (code == 1) {
+    options.files.emplace_back(value);
+  } else if (known == std::end(kKnown) || subject == 0) {
+    throw UsageError("not a valid option: " +
+                     inQuotes(subject == 0 ? last : std::string{'-', static_cast<char>(subject)}));
+  } else if (code == '?') {
+    throw UsageError("unexpected value in " + inQuotes(last));
+  } else if (known->hasValue && value.empty()) {
+    throw UsageError("missing value of option '--" + std::string(known->name) + '\'');
+  } else {
+    known->set(options, value);
   }
 }
 
 }  // namespace
 
 Options parseOptions(std::span<const char* const> arguments) {
-  Options options;
-  bool onlyFiles = false;
-  for (std::size_t i = 0; i < arguments.size(); ++i) {
-    const std::string_view argument = arguments[i];
-    if (onlyFiles || argument == kStandardInput || !argument.starts_with('-')) {
-      options.files.emplace_back(argument);
-    } else if (argument == "--") {
-      onlyFiles = true;
-    } else {
-      i += takeOption(options, argument, arguments.subspan(i + 1));
-      if (options.action == Action::showHelp || options.action == Action::showVersion) {
-        return options;
-      }
-    }
+  std::vector<option> known;
+  std::string letters = "-:";  // files in their order, a code of its own for missing values
+  for (const KnownOption& row : kKnown) {
+    const int code = kFirstCode + static_cast<int>(known.size());
+    known.push_back({row.name, row.hasValue ? required_argument : no_argument, nullptr, code});
+    if (row.letter != 0) letters += row.letter;
   }
+  known.push_back({});
+  std::vector<char*> argv = {const_cast<char*>("")};  // getopt_long() writes to none of them
+  for (const char* argument : arguments) argv.push_back(const_cast<char*>(argument));
+  argv.push_back(nullptr);
+  const int count = static_cast<int>(argv.size()) - 1;
+  const auto getopt = [&] {
+    return ::getopt_long(count, argv.data(), letters.c_str(), known.data(), nullptr);  // NOLINT
+  };
+  Options options;
+  ::opterr = 0;
+  ::optind = 0;  // how glibc starts anew
+  for (int code = getopt(); code >= 0; code = getopt()) {
+    take(options, code, argv[static_cast<std::size_t>(::optind) - 1]);
+    if (options.action == Action::showHelp || options.action == Action::showVersion) return options;
+  }
+  options.files.insert(options.files.end(), argv.begin() + ::optind, argv.end() - 1);
   checkFiles(options);
   return options;
 }

@@ -2,70 +2,68 @@
 
 #include <algorithm>
 
+#include "inspect/present_fields.h"
+
 namespace ironmoat::inspect {
 
 namespace {
 
-Failure failureOf(const ServiceError& error) {
-  const bool noService = error.kind() == ServiceError::Kind::unavailable;
-  return {nameOf(error.kind()), "", error.what(), {}, noService ? cannotWork : someRefused};
-}
-
-struct Accepted {
-  const RecordType* type;
-  std::unique_ptr<UnpackedRecord> record;
-  std::size_t values;
-};
-
-Outcome refused(std::vector<Outcome::Refusal> refusals) {
-  Outcome outcome;
-  const Failure& first = refusals.front().why;
-  if (std::all_of(refusals.begin(), refusals.end(),
-                  [&](const Outcome::Refusal& refusal) { return refusal.why == first; })) {
-    outcome.failure = first;
+/// Numbers, texts and so on in a record and in those in it: how much of the message it got.
+template <class T>
+std::size_t valuesIn(const T& value) {
+  std::size_t values = 0;
+  if constexpr (kIsList<T>) {
+    for (const auto& element : value) values += valuesIn(element);
+  } else if constexpr (Record<T>) {
+    forEachPresentField(value,
+                        [&](std::string_view, const auto& field) { values += valuesIn(field); });
   } else {
-    outcome.failure = {"noTypeFits", "", "every type refuses the message", {}, someRefused};
-    outcome.refusals = std::move(refusals);
+    values = 1;
   }
-  return outcome;
+  return values;
 }
 
 }  // namespace
 
 Failure failureOf(const DecodingError& error) {
-  return {nameOf(error.kind()), error.path(), error.what(), error.offset(), someRefused};
+  return {nameOf(error.kind()), error.path(), error.what(), error.offset(), someRejected};
 }
 
 Failure failureOf(const std::system_error& error) {
   return {"unreadable", "", error.code().message(), {}, cannotWork};
 }
 
-Outcome outcomeOf(std::span<const Attempt> attempts) {
+Outcome outcomeOf(std::vector<Attempt>& attempts) {
   Outcome outcome;
-  std::vector<Accepted> accepted;
-  std::vector<Outcome::Refusal> refusals;
-  for (const Attempt& attempt : attempts) {
+  std::size_t most = 0;
+  for (Attempt& attempt : attempts) {
     try {
-      auto record = attempt.record();
-      const std::size_t values = attempts.size() == 1 ? 0 : record->values();
-      accepted.push_back({attempt.type, std::move(record), values});
+      auto record =
+          std::visit([](auto& pending) -> AnyRecord { return pending.get(); }, attempt.record);
+      const std::size_t values = std::visit([](const auto& r) { return valuesIn(r); }, record);
+      if (!outcome.record || values > most) {
+        outcome.record = std::move(record);
+        outcome.types.clear();
+        most = values;
+      }
+      if (values == most) outcome.types.push_back(attempt.type);
     } catch (const DecodingError& error) {
-      refusals.push_back({attempt.type->name, failureOf(error)});
+      outcome.rejections.push_back({attempt.type, failureOf(error)});
     } catch (const ServiceError& error) {
-      outcome.failure = failureOf(error);
-      return outcome;
+      const bool noService = error.kind() == ServiceError::Kind::unavailable;
+      const ExitStatus status = noService ? cannotWork : someRejected;
+      Outcome failed;
+      failed.failure = {nameOf(error.kind()), "", error.what(), {}, status};
+      return failed;
     }
   }
-  if (accepted.empty()) return refused(std::move(refusals));
-  auto best = accepted.begin();
-  for (auto other = best + 1; other != accepted.end(); ++other) {
-    if (other->values > best->values) best = other;
-  }
-  outcome.type = best->type;
-  outcome.record = std::move(best->record);
-  for (const Accepted& other : accepted) {
-    if (&other != &*best && other.values == best->values)
-      outcome.asWell.push_back(other.type->name);
+  if (outcome.record) return outcome;
+  outcome.failure = outcome.rejections.front().why;
+  if (std::all_of(outcome.rejections.begin(), outcome.rejections.end(),
+                  [&](const auto& rejection) { return rejection.why == *outcome.failure; })) {
+    outcome.rejections.clear();
+  } else {
+    outcome.failure = {"noTypeFits", "", "every type rejects the message", {}, someRejected};
   }
   return outcome;
 }

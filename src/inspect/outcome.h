@@ -1,9 +1,7 @@
 #pragma once
 
 #include <cstdint>
-#include <memory>
 #include <optional>
-#include <span>
 #include <string>
 #include <string_view>
 #include <system_error>
@@ -17,16 +15,16 @@ namespace ironmoat::inspect {
 /// The tool's exit status; of several, the highest counts.
 enum ExitStatus : int {
   allUnpacked = 0,
-  someRefused = 1,  ///< or the service failed over one
-  cannotWork = 2,   ///< wrong usage, unreadable file, no service, output not writable
+  someRejected = 1,  ///< or the service failed on one
+  cannotWork = 2,    ///< wrong usage, unreadable file, no service, output not writable
 };
 
-/// Why there is no record. `path` and `message` come from the service, which the sender may have
-/// taken over.
+/// Why there is no record. `path` and `description` are untrusted: a service that a sender has
+/// taken over can make them up.
 struct Failure {
   std::string_view kind;
   std::string path;
-  std::string message;
+  std::string description;
   std::optional<std::uint64_t> offset;  ///< into the message, which may be shorter
   ExitStatus status;
 
@@ -36,29 +34,29 @@ struct Failure {
 Failure failureOf(const DecodingError& error);
 Failure failureOf(const std::system_error& error);
 
-struct Attempt {
-  const RecordType* type;
-  PendingRecord record;
-};
-
-/// What came of a message.
+/// What a message became: a record or a failure.
 struct Outcome {
-  const RecordType* type = nullptr;        ///< that accepted it
-  std::unique_ptr<UnpackedRecord> record;  ///< if one did
-  std::vector<std::string_view> asWell;    ///< types whose records got as much of it
-  std::optional<Failure> failure;          ///< if there is no record
-  struct Refusal {
+  struct Rejection {
     std::string_view type;
     Failure why;
   };
-  std::vector<Refusal> refusals;  ///< where types refused it for different reasons: all of them
+
+  std::optional<AnyRecord> record;
+  std::vector<std::string_view> types;  ///< of the record, then those that fit equally well
+  std::optional<Failure> failure;
+  std::vector<Rejection> rejections;  ///< if types rejected it for different reasons: all
 
   [[nodiscard]] ExitStatus status() const { return failure ? failure->status : allUnpacked; }
 };
 
-/// Waits for all `attempts`, of which there is one at least. Of several records the one with the
-/// most values is taken, of equals the first. That the service failed over an attempt is the
-/// outcome, whatever came of the others: nothing is known of it.
-Outcome outcomeOf(std::span<const Attempt> attempts);
+struct Attempt {
+  std::string_view type;
+  Types::Pending record;
+};
+
+/// Waits for all `attempts`, of which there is at least one. Of several records it takes the one
+/// with the most values, of equals the first. If the service failed on one attempt, so did the
+/// message, whatever became of the others.
+Outcome outcomeOf(std::vector<Attempt>& attempts);
 
 }  // namespace ironmoat::inspect

@@ -21,8 +21,8 @@ inline constexpr bool kIsList = false;
 template <class T>
 inline constexpr bool kIsList<List<T>> = true;
 
-/// Calls `visit(name, value)` for each field that is there, in the order of the initialiser's
-/// arguments. The first, whose label is `with`, goes by its own name like the others.
+/// Calls `visit(name, value)` for each field that is present, in the order of the initialiser's
+/// arguments. The first field, whose label is `with`, goes by its own name like the others.
 template <Record R, class Visit>
 void forEachPresentField(const R& record, const Visit& visit) {
   R::Arguments::Fields::forEach([&](auto field) {

@@ -2,59 +2,73 @@
 
 #include <algorithm>
 #include <array>
+#include <concepts>
 
-#include "inspect/json.h"
-#include "inspect/schema.h"
-#include "ironmoat/command_response.h"
-#include "ironmoat/user_payload.h"
-#include "ironmoat/web_tunnel_response.h"
+#include "inspect/present_fields.h"
+#include "inspect/wire_tables.h"
 
 namespace ironmoat::inspect {
 
 namespace {
 
 template <class T>
-std::size_t valuesIn(const T& value) {
-  std::size_t values = 0;
-  if constexpr (kIsList<T>) {
-    for (const auto& element : value) values += valuesIn(element);
-  } else if constexpr (Record<T>) {
-    forEachPresentField(value,
-                        [&](std::string_view, const auto& field) { values += valuesIn(field); });
-  } else {
-    values = 1;
-  }
-  return values;
-}
-
-template <MessageSchema R>
-class RecordOf : public UnpackedRecord {
- public:
-  explicit RecordOf(Pending<R>& pending) : record_(pending.get()) {}
-
-  [[nodiscard]] std::size_t values() const override { return valuesIn(record_); }
-  void show(Format format, const Style& style, std::string& out) const override {
-    if (format == Format::json) {
-      appendJson(out, record_);
-    } else {
-      TextView(out, style).record(record_, 2);
-    }
-  }
-
- private:
-  R record_;
+struct Unwrapped {
+  using Type = T;
+  static constexpr bool list = false;
+};
+template <class T>
+struct Unwrapped<Optional<T>> : Unwrapped<T> {};
+template <class T>
+struct Unwrapped<List<T>> : Unwrapped<T> {
+  static constexpr bool list = true;
 };
 
-template <MessageSchema R>
-PendingRecord submitAs(Client& client, const Data& message) {
-  return [pending = std::make_shared<Pending<R>>(client.submit<R>(message))] {
-    return std::make_unique<RecordOf<R>>(*pending);
-  };
+template <class T>
+constexpr std::string_view typeName() {
+  if constexpr (std::same_as<T, Int>) return "Int";
+  if constexpr (std::same_as<T, Int64>) return "Int64";
+  if constexpr (std::same_as<T, Bool>) return "Bool";
+  if constexpr (std::same_as<T, String>) return "String";
+  if constexpr (std::same_as<T, Data>) return "Data";
+  if constexpr (Record<T>) return WireTable<T>::name;
+}
+
+/// Appends the record `R` and those in it, each once.
+template <Record R>
+void collectSchemas(std::vector<RecordSchema>& records) {
+  for (const RecordSchema& known : records) {
+    if (known.name == typeName<R>()) return;
+  }
+  static_assert(WireTable<R>::keys.size() == R::Arguments::Fields::count);
+  RecordSchema record{typeName<R>(), {}};
+  R::Arguments::Fields::forEach([&](auto field) {
+    using T = typename decltype(field)::Type;
+    record.fields.push_back({WireTable<R>::keys[record.fields.size()], decltype(field)::name,
+                             typeName<typename Unwrapped<T>::Type>(), Unwrapped<T>::list,
+                             !kIsOptional<T> && !kIsList<T>});
+  });
+  records.push_back(std::move(record));
+  R::Arguments::Fields::forEach([&](auto field) {
+    using T = typename Unwrapped<typename decltype(field)::Type>::Type;
+    if constexpr (Record<T>) collectSchemas<T>(records);
+  });
+}
+
+/// The schemas of the record `R` and of those in it.
+template <Record R>
+std::vector<RecordSchema> schemasOf() {
+  std::vector<RecordSchema> records;
+  collectSchemas<R>(records);
+  return records;
 }
 
 template <MessageSchema R>
 constexpr RecordType row(std::string_view name) {
-  return {name, submitAs<R>, showSchemaOf<R>};
+  return {name,
+          [](Client& client, const Data& message) -> Types::Pending {
+            return client.submit<R>(message);
+          },
+          schemasOf<R>};
 }
 
 constexpr std::array kRecordTypes = {

@@ -1,46 +1,38 @@
 #pragma once
 
-#include <cstddef>
-#include <functional>
-#include <memory>
 #include <span>
-#include <string>
 #include <string_view>
+#include <variant>
+#include <vector>
 
-#include "inspect/options.h"
-#include "inspect/text_view.h"
+#include "inspect/schema.h"
 #include "ironmoat/client.h"
+#include "ironmoat/command_response.h"
+#include "ironmoat/user_payload.h"
+#include "ironmoat/web_tunnel_response.h"
 
 namespace ironmoat::inspect {
 
-/// A record of any type.
-class UnpackedRecord {
- public:
-  UnpackedRecord() = default;
-  UnpackedRecord(const UnpackedRecord&) = delete;
-  UnpackedRecord& operator=(const UnpackedRecord&) = delete;
-  virtual ~UnpackedRecord() = default;
-
-  /// Numbers, texts and so on in it and in the records in it: how much of the message it got.
-  [[nodiscard]] virtual std::size_t values() const = 0;
-  /// Appends one JSON value, or lines of text.
-  virtual void show(Format format, const Style& style, std::string& out) const = 0;
+template <class... R>
+struct TypesOf {
+  using Record = std::variant<R...>;
+  using Pending = std::variant<ironmoat::Pending<R>...>;
 };
-
-/// Waits for a submitted message's record. Throws what Client::unpack throws. Once only.
-using PendingRecord = std::function<std::unique_ptr<UnpackedRecord>()>;
+using Types = TypesOf<VeskCommandResponse, VeskCommandWebTunnelResponse, DrelUserPayload>;
+/// A record of any type that messages can have.
+using AnyRecord = Types::Record;
 
 struct RecordType {
   std::string_view name;  ///< as after `--type`
-  PendingRecord (*submit)(Client& client, const Data& message);
-  void (*showSchema)(Format format, const Colours& colours, std::string& out);
+  Types::Pending (*submit)(Client& client, const Data& message);
+  std::vector<RecordSchema> (*schemas)();  ///< of the record, then of those in it
 };
 
-/// All types of record that can be asked for; a message that fits several alike is taken for the
-/// first.
+/// All types that messages can have. Of types that fit a message equally well, `--type auto`
+/// chooses the first.
 std::span<const RecordType> recordTypes() noexcept;
 
-/// Null when there is none of that name.
+/// Null if no type has that name.
 const RecordType* recordType(std::string_view name) noexcept;
 
 }  // namespace ironmoat::inspect

@@ -10,7 +10,8 @@
 
 namespace ironmoat::inspect {
 
-/// Prints what came of messages. Throws std::system_error when standard output cannot be written.
+/// Prints the outcomes of messages. Throws std::system_error when standard output cannot be
+/// written.
 class Report {
  public:
   Report() = default;
@@ -23,9 +24,7 @@ class Report {
   virtual void finish() {}
 };
 
-/// As `options` ask for it. `options` and `terminal` must outlive the report.
-std::unique_ptr<Report> makeReport(const Options& options, Terminal& terminal);
-
+/// `options` and `terminal` must outlive the report.
 std::unique_ptr<Report> makeTextReport(const Options& options, Terminal& terminal);
 std::unique_ptr<Report> makeJsonReport(const Options& options, Terminal& terminal);
 std::unique_ptr<Report> makeSummary(const Options& options, Terminal& terminal);

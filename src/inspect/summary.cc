@@ -1,99 +1,81 @@
 #include <algorithm>
-#include <array>
+#include <chrono>
+#include <map>
 
-#include "inspect/json.h"
 #include "inspect/report.h"
 
 namespace ironmoat::inspect {
 
 namespace {
 
-/// Numbers of messages, by what came of them.
+/// Numbers of messages by their outcomes, and how fast they came.
 class Summary : public Report {
  public:
   Summary(const Options& options, Terminal& terminal) : options_(options), terminal_(terminal) {}
 
-  void add(const std::string&, const Data&, const Outcome& outcome) override {
+  void add(const std::string&, const Data& message, const Outcome& outcome) override {
     ++messages_;
+    bytes_ += message.size();
     if (outcome.failure) {
-      count(errors_, outcome.failure->kind);
+      ++errors_[outcome.failure->kind];
     } else {
       ++accepted_;
-      count(types_, outcome.type->name);
+      ++types_[outcome.types.front()];
     }
   }
 
-  void finish() override { terminal_.print(options_.format == Format::json ? json() : text()); }
+  void finish() override {
+    const std::chrono::duration<double> time = std::chrono::steady_clock::now() - start_;
+    terminal_.print(options_.format == Format::json ? json(time.count()) : text(time.count()));
+  }
 
  private:
-  struct Count {
-    std::string_view name;
-    std::size_t number;
-  };
-  using Counts = std::vector<Count>;
+  using Counts = std::map<std::string_view, std::size_t>;
 
-  static void count(Counts& counts, std::string_view name) {
-    const auto found = std::find_if(counts.begin(), counts.end(),
-                                    [&](const Count& known) { return known.name == name; });
-    if (found == counts.end()) {
-      counts.push_back({name, 1});
-    } else {
-      ++found->number;
-    }
-  }
-
-  /// The most frequent first.
-  static Counts sorted(Counts counts) {
-    std::sort(counts.begin(), counts.end(), [](const Count& a, const Count& b) {
-      return a.number != b.number ? a.number > b.number : a.name < b.name;
-    });
-    return counts;
-  }
-
-  [[nodiscard]] bool showsTypes() const { return options_.type == kAutoType; }
-
-  [[nodiscard]] std::string text() const {
-    const std::size_t digits = std::to_string(messages_).size();
-    std::string out;
-    const auto line = [&](std::size_t number, std::string_view colour, std::string_view name) {
-      const std::string text = std::to_string(number);
-      out.append(digits - text.size(), ' ').append(text).append("  ");
-      out.append(colour).append(name).append(terminal_.outputColours().end).append("\n");
+  [[nodiscard]] std::string text(double seconds) const {
+    const Colours colours = terminal_.outputStyle().colours;
+    const auto number = static_cast<double>(messages_);
+    const int digits = static_cast<int>(std::to_string(messages_).size());
+    std::string out = std::to_string(messages_).append("  ").append(colours.title);
+    out.append(messages_ == 1 ? "message" : "messages").append(colours.end);
+    out += formatted(" in %.3f s (%.0f/s, %.2f MB/s)\n", seconds, number / seconds,
+                     static_cast<double>(bytes_) / seconds / 1e6);
+    const auto line = [&](std::size_t count, std::string_view colour, std::string_view name) {
+      out.append(formatted("%*zu  ", digits, count)).append(colour).append(name);
+      out.append(colours.end)
+          .append(
+              formatted(" (%.1f %%)\n", 100 * static_cast<double>(count) / std::max(number, 1.)));
     };
-    const Colours& colours = terminal_.outputColours();
-    line(messages_, colours.title, messages_ == 1 ? "message" : "messages");
     line(accepted_, colours.label, "accepted");
-    if (showsTypes()) {
-      for (const Count& type : sorted(types_)) {
-        line(type.number, colours.label, "  as " + std::string(type.name));
-      }
+    if (options_.type == kAutoType) {
+      for (const auto& [type, count] : types_)
+        line(count, colours.label, "  as " + std::string(type));
     }
-    for (const Count& error : sorted(errors_)) line(error.number, colours.error, error.name);
+    for (const auto& [kind, count] : errors_) line(count, colours.error, kind);
     return out;
   }
 
-  static void appendCounts(std::string& out, std::string_view name, const Counts& counts) {
-    out.append(", \"").append(name).append("\": {");
-    for (const Count& count : counts) {
-      if (&count != &counts.front()) out += ", ";
-      appendJsonText(out, count.name);
-      out.append(": ").append(std::to_string(count.number));
-    }
-    out += '}';
-  }
-
-  [[nodiscard]] std::string json() const {
-    std::string out = "{\"messages\": " + std::to_string(messages_);
-    out.append(", \"accepted\": ").append(std::to_string(accepted_));
-    if (showsTypes()) appendCounts(out, "types", sorted(types_));
-    appendCounts(out, "errors", sorted(errors_));
-    return out += "}\n";
+  [[nodiscard]] std::string json(double seconds) const {
+    std::string out;
+    JsonWriter json(out);
+    const auto addCounts = [&](std::string_view name, const Counts& counts) {
+      json.name(name).open('{');
+      for (const auto& [each, number] : counts) json.member(each, number);
+      json.close('}');
+    };
+    json.open('{').member("messages", messages_).member("accepted", accepted_);
+    if (options_.type == kAutoType) addCounts("types", types_);
+    addCounts("errors", errors_);
+    json.member("bytes", bytes_).name("seconds");
+    return out.append(std::to_string(seconds)).append("}\n");
   }
 
   const Options& options_;
   Terminal& terminal_;
+  const std::chrono::steady_clock::time_point start_ = std::chrono::steady_clock::now();
   std::size_t messages_ = 0;
   std::size_t accepted_ = 0;
+  std::size_t bytes_ = 0;
   Counts types_;
   Counts errors_;
 };

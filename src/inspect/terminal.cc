@@ -4,41 +4,32 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdio>
 #include <cstdlib>
 #include <system_error>
-#include <utility>
 
 namespace ironmoat::inspect {
 
 namespace {
 
-constexpr std::size_t kBuffered = std::size_t{64} << 10;
-constexpr std::chrono::milliseconds kQuietStart{300};
-constexpr std::chrono::milliseconds kBetweenUpdates{100};
+constexpr std::chrono::milliseconds kProgressDelay{300};
+constexpr std::chrono::milliseconds kProgressInterval{100};
 
-std::string_view environment(const char* name) {
+std::string_view environment(const char* name) noexcept {
   const char* value = std::getenv(name);  // NOLINT(concurrency-mt-unsafe): nobody sets any
   return value == nullptr ? "" : value;
 }
 
-Colours coloursFor(bool isTerminal) {
-  const bool wanted =
-      isTerminal && environment("NO_COLOR").empty() && environment("TERM") != "dumb";
-  return wanted ? Colours::quiet() : Colours::none();
-}
-
-std::size_t widthOf(int descriptor) noexcept {
+Style styleOf(int descriptor, bool isTerminal) noexcept {
+  if (!isTerminal) return {};
   winsize size = {};
-  return ::ioctl(descriptor, TIOCGWINSZ, &size) == 0 ? size.ws_col : 0;
+  const bool known = ::ioctl(descriptor, TIOCGWINSZ, &size) == 0;
+  const bool colours = environment("NO_COLOR").empty() && environment("TERM") != "dumb";
+  return {colours ? Colours::muted() : Colours::none(), known ? size.ws_col : std::size_t{0}};
 }
 
-bool writeAll(int descriptor, std::string_view text) noexcept {
-  while (!text.empty()) {
-    const ssize_t written = ::write(descriptor, text.data(), text.size());
-    if (written < 0 && errno != EINTR) return false;
-    if (written > 0) text.remove_prefix(static_cast<std::size_t>(written));
-  }
-  return true;
+[[noreturn]] void throwOutputError(int error) {
+  throw std::system_error(error, std::generic_category(), "cannot write to standard output");
 }
 
 }  // namespace
@@ -46,51 +37,39 @@ bool writeAll(int descriptor, std::string_view text) noexcept {
 Terminal::Terminal()
     : outputIsTerminal_(::isatty(STDOUT_FILENO) == 1),
       errorIsTerminal_(::isatty(STDERR_FILENO) == 1),
-      outputColours_(coloursFor(outputIsTerminal_)),
-      errorColours_(coloursFor(errorIsTerminal_)),
-      nextProgress_(Clock::now() + kQuietStart) {}
+      nextProgress_(Clock::now() + kProgressDelay) {}
 
-std::size_t Terminal::outputWidth() const noexcept { return widthOf(STDOUT_FILENO); }
-std::size_t Terminal::errorWidth() const noexcept { return widthOf(STDERR_FILENO); }
+Style Terminal::outputStyle() const noexcept { return styleOf(STDOUT_FILENO, outputIsTerminal_); }
+Style Terminal::errorStyle() const noexcept { return styleOf(STDERR_FILENO, errorIsTerminal_); }
 
 void Terminal::print(std::string_view text) {
-  buffer_ += text;
-  if (outputIsTerminal_ || buffer_.size() >= kBuffered) flush();
+  if (outputIsTerminal_) eraseProgress();
+  if (std::fwrite(text.data(), 1, text.size(), stdout) != text.size()) throwOutputError(errno);
 }
 
-void Terminal::complain(std::string_view text) {
-  flush();
-  writeAll(STDERR_FILENO, text);  // where could its failure be told?
-}
-
-void Terminal::lastWords(std::string_view text) noexcept {
+void Terminal::printError(std::string_view text) noexcept {
   eraseProgress();
-  writeAll(STDOUT_FILENO, std::exchange(buffer_, {}));
-  writeAll(STDERR_FILENO, text);
+  if (std::fflush(stdout) != 0) outputError_ = errno;
+  static_cast<void>(std::fwrite(text.data(), 1, text.size(), stderr));
 }
 
 void Terminal::showProgress(std::size_t done, std::size_t total) {
   if (!errorIsTerminal_ || Clock::now() < nextProgress_) return;
-  nextProgress_ = Clock::now() + kBetweenUpdates;
-  std::string line = "\r";
-  line += errorColours_.aside;
-  line += std::to_string(done) + " of " + std::to_string(total) + " messages";
-  line += errorColours_.end;
-  writeAll(STDERR_FILENO, line);
+  nextProgress_ = Clock::now() + kProgressInterval;
+  const Colours colours = errorStyle().colours;
+  printError(std::string("\r").append(colours.aside) + std::to_string(done) + " of " +
+             std::to_string(total) + " messages" + std::string(colours.end));
   progressShown_ = true;
 }
 
-void Terminal::flush() {
+void Terminal::finish() {
   eraseProgress();
-  const std::string text = std::exchange(buffer_, {});
-  if (!writeAll(STDOUT_FILENO, text)) {
-    throw std::system_error(errno, std::generic_category(), "cannot write to standard output");
-  }
+  if (std::fflush(stdout) != 0) outputError_ = errno;
+  if (outputError_ != 0) throwOutputError(outputError_);
 }
 
 void Terminal::eraseProgress() noexcept {
-  if (!progressShown_) return;
-  writeAll(STDERR_FILENO, "\r\033[K");
+  if (progressShown_) static_cast<void>(std::fputs("\r\033[K", stderr));
   progressShown_ = false;
 }
 

@@ -2,38 +2,31 @@
 
 #include <chrono>
 #include <cstddef>
-#include <string>
 #include <string_view>
 
-#include "inspect/text_view.h"
+#include "inspect/terminal_text.h"
 
 namespace ironmoat::inspect {
 
-/// Standard output and standard error of the tool, in step: what is printed first shows first on a
-/// terminal. Functions that are not noexcept throw std::system_error when standard output cannot be
-/// written.
+/// Standard output and standard error of the tool, in step: what comes first shows first on a
+/// terminal.
 class Terminal {
  public:
   Terminal();
 
-  /// Colours for what goes to standard output, and to standard error.
-  [[nodiscard]] const Colours& outputColours() const noexcept { return outputColours_; }
-  [[nodiscard]] const Colours& errorColours() const noexcept { return errorColours_; }
+  /// For what goes to standard output, or to standard error: colours and width if it is a terminal.
+  [[nodiscard]] Style outputStyle() const noexcept;
+  [[nodiscard]] Style errorStyle() const noexcept;
 
-  /// Columns; 0 where it is no terminal, or one that does not tell.
-  [[nodiscard]] std::size_t outputWidth() const noexcept;
-  [[nodiscard]] std::size_t errorWidth() const noexcept;
-
-  /// Appends to standard output; buffered unless that is a terminal.
+  /// Writes to standard output, which is buffered unless it is a terminal. Throws std::system_error
+  /// if it cannot be written.
   void print(std::string_view text);
   /// Writes to standard error at once.
-  void complain(std::string_view text);
-  /// The same when there is nothing left to do about standard output.
-  void lastWords(std::string_view text) noexcept;
-  /// Shows how far the work is, if standard error is a terminal and the work takes a while.
+  void printError(std::string_view text) noexcept;
+  /// Shows how many messages are done if standard error is a terminal and the work takes a while.
   void showProgress(std::size_t done, std::size_t total);
-  /// Takes away the progress line and writes out what is buffered.
-  void flush();
+  /// Erases the progress line and writes what is buffered. Throws like print().
+  void finish();
 
  private:
   using Clock = std::chrono::steady_clock;
@@ -42,9 +35,7 @@ class Terminal {
 
   const bool outputIsTerminal_;
   const bool errorIsTerminal_;
-  const Colours outputColours_;
-  const Colours errorColours_;
-  std::string buffer_;
+  int outputError_ = 0;  // of standard output, if printError() met one
   bool progressShown_ = false;
   Clock::time_point nextProgress_;
 };

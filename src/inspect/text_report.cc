@@ -1,7 +1,8 @@
 #include <algorithm>
 
-#include "inspect/place.h"
+#include "inspect/position.h"
 #include "inspect/report.h"
+#include "inspect/text_view.h"
 
 namespace ironmoat::inspect {
 
@@ -9,94 +10,78 @@ namespace {
 
 class TextReport : public Report {
  public:
-  TextReport(const Options& options, Terminal& terminal)
-      : automatic_(options.type == kAutoType), terminal_(terminal) {}
+  TextReport(const Options& options, Terminal& terminal) : options_(options), terminal_(terminal) {}
 
   void add(const std::string& file, const Data& message, const Outcome& outcome) override {
     text_.clear();
     if (outcome.failure) {
       addFailure(file, message, outcome);
-      terminal_.complain(text_);
+      terminal_.printError(text_);
     } else {
       addRecord(file, outcome);
       terminal_.print(text_);
+    }
+    rejected_ |= outcome.status() == someRejected;
+  }
+
+  void finish() override {
+    if (rejected_ && !options_.typeGiven) {
+      terminal_.printError("(decoded as " + options_.type + "; --type auto tries all types)\n");
     }
   }
 
  private:
   void addRecord(const std::string& file, const Outcome& outcome) {
-    const Colours& colours = terminal_.outputColours();
+    const Style style = terminal_.outputStyle();
     if (printedRecord_) text_ += '\n';
     printedRecord_ = true;
-    text_ += colours.title;
-    appendHarmless(text_, file);
-    text_ += colours.end;
-    if (automatic_) addType(outcome);
-    text_ += '\n';
-    outcome.record->show(Format::text, {colours, terminal_.outputWidth()}, text_);
-  }
-
-  void addType(const Outcome& outcome) {
-    const Colours& colours = terminal_.outputColours();
-    text_.append(colours.aside).append(" (").append(outcome.type->name);
-    for (const std::string_view& type : outcome.asWell) {
-      text_ += &type == &outcome.asWell.front() ? "; as well: " : ", ";
-      text_ += type;
+    text_ += style.colours.title;
+    appendEscaped(text_, file);
+    text_ += style.colours.end;
+    if (options_.type == kAutoType) {
+      text_.append(style.colours.aside).append(" (");
+      for (std::size_t i = 0; i < outcome.types.size(); ++i) {
+        text_.append(i == 0 ? "" : i == 1 ? "; also fits: " : ", ").append(outcome.types[i]);
+      }
+      text_.append(")").append(style.colours.end);
     }
-    text_.append(")").append(colours.end);
+    text_ += '\n';
+    std::visit([&](const auto& record) { TextView(text_, style).record(record, 2); },
+               *outcome.record);
   }
 
   void addFailure(const std::string& file, const Data& message, const Outcome& outcome) {
     text_ += "vesk-unpack: ";
-    appendHarmless(text_, file);
+    appendEscaped(text_, file);
     text_ += ": ";
     addReason(*outcome.failure, message, 2);
-    for (const Outcome::Refusal& refusal : outcome.refusals) {
-      text_.append("  ").append(refusal.type).append(": ");
-      addReason(refusal.why, message, 4);
+    for (const Outcome::Rejection& rejection : outcome.rejections) {
+      text_.append("  ").append(rejection.type).append(": ");
+      addReason(rejection.why, message, 4);
     }
   }
 
   void addReason(const Failure& failure, const Data& message, std::size_t indent) {
-    const Colours& colours = terminal_.errorColours();
-    const std::size_t start = text_.rfind('\n') + 1;  // of the line
-    text_.append(colours.error).append(failure.kind).append(colours.end);
+    const Style style = terminal_.errorStyle();
+    const std::size_t lineStart = text_.rfind('\n') + 1;
+    text_.append(style.colours.error).append(failure.kind).append(style.colours.end);
     if (!failure.path.empty()) {
       text_ += " at ";
-      appendHarmless(text_, failure.path);
+      appendEscaped(text_, failure.path);
     }
-    text_ += ':';
-    const std::size_t unseen = colours.error.size() + colours.end.size();
-    addWords(failure.message, text_.size() - start - unseen, indent + 2);
-    if (failure.offset) {
-      appendPlace(text_, message, *failure.offset, {colours, terminal_.errorWidth()}, indent);
-    }
-  }
-
-  /// A sentence behind `column` columns, on more lines where the screen is too narrow.
-  void addWords(std::string_view sentence, std::size_t column, std::size_t indent) {
-    std::string words;
-    appendHarmless(words, sentence);
-    const std::size_t width = terminal_.errorWidth();
-    for (std::size_t at = 0; at < words.size();) {
-      const std::size_t end = std::min(words.find(' ', at), words.size());
-      column += 1 + end - at;
-      if (width != 0 && column > width) {
-        text_ += '\n';
-        text_.append(indent, ' ');
-        column = indent + end - at;
-      } else {
-        text_ += ' ';
-      }
-      text_.append(words, at, end - at);
-      at = end + 1;
-    }
+    std::string words = ":\n";
+    appendEscaped(words, failure.description);
+    std::replace(words.begin(), words.end(), ' ', '\n');
+    const std::size_t column = columnsOf(std::string_view(text_).substr(lineStart));
+    appendWrapped(text_, words, column, indent + 2, style.width);
     text_ += '\n';
+    if (failure.offset) appendPosition(text_, message, *failure.offset, style, indent);
   }
 
-  const bool automatic_;
+  const Options& options_;
   Terminal& terminal_;
   bool printedRecord_ = false;
+  bool rejected_ = false;
   std::string text_;
 };
 

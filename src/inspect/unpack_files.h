@@ -6,8 +6,8 @@
 
 namespace ironmoat::inspect {
 
-/// Unpacks `options.files` and prints what comes of each, in their order, or of all together.
-/// Throws std::system_error when standard output cannot be written.
+/// Unpacks the files that `options` name and prints each outcome, in order, or a summary. Throws
+/// std::system_error when standard output cannot be written, and what filesOf() throws.
 ExitStatus unpackFiles(const Options& options, Terminal& terminal);
 
 }  // namespace ironmoat::inspect

@@ -9,8 +9,8 @@
 
 namespace ironmoat::inspect {
 
-/// An output record's name, and the keys that its fields have in messages, in label order. This
-/// room cannot see the tables of keys: the build prints them out and has them compiled in.
+/// The name of an output record, and its fields' keys in messages, in label order. This module must
+/// not depend on the one that has the tables of keys, so the build generates the specialisations.
 template <class R>
 struct WireTable;
 

@@ -1,4 +1,4 @@
-#include "inspect/confinement_report.h"
+#include "inspect/self_test.h"
 
 #include <fcntl.h>
 #include <poll.h>
@@ -29,25 +29,24 @@ namespace {
 
 using namespace std::chrono_literals;
 
-constexpr int kTimeToGreet = 2000;  // milliseconds
-constexpr unsigned kTimeToAct = 5;  // seconds
-constexpr int kNameWidth = 40;
-constexpr int kCannotConfine = 255;  // exit status of a child; no errno
+constexpr int kHelloTimeout = 2000;     // milliseconds
+constexpr unsigned kActionTimeout = 5;  // seconds
+constexpr int kNoSandbox = 255;         // exit status of a child; not an errno
 
-/// What a system call does: negative with errno set when it fails.
-using Act = long (*)();
+/// A system call: returns a negative number and sets errno if it fails.
+using Action = long (*)();
 
 constexpr std::string_view kKilled = "killed by SIGSYS";
 constexpr std::string_view kNoFile = "fails with ENOENT";
 constexpr std::string_view kNoMemory = "fails with ENOMEM";
 
-struct ForbiddenAct {
-  std::string_view what;
-  std::string_view fate;
-  Act attempt;
+struct ForbiddenAction {
+  std::string_view name;
+  std::string_view result;
+  Action perform;
 };
 
-constexpr ForbiddenAct kForbiddenActs[] = {
+constexpr ForbiddenAction kForbidden[] = {
     {"read a file", kNoFile, [] { return long{::open("/etc/passwd", O_RDONLY)}; }},
     {"create a file", kNoFile, [] { return long{::open("/tmp", O_TMPFILE | O_WRONLY, 0600)}; }},
     {"delete a file", kKilled, [] { return long{::unlink("/tmp/vesk-unpack.none")}; }},
@@ -90,23 +89,23 @@ constexpr ForbiddenAct kForbiddenActs[] = {
      }},
 };
 
-/// What comes of an act in a confined child.
-std::string attempt(Act act) {
+/// The result of an action in a sandboxed child.
+std::string resultOf(Action perform) {
   const pid_t child = ::fork();
-  if (child < 0) return "not tried: no child can be started";
+  if (child < 0) return "not tried: cannot start a child";
   if (child == 0) {
-    ::alarm(kTimeToAct);
-    ::dup2(::open("/dev/null", O_WRONLY), STDERR_FILENO);  // the fate says it all
+    ::alarm(kActionTimeout);
+    ::dup2(::open("/dev/null", O_WRONLY), STDERR_FILENO);  // the filter's own line
     try {
       confinement::confine();
     } catch (const confinement::CannotConfine&) {
-      ::_exit(kCannotConfine);
+      ::_exit(kNoSandbox);
     }
-    ::_exit(act() < 0 ? errno : 0);
+    ::_exit(perform() < 0 ? errno : 0);
   }
   int status = 0;
   while (::waitpid(child, &status, 0) < 0) {
-    if (errno != EINTR) return "not known: the child is lost";
+    if (errno != EINTR) return "unknown: the child's status is lost";
   }
   if (WIFSIGNALED(status)) {
     const char* const name = ::sigabbrev_np(WTERMSIG(status));
@@ -114,42 +113,26 @@ std::string attempt(Act act) {
   }
   const int error = WEXITSTATUS(status);
   if (error == 0) return "ALLOWED";
-  if (error == kCannotConfine) return "not tried: the child cannot be confined";
+  if (error == kNoSandbox) return "not tried: cannot sandbox the child";
   const char* const name = ::strerrorname_np(error);
   return std::string("fails with ") + (name == nullptr ? std::to_string(error) : name);
 }
 
-/// The service's first frame, or why there is none.
-frames::Hello greetingOf(client::ServiceProcess& process) {
+/// The service's first frame. Throws StartError if there is none, FrameError if it is not valid.
+frames::Hello helloOf(client::ServiceProcess& process) {
   frames::FrameAssembler assembler(frames::kMaxReplyBody, Sharing::anyThread);
   for (;;) {
     if (const auto body = assembler.next()) return frames::parseHello(*body);
     pollfd ready = {process.socket(), POLLIN, 0};
-    const int count = ::poll(&ready, 1, kTimeToGreet);
+    const int count = ::poll(&ready, 1, kHelloTimeout);
     if (count < 0 && errno == EINTR) continue;
-    if (count == 0) throw client::StartError("it does not greet", false);
+    if (count == 0) throw client::StartError("it sent no hello within 2 s", false);
     const auto room = assembler.room();
-    const ssize_t came = ::recv(process.socket(), room.data(), room.size(), 0);
-    if (came <= 0) throw client::StartError("it " + process.lastWord(100ms), false);
-    assembler.commit(static_cast<std::size_t>(came));
+    const ssize_t got = ::recv(process.socket(), room.data(), room.size(), 0);
+    if (got <= 0) throw client::StartError("it " + process.lastWord(100ms), false);
+    assembler.commit(static_cast<std::size_t>(got));
   }
 }
-
-class Report {
- public:
-  explicit Report(std::ostream& out) : out_(out) {}
-
-  void line(std::string_view what, std::string_view fate, bool asItHasToBe = true) {
-    out_ << "  " << std::left << std::setw(kNameWidth) << what << fate
-         << (asItHasToBe ? "\n" : "  <-- NOT SAFE\n") << std::flush;
-    if (!asItHasToBe) status_ = 1;
-  }
-  [[nodiscard]] int status() const noexcept { return status_; }
-
- private:
-  std::ostream& out_;
-  int status_ = 0;
-};
 
 }  // namespace
 
@@ -157,29 +140,34 @@ int selfTest(std::ostream& out, const std::string& serviceProgram) {
   std::uint32_t bits = 0;
   try {
     client::ServiceProcess process = client::ServiceProcess::start(serviceProgram);
-    bits = greetingOf(process).confinement;
+    bits = helloOf(process).confinement;
   } catch (const std::exception& error) {
-    out << "No service from " << serviceProgram << ": " << error.what() << '\n';
+    out << "cannot use " << serviceProgram << ": " << error.what() << '\n';
     return 2;
   }
 
-  Report report(out);
+  int status = 0;
+  const auto line = [&](std::string_view name, std::string_view result, bool safe) {
+    out << "  " << std::left << std::setw(40) << name << result
+        << (safe ? "\n" : "  <-- NOT SAFE\n") << std::flush;
+    if (!safe) status = 1;
+  };
   out << "In force in " << serviceProgram << ":\n";
   for (const frames::ConfinementName& known : frames::kConfinementNames) {
     const auto bit = static_cast<std::uint32_t>(known.part);
-    const bool required = (frames::kRequiredConfinement & bit) != 0;
-    report.line(known.name, (bits & bit) != 0 ? "yes" : "no", (bits & bit) != 0 || !required);
+    const bool inForce = (bits & bit) != 0;
+    line(known.name, inForce ? "yes" : "no", inForce || (frames::kRequiredConfinement & bit) == 0);
   }
   if (frames::kSanitizedBuild) {
-    out << "Nothing is tried: this is a sanitizer's build, which goes without the filter.\n";
-    return report.status();
+    out << "Nothing tried: a build with a sanitizer has no filter.\n";
+    return status;
   }
-  out << "Tried in a process confined by the same code:\n" << std::flush;
-  for (const ForbiddenAct& act : kForbiddenActs) {
-    const std::string fate = attempt(act.attempt);
-    report.line(act.what, fate, fate == act.fate);
+  out << "Tried in a process with the same sandbox:\n" << std::flush;
+  for (const ForbiddenAction& action : kForbidden) {
+    const std::string result = resultOf(action.perform);
+    line(action.name, result, result == action.result);
   }
-  return report.status();
+  return status;
 }
 
 }  // namespace ironmoat::inspect

@@ -1,0 +1,234 @@
+#include <gtest/gtest.h>
+
+#include <string>
+
+#include "inspect/json.h"
+#include "inspect/position.h"
+#include "inspect/terminal_text.h"
+#include "inspect/text_view.h"
+#include "ironmoat/fields.h"
+#include "ironmoat/values.h"
+
+namespace ironmoat::inspect {
+
+// A field of each type that records have.
+
+struct PartArguments {
+  Optional<String> name;
+  Optional<Int> number;
+
+  using Fields = FieldList<PartArguments, &PartArguments::name, &PartArguments::number>;
+};
+struct Part : PartArguments {
+  using Arguments = PartArguments;
+};
+
+struct Whole;
+struct WholeArguments {
+  Int command = 0;
+  Optional<Int64> time;
+  Optional<Bool> flag;
+  Optional<String> text;
+  Optional<Data> bytes;
+  Optional<List<String>> texts;
+  Optional<Part> part;
+  List<Whole> listOfWholes;  // a long name, which widens no column while it is left out
+
+  using R = WholeArguments;
+  using Fields = FieldList<R, &R::command, &R::time, &R::flag, &R::text, &R::bytes, &R::texts,
+                           &R::part, &R::listOfWholes>;
+};
+struct Whole : WholeArguments {
+  using Arguments = WholeArguments;
+};
+
+namespace {
+
+using namespace std::literals;
+
+Whole fullRecord() {
+  Whole whole;
+  whole.command = 32;
+  whole.time = Int64{9007199254740993};
+  whole.flag = true;
+  whole.bytes = Data("0123456789");
+  whole.texts = List<String>{"one", "two"};
+  whole.part = Part{{.name = String("n"), .number = -7}};
+  whole.listOfWholes.resize(2);
+  whole.listOfWholes[0].part = Part{};
+  whole.listOfWholes[1].texts = List<String>{};
+  return whole;
+}
+
+std::string view(const Whole& whole, const Style& style = {}) {
+  std::string out;
+  TextView(out, style).record(whole, 2);
+  return out;
+}
+
+TEST(TextView, AlignsFieldsAndIndentsNestedOnes) {
+  EXPECT_EQ(view(fullRecord()),
+            "  command       32\n"
+            "  time          9007199254740993\n"
+            "  flag          true\n"
+            "  bytes         30313233 34353637 3839 (10 bytes)\n"
+            "  texts         (2 elements)\n"
+            "    [0] \"one\"\n"
+            "    [1] \"two\"\n"
+            "  part\n"
+            "    name    \"n\"\n"
+            "    number  -7\n"
+            "  listOfWholes  (2 elements)\n"
+            "    [0]\n"
+            "      command  0\n"
+            "      part\n"
+            "        (no fields)\n"
+            "    [1]\n"
+            "      command  0\n"
+            "      texts    (empty list)\n");
+}
+
+TEST(TextView, CutsAndWrapsLongValues) {
+  Whole whole;
+  whole.text = String("0123456789abc\n\xE6\xBC\xA2");
+  whole.bytes = Data("0123456789");
+  EXPECT_EQ(view(whole, {.width = 24}),
+            "  command  0\n"
+            "  text     \"0123456789ab\n"
+            "           c\\n\xE6\xBC\xA2\"\n"
+            "  bytes    30313233\n"
+            "           34353637 3839\n"
+            "           (10 bytes)\n");
+  const std::string xs(399, 'x');
+  whole.text = String(xs + "\xC3\xA9" + "y");
+  whole.bytes = Data(std::string(33, 'a'));
+  std::string groups;
+  for (int i = 0; i < 8; ++i) groups += "61616161 ";
+  EXPECT_EQ(view(whole), "  command  0\n  text     \"" + xs +
+                             "\xC3\xA9\" ... the first 401 of 402 bytes\n  bytes    " + groups +
+                             "... the first 32 of 33 bytes\n");
+}
+
+TEST(TextView, ColoursLabelsAndLetsNoTextEndItsQuotes) {
+  Whole whole;
+  whole.text = String("\x1B[31m\" (4 bytes)\\");
+  EXPECT_EQ(view(whole, {.colours = Colours::muted()}),
+            "  \033[36mcommand\033[0m  0\n"
+            "  \033[36mtext\033[0m     \"\\u{1b}[31m\\\" (4 bytes)\\\\\"\n");
+}
+
+TEST(JsonWriter, WritesRecordsWithExactIntegers) {
+  std::string out;
+  JsonWriter(out, Integers::strings).value(fullRecord());
+  EXPECT_EQ(out, R"({"command": "32", "time": "9007199254740993", "flag": true, )"
+                 R"("bytes": "MDEyMzQ1Njc4OQ==", "texts": ["one", "two"], )"
+                 R"("part": {"name": "n", "number": "-7"}, )"
+                 R"("listOfWholes": [{"command": "0", "part": {}, "listOfWholes": []}, )"
+                 R"({"command": "0", "texts": [], "listOfWholes": []}]})");
+}
+
+TEST(Text, IsEscapedWhereItWouldControlATerminal) {
+  const struct {
+    std::string_view text;
+    std::string terminal;
+    std::string json;
+  } rows[] = {
+      {"\xC3\xA9\xE6\xBC\xA2\xF0\x9F\x98\x80", "\xC3\xA9\xE6\xBC\xA2\xF0\x9F\x98\x80",
+       "\xC3\xA9\xE6\xBC\xA2\xF0\x9F\x98\x80"},
+      {"\"quoted\" \\", "\"quoted\" \\", R"(\"quoted\" \\)"},
+      {"\n\r\t\b", R"(\n\r\t\u{8})", R"(\n\r\t\u0008)"},
+      {"\0\x0F\x10\x1B]0;title\x7F"sv, R"(\u{0}\u{f}\u{10}\u{1b}]0;title\u{7f})",
+       R"(\u0000\u000f\u0010\u001b]0;title\u007f)"},
+      {"\xC2\x80\xC2\x9B\x32J\xC2\x9F\xC2\xA0", "\\u{80}\\u{9b}2J\\u{9f}\xC2\xA0",
+       "\\u0080\\u009b2J\\u009f\xC2\xA0"},
+      {"\xE2\x80\xA8\xE2\x80\xA9", R"(\u{2028}\u{2029})", R"(\u2028\u2029)"},
+      // What is invisible or turns the reading direction.
+      {"\xE2\x80\xAE\x66\xE2\x80\x8B\xEF\xBB\xBF\xF3\xA0\x81\x81",
+       R"(\u{202e}f\u{200b}\u{feff}\u{e0041})",
+       "\xE2\x80\xAE\x66\xE2\x80\x8B\xEF\xBB\xBF\xF3\xA0\x81\x81"},
+      {"a\xFF\xC3", R"(a\x{ff}\x{c3})", "a\xEF\xBF\xBD\xEF\xBF\xBD"},
+      {"\xE2\x82z", R"(\x{e2}\x{82}z)", "\xEF\xBF\xBD\xEF\xBF\xBDz"},
+  };
+  for (const auto& row : rows) {
+    EXPECT_EQ(inQuotes(row.text), '\'' + row.terminal + '\'');
+    std::string json;
+    JsonWriter(json).value(row.text);
+    EXPECT_EQ(json, '"' + row.json + '"');
+  }
+}
+
+TEST(Text, IsWrappedAtSpacesThatFitTheWidthExactly) {
+  const struct {
+    std::string_view text;
+    std::size_t width;
+    std::string_view expected;
+  } rows[] = {
+      {"one\ntwo\nthree", 0, "one two three"},
+      {"one\ntwo\nthree", 18, "one two three"},  // in column 5
+      {"one\ntwo\nthree", 17, "one two\n  three"},
+      {"a\ntwo\nthree", 7, "a\n  two\n  three"},
+      {"a b\nabcdefgh", 8, "a b\n  abcdef\n  gh"},
+      {"\xE6\xBC\xA2\xE6\xBC\xA2\ne\xCC\x81", 11, "\xE6\xBC\xA2\xE6\xBC\xA2 e\xCC\x81"},
+      {"\033[2mone\033[0m\ntwo", 12, "\033[2mone\033[0m two"},
+  };
+  for (const auto& row : rows) {
+    std::string out;
+    appendWrapped(out, row.text, 5, 2, row.width);
+    EXPECT_EQ(out, row.expected);
+  }
+}
+
+std::string position(std::string_view message, std::uint64_t offset, std::size_t width = 60) {
+  std::string out;
+  appendPosition(out, Data(message), offset, {{}, width}, 0);
+  return out;
+}
+
+TEST(Position, IsALineAndAColumnOrAByteAndShowsWhatIsThere) {
+  const struct {
+    std::string_view message;
+    std::uint64_t offset;
+    std::string_view shown;
+    std::size_t width = 60;
+  } rows[] = {
+      {"", 0, "line 1, column 1, the end\n"},
+      {"abc", 4, ""},
+      {"ab\n \t<c>\n", 5, "line 2, column 3\n  <c>\n  ^\n"},
+      {"ab\n \t<c>\n", 9, "line 3, column 1, the end\n"},
+      {"a\r\nb\rc\nd", 7, "line 4, column 1\n  d\n  ^\n"},
+      {"\xEF\xBB\xBF\xC3\xA9\t\xE6\xBC\xA2x", 9,
+       "line 1, column 4\n  \xC3\xA9 \xE6\xBC\xA2x\n      ^\n"},
+      {"\xEF\xBB\xBFx", 1, "line 1, column 1\n  x\n  ^\n"},
+      {"\x1B[2J\xFFz", 5, "line 1, column 6\n  \\u{1b}[2J\\x{ff}z\n                 ^\n"},
+      {"\xFE\xFF\0\n\xD8\x3D\xDE\x00\0<\0>"sv, 8,
+       "line 2, column 2\n  \xF0\x9F\x98\x80<>\n    ^\n"},
+      {"\xFE\xFF\0<"sv, 0, "line 1, column 1\n  <\n  ^\n"},
+      {"\xFE\xFF\0\x80\0x"sv, 4, "line 1, column 2\n  \\u{80}x\n        ^\n"},
+      // Halves of surrogate pairs, and of a unit.
+      {"\xFE\xFF\xDC\0\xDC\0"sv, 6,
+       "line 1, column 3, the end\n  \xEF\xBF\xBD\xEF\xBF\xBD\n    ^\n"},
+      {"\xFE\xFF\xD8\0\xD8\0"sv, 4, "line 1, column 2\n  \xEF\xBF\xBD\xEF\xBF\xBD\n   ^\n"},
+      {"\xFF\xFE<\0>\0\n"sv, 4, "line 1, column 2\n  <>\xEF\xBF\xBD\n   ^\n"},
+      {"bplist00\xD1\x01\x02QaQb"sv, 9,
+       "byte 9 of 15\n  30 30 d1 01 02 51  |00...Q|\n           ^^\n", 30},
+      {"bplist00\xD1\x01"sv, 0,
+       "byte 0 of 10\n  62 70 6c 69 73 74 30 30 d1 01  |bplist00..|\n  ^^\n"},
+  };
+  for (const auto& row : rows) EXPECT_EQ(position(row.message, row.offset, row.width), row.shown);
+}
+
+TEST(Position, ShowsThePartOfALongLineThatFits) {
+  const std::string line = std::string(1000, 'a') + "!" + std::string(1000, 'b');
+  EXPECT_EQ(position(line, 1000, 33),
+            "line 1, column 1001\n  ...aaaaaaaaaaaaaaa!bbbbbbbb...\n                    ^\n");
+  const std::string fits = "<a>" + std::string(19, 'b') + "<c/></a>";
+  EXPECT_EQ(position(fits, 3, 33), "line 1, column 4\n  " + fits + "\n     ^\n");
+  std::string marks = "a";
+  for (int i = 0; i < 3000; ++i) marks += "\xCC\x81";  // no columns at all
+  for (const std::string& wide : {marks, std::string(3000, '\xF0'), std::string(3000, '\x80')}) {
+    EXPECT_LT(position(wide, 2001).size(), 600U);
+  }
+}
+
+}  // namespace
+}  // namespace ironmoat::inspect
