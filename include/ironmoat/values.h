@@ -1,10 +1,12 @@
 #pragma once
 
 #include <bit>
+#include <concepts>
 #include <cstddef>
 #include <cstdint>
 #include <span>
 #include <string_view>
+#include <type_traits>
 #include <utility>
 #include <vector>
 
@@ -94,6 +96,26 @@ class Slice {
   Range range_ = kEmpty;
 };
 
+template <class T>
+concept Byte =
+    std::same_as<T, char> || std::same_as<T, unsigned char> || std::same_as<T, std::byte>;
+
+template <class R>
+concept ByteRange = requires(const R& bytes) {
+  { bytes.size() } -> std::convertible_to<std::size_t>;
+  requires Byte<std::remove_cvref_t<decltype(*bytes.data())>>;
+};
+
+/// The text of a literal; nothing else is known when compiling.
+struct Literal {
+  template <std::size_t N>
+  consteval Literal(const char (&literal)[N])  // NOLINT(google-explicit-constructor)
+      : text(literal, N - 1) {
+    if (literal[N - 1] != '\0') throw "not a literal";
+  }
+  std::string_view text;
+};
+
 }  // namespace detail
 
 /// Immutable Unicode text, always valid UTF-8, at most 4 GiB - 1 bytes. Copying is O(1).
@@ -106,8 +128,15 @@ class String {
   String() noexcept = default;
   /// Copies the text. Throws std::invalid_argument when it is not valid UTF-8.
   IRONMOAT_API String(std::string_view text);  // NOLINT(google-explicit-constructor)
-  // NOLINTNEXTLINE(google-explicit-constructor)
-  String(const char* text) : String(std::string_view(text)) {}
+  /// Copies a literal.
+  template <std::size_t N>
+  String(const char (&literal)[N])  // NOLINT(google-explicit-constructor)
+      : String(std::string_view(literal, N - (literal[N - 1] == '\0' ? 1 : 0))) {}
+  /// Where a buffer's text ends, std::string_view(buffer) or (buffer, length) has to say.
+  template <std::size_t N>
+  String(char (&buffer)[N]) = delete;
+  template <std::convertible_to<const char*> T>
+  String(T text) = delete;
   /// Internal: the caller has checked that the slice is valid UTF-8.
   constexpr explicit String(detail::Slice validText) noexcept : slice_(std::move(validText)) {}
 
@@ -130,9 +159,15 @@ class String {
 class Data {
  public:
   Data() noexcept = default;
-  /// Copies the bytes.
-  IRONMOAT_API explicit Data(std::span<const std::uint8_t> bytes);
-  explicit Data(std::string_view bytes) : slice_(detail::Slice::copyOf(bytes)) {}
+  /// Copies the bytes: of a std::string, std::string_view, std::vector, std::span or the like.
+  template <detail::ByteRange R>
+  explicit Data(const R& bytes) : Data(bytes.data(), bytes.size()) {}
+  template <detail::Byte T>
+  Data(const T* bytes, std::size_t size)
+      : slice_(detail::Slice::copyOf({reinterpret_cast<const char*>(bytes), size})) {}
+  /// Copies a literal, without its closing zero byte. Any other `const char*` or array of char does
+  /// not compile: how many bytes of it are meant, only a size can tell.
+  explicit Data(detail::Literal literal) : Data(literal.text) {}
   /// Internal.
   constexpr explicit Data(detail::Slice slice) noexcept : slice_(std::move(slice)) {}
 

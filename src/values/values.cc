@@ -22,7 +22,4 @@ String::String(std::string_view text) : slice_(detail::Slice::copyOf(text)) {
   if (!isValidUtf8(text)) throw std::invalid_argument("text is not valid UTF-8");
 }
 
-Data::Data(std::span<const std::uint8_t> bytes)
-    : slice_(detail::Slice::copyOf({reinterpret_cast<const char*>(bytes.data()), bytes.size()})) {}
-
 }  // namespace ironmoat

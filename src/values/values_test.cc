@@ -4,6 +4,8 @@
 
 #include <stdexcept>
 #include <string>
+#include <string_view>
+#include <vector>
 
 #include "values/utf8.h"
 
@@ -22,6 +24,15 @@ TEST(ValuesTest, SlicesOutliveWhoMadeThemAndCanBeDetached) {
   const String own = kept.detached();
   kept = String();
   EXPECT_EQ(own.view(), "message");
+}
+
+TEST(ValuesTest, ZeroBytesAreBytesLikeAnyOther) {
+  const std::string_view expected("a\0b", 3);
+  EXPECT_EQ(Data("a\0b").view(), expected);
+  EXPECT_EQ(String("a\0b").view(), expected);
+  const char buffer[] = {'a', 0, 'b', 'c'};
+  EXPECT_EQ(Data(buffer, 3).view(), expected);
+  EXPECT_EQ(Data(std::vector<unsigned char>{'a', 0, 'b'}).view(), expected);
 }
 
 TEST(ValuesTest, TextIsAlwaysWellFormedUtf8) {
