@@ -7,6 +7,13 @@ set(IRONMOAT_ABI ${PROJECT_VERSION_MAJOR})
 if(PROJECT_VERSION_MAJOR EQUAL 0)
   set(IRONMOAT_ABI 0.${PROJECT_VERSION_MINOR})
 endif()
+file(STRINGS ${PROJECT_SOURCE_DIR}/include/ironmoat/api.h said REGEX "^#define IRONMOAT_ABI ")
+string(REPLACE . _ wanted "#define IRONMOAT_ABI ${IRONMOAT_ABI}")
+if(NOT said STREQUAL wanted)
+  message(FATAL_ERROR "for version ${PROJECT_VERSION} include/ironmoat/api.h must say '${wanted}'")
+endif()
+set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS
+  ${PROJECT_SOURCE_DIR}/include/ironmoat/api.h)
 
 ironmoat_link_closure(ironmoat_client reached)
 set(objects)

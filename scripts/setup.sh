@@ -27,7 +27,7 @@ require_packages() {
   local package missing=()
   command -v dpkg-query >/dev/null || return 0 # not Debian: the build says what it lacks
   for package in "$@"; do
-    [[ $(dpkg-query -W -f '${db:Status-Status}' "$package" 2>/dev/null) == installed ]] ||
+    [[ $(dpkg-query -W -f '${db:Status-Status}' "$package" 2>/dev/null) == installed* ]] ||
       missing+=("$package")
   done
   ((${#missing[@]} > 0)) || return 0

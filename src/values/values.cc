@@ -9,6 +9,8 @@ namespace ironmoat {
 
 namespace detail {
 
+const char IRONMOAT_DETAIL_BUILT_FOR = 0;
+
 Slice Slice::copyOf(std::string_view bytes, Sharing sharing) {
   BlockBuilder builder(sharing);
   builder.append(bytes);
