@@ -47,6 +47,16 @@ endif()
 add_library(Ironmoat::client ALIAS ironmoat_shared)
 add_library(Ironmoat::client_static ALIAS ironmoat_static)
 
+if(IRONMOAT_TESTS AND NOT IRONMOAT_SANITIZE)
+  add_test(NAME client_library/Symbols
+    COMMAND ${PROJECT_SOURCE_DIR}/packaging/check-symbols $<TARGET_FILE:ironmoat_shared>)
+endif()
+
+if(NOT IRONMOAT_INSTALL)
+  add_dependencies(ironmoat_shared VeskIronmoatService)  # they start it where it was built
+  add_dependencies(ironmoat_static VeskIronmoatService)
+  return()
+endif()
 install(TARGETS ironmoat_shared EXPORT ironmoat
   LIBRARY COMPONENT library NAMELINK_COMPONENT development)
 install(TARGETS ironmoat_static EXPORT ironmoat ARCHIVE COMPONENT development)
@@ -77,8 +87,3 @@ string(REGEX REPLACE "/$" "" prefix_from_pc ${prefix_from_pc})
 configure_file(${CMAKE_CURRENT_LIST_DIR}/ironmoat.pc.in ${PROJECT_BINARY_DIR}/ironmoat.pc @ONLY)
 install(FILES ${PROJECT_BINARY_DIR}/ironmoat.pc
   DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT development)
-
-if(IRONMOAT_TESTS AND NOT IRONMOAT_SANITIZE)
-  add_test(NAME client_library/Symbols
-    COMMAND ${PROJECT_SOURCE_DIR}/packaging/check-symbols $<TARGET_FILE:ironmoat_shared>)
-endif()

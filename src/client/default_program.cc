@@ -21,6 +21,7 @@ constexpr const char* kName = "VeskIronmoatService";
 std::string programOfThisInstallation() {
   // A program with privileges that its caller lacks goes by nothing that the caller may have moved.
   if (::getauxval(AT_SECURE) != 0) return {};
+  if (IRONMOAT_LIBEXEC_FROM_LIB[0] == '\0') return {};  // it is not to be installed
   Dl_info self = {};
   if (::dladdr(reinterpret_cast<const void*>(&defaultProgram), &self) == 0) return {};
   std::error_code error;
