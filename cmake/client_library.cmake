@@ -78,12 +78,15 @@ install(FILES ${PROJECT_BINARY_DIR}/IronmoatConfig.cmake
 install(EXPORT ironmoat NAMESPACE Ironmoat:: FILE IronmoatTargets.cmake
   DESTINATION ${config_folder} COMPONENT development)
 
-# pkg-config ironmoat: every path is relative to the file's own.
+# pkg-config ironmoat: its prefix is the one that is installed to, which only the installation knows.
 foreach(folder LIBDIR INCLUDEDIR LIBEXECDIR)
   file(RELATIVE_PATH ${folder}_from_prefix ${CMAKE_INSTALL_PREFIX} ${CMAKE_INSTALL_FULL_${folder}})
 endforeach()
-file(RELATIVE_PATH prefix_from_pc ${CMAKE_INSTALL_FULL_LIBDIR}/pkgconfig ${CMAKE_INSTALL_PREFIX})
-string(REGEX REPLACE "/$" "" prefix_from_pc ${prefix_from_pc})
-configure_file(${CMAKE_CURRENT_LIST_DIR}/ironmoat.pc.in ${PROJECT_BINARY_DIR}/ironmoat.pc @ONLY)
+set(at @)
+configure_file(${CMAKE_CURRENT_LIST_DIR}/ironmoat.pc.in ${PROJECT_BINARY_DIR}/ironmoat.pc.in @ONLY)
+install(CODE "
+  set(prefix \"\${CMAKE_INSTALL_PREFIX}\")
+  configure_file(\"${PROJECT_BINARY_DIR}/ironmoat.pc.in\" \"${PROJECT_BINARY_DIR}/ironmoat.pc\" @ONLY)"
+  COMPONENT development)
 install(FILES ${PROJECT_BINARY_DIR}/ironmoat.pc
   DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT development)

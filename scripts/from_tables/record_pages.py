@@ -50,6 +50,7 @@ class Page:
             "bytes": wire["bytes"],
             "fields": [self.field(*both) for both in zip(wire["fields"], output["arguments"])],
         } for wire, output in pairs}
+        self.version = tables["version"]
         self.output_types = [output for _, output in RECORDS.values()]
 
     def field(self, field, argument):
@@ -89,6 +90,7 @@ class Page:
             fields = ",\n".join("      " + json.dumps(field) for field in record["fields"])
             records.append(f'    {json.dumps(name)}: {{"wireRecord": {json.dumps(record["wireRecord"])}'
                            f', "bytes": {record["bytes"]}, "fields": [\n{fields}]}}')
-        return (f'{{\n  "outputTypes": {json.dumps(self.output_types)},\n'
+        return (f'{{\n  "version": {self.version},\n'
+                f'  "outputTypes": {json.dumps(self.output_types)},\n'
                 f'  "records": {{\n'
                 + ",\n".join(records) + "\n  }\n}\n")

@@ -1,6 +1,6 @@
 // Prints the tables of all records as JSON, for tests and documents that must not have a second
 // copy of them: the fields of the wire records in decoding order, the arguments of the output
-// records' initialisers in label order, and the limits that a message meets.
+// records' initialisers in label order, the frames' version, and the limits that a message meets.
 
 #include <concepts>
 #include <cstdlib>
@@ -11,6 +11,7 @@
 #include <string_view>
 #include <type_traits>
 
+#include "frames/frame.h"
 #include "ironmoat/limits.h"
 #include "records/all_records.h"
 
@@ -89,7 +90,7 @@ void printTables() {
     wireRecords.append(separator).append(wireRecord<Wire>());
     outputRecords.append(separator).append(outputRecord<Output>());
   });
-  std::cout << "{\"limits\": {\"messageBytes\": " << limits::messageBytes
+  std::cout << "{\"version\": " << frames::kVersion << ",\n\"limits\": {\"messageBytes\": " << limits::messageBytes
             << ", \"nestedContainers\": " << limits::nestedContainers
             << ", \"recordBytes\": " << limits::recordBytes
             << ", \"deliveredBytes\": " << limits::deliveredBytes << "},\n\"wireRecords\": ["
