@@ -6,8 +6,8 @@ root=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
 # Debian packages: to build and test, and what the checks of .ci/run need besides.
 packages=(cmake g++ libgtest-dev libseccomp-dev ninja-build pkg-config python3)
 # shellcheck disable=SC2034 # used by those who source this
-check_packages=("${packages[@]}" clang clang-format clang-tidy doxygen dpkg-dev file libclang-rt-dev
-  mandoc systemd valgrind)
+check_packages=("${packages[@]}" clang clang-format clang-tidy doxygen dpkg-dev file golang-go
+  libclang-rt-dev mandoc rustc systemd valgrind)
 
 # Runs a command that has nothing to say unless it fails.
 quietly() {

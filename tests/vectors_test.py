@@ -26,6 +26,42 @@ SANITIZED = 0b10_0000_1010  # what a service built with a sanitizer has in force
 TOOL = SERVICE = TEST_SERVER = DUMP_TABLES = None
 
 
+RESPONSE, PAYLOAD = "VeskCommandResponse", "DrelUserPayload"
+REFUSAL = struct.pack("<BBQHs", 1, 2, 2**64 - 1, 1, b"c")
+# A payload that has only what every one has: its command, and lists, the first one of payloads.
+FIELDS = RECORDS[PAYLOAD]["fields"]
+ALWAYS = sum(1 << place for place, field in enumerate(FIELDS) if not field["optional"])
+HEAD = ALWAYS.to_bytes((len(FIELDS) + 7) // 8, "little") + bytes(8)
+LISTS = sum(field["type"].startswith("List") and not field["optional"] for field in FIELDS)
+
+
+def nested_payloads(levels):
+    """The body of a reply."""
+    nested = HEAD + bytes(4 * LISTS)
+    for _ in range(levels - 1):
+        nested = HEAD + struct.pack("<I", 1) + nested + bytes(4 * (LISTS - 1))
+    return b"\0" + nested
+
+
+# Bodies of replies that no service as it should be sends: {what is wrong, output type, body}.
+LIES = (
+    ("unknown status", RESPONSE, b"\x04"),
+    ("unknown kind", RESPONSE, b"\1\x07" + REFUSAL[2:]),
+    ("path beyond the end", RESPONSE, REFUSAL[:-1]),
+    ("zero byte in a sentence", RESPONSE, REFUSAL + b"a\0"),
+    ("no UTF-8 in a sentence", RESPONSE, b"\3\xff"),
+    ("required field missing", RESPONSE, b"\0\0\0"),
+    ("unused presence bit", RESPONSE, b"\0\x01\x20" + bytes(8)),
+    ("Bool of 2", RESPONSE, b"\0\x41\0" + bytes(8) + b"\2"),
+    ("text beyond the end", RESPONSE, b"\0\x01\1" + bytes(8) + struct.pack("<I", 1)),
+    ("no UTF-8 in a record", RESPONSE, b"\0\x01\1" + bytes(8) + struct.pack("<I", 1) + b"\xff"),
+    ("bytes behind the record", RESPONSE, b"\0\x01\0" + bytes(8) + b"\0"),
+    ("a list of everything", PAYLOAD, b"\0" + HEAD + b"\xff" * 4 + bytes(64)),
+    ("a list that takes too much memory", PAYLOAD,
+     b"\0" + HEAD + struct.pack("<I", 28_150) + bytes(28_150)),
+    ("nested too deep", PAYLOAD, nested_payloads(513)))
+
+
 def outcome(entry):
     return {"record": entry["record"]} if "record" in entry else {"error": entry["error"]}
 
@@ -128,39 +164,11 @@ class PythonClient(unittest.TestCase):
         def take(output_type, body):
             return ironmoat.Reply(bytes(8) + body, RECORDS, limits).outcome(output_type)
 
-        response, payload = "VeskCommandResponse", "DrelUserPayload"
-        number = bytes(8)
-        refusal = struct.pack("<BBQHs", 1, 2, 2**64 - 1, 1, b"c")
-        self.assertEqual(take(response, b"\0\x01\0" + number), {"command": 0})
-        self.assertEqual(vars(take(response, refusal + b"why")),
+        self.assertEqual(take(RESPONSE, b"\0\x01\0" + bytes(8)), {"command": 0})
+        self.assertEqual(vars(take(RESPONSE, REFUSAL + b"why")),
                          {"kind": "typeMismatch", "path": "c", "offset": None})
-        # The lists that every payload has, the last field of each level being such a list.
-        fields = RECORDS[payload]["fields"]
-        always = sum(1 << place for place, field in enumerate(fields) if not field["optional"])
-        head = always.to_bytes(19, "little") + number
-        lists = sum(field["type"].startswith("List") and not field["optional"] for field in fields)
-        empty = head + bytes(4 * lists)
-        take(payload, b"\0" + empty)
-        nested = empty
-        for _ in range(600):
-            nested = head + struct.pack("<I", 1) + nested + bytes(4 * (lists - 1))
-        for what, output_type, body in (
-                ("unknown status", response, b"\x04"),
-                ("unknown kind", response, b"\1\7" + refusal[2:]),
-                ("path beyond the end", response, refusal[:-1]),
-                ("zero byte in a sentence", response, refusal + b"a\0"),
-                ("no UTF-8 in a sentence", response, b"\3\xff"),
-                ("required field missing", response, b"\0\0\0"),
-                ("unused presence bit", response, b"\0\x01\x20" + number),
-                ("Bool of 2", response, b"\0\x41\0" + number + b"\2"),
-                ("text beyond the end", response, b"\0\x01\1" + number + struct.pack("<I", 1)),
-                ("no UTF-8 in a record", response,
-                 b"\0\x01\1" + number + struct.pack("<I", 1) + b"\xff"),
-                ("bytes behind the record", response, b"\0\x01\0" + number + b"\0"),
-                ("a list of everything", payload, b"\0" + head + b"\xff" * 4 + bytes(64)),
-                ("a list that takes too much memory", payload,
-                 b"\0" + head + struct.pack("<I", 28_150) + bytes(28_150)),
-                ("nested too deep", payload, b"\0" + nested)):
+        take(PAYLOAD, nested_payloads(512))
+        for what, output_type, body in LIES:
             with self.subTest(what), self.assertRaises((ironmoat.NoAnswer, UnicodeDecodeError)):
                 take(output_type, body)
 

@@ -1,0 +1,3 @@
+module ironmoat.invalid/ironmoat
+
+go 1.19
