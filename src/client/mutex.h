@@ -16,6 +16,10 @@
 namespace ironmoat::client {
 
 class IRONMOAT_THREAD_ANNOTATION(capability("mutex")) Mutex {
+ public:
+  void lock() IRONMOAT_THREAD_ANNOTATION(acquire_capability()) { mutex_.lock(); }
+  void unlock() IRONMOAT_THREAD_ANNOTATION(release_capability()) { mutex_.unlock(); }
+
  private:
   friend class Lock;
   std::mutex mutex_;

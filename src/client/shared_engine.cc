@@ -37,7 +37,7 @@ void SharedEngine::submit(std::shared_ptr<SubmittedRequest> request) {
   submitted_.push(std::move(request));
   if (++submittedCount_ >= worthSending_) {
     if (!driven_) {
-      drive(lock, TimePoint());
+      drive(TimePoint());
     } else if (std::exchange(asleep_, false)) {
       ::eventfd_write(wake_.get(), 1);
     }
@@ -61,16 +61,16 @@ void SharedEngine::startThread() {
   thread_ = startQuietThread(&SharedEngine::run, this);
 }
 
-void SharedEngine::drive(Lock& lock, TimePoint until) noexcept {
+void SharedEngine::drive(TimePoint until) noexcept {
   driven_ = true;
   for (bool waited = false;;) {
     RequestList submitted(std::move(submitted_));
     submittedCount_ = 0;
-    lock.unlock();
+    mutex_.unlock();
     while (std::shared_ptr<Request> request = submitted.pop()) engine_->add(std::move(request));
     engine_->step();
     RequestList finished(std::move(engine_->finished()));
-    lock.lock();
+    mutex_.lock();
     const bool progress = !finished.empty();
     publish(std::move(finished));
     worthSending_ = engine_->worthAdding();
@@ -78,9 +78,9 @@ void SharedEngine::drive(Lock& lock, TimePoint until) noexcept {
     if (submittedCount_ >= worthSending_) continue;
     asleep_ = true;
     const TimePoint at = std::min(until, engine_->wakeAt());
-    lock.unlock();
+    mutex_.unlock();
     engine_->wait(millisecondsUntil(at));
-    lock.lock();
+    mutex_.lock();
     if (eventfd_t ignored = 0; !std::exchange(asleep_, false)) {
       ::eventfd_read(wake_.get(), &ignored);
     }
@@ -91,7 +91,7 @@ void SharedEngine::drive(Lock& lock, TimePoint until) noexcept {
 }
 
 void SharedEngine::driveOrWait(Lock& lock, const SubmittedRequest* request, TimePoint until) {
-  if (!driven_ && !stopping_) return drive(lock, until);
+  if (!driven_ && !stopping_) return drive(until);
   Waiter self{request, {}};
   waiters_.push_back(&self);
   if (until == TimePoint::max()) {
@@ -144,7 +144,7 @@ void SharedEngine::run() noexcept {
       completed.deliverAll();
       lock.lock();
     } else if (!driven_ && inFlight_ > 0 && (completions_ > 0 || drives_ == seen)) {
-      drive(lock, Clock::now() + kTick);
+      drive(Clock::now() + kTick);
       seen = drives_;
       passOn();
     } else if (inFlight_ > 0) {

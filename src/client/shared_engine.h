@@ -70,7 +70,7 @@ class SharedEngine {
   void run() noexcept;
   /// Drives once: waits until `until` for something to do, if nothing is. Requires that nobody
   /// drives.
-  void drive(Lock& lock, TimePoint until) noexcept IRONMOAT_REQUIRES(mutex_);
+  void drive(TimePoint until) noexcept IRONMOAT_REQUIRES(mutex_);
   /// Drives, or waits for whoever does.
   void driveOrWait(Lock& lock, const SubmittedRequest* request, TimePoint until)
       IRONMOAT_REQUIRES(mutex_);
