@@ -22,6 +22,7 @@ import message_model  # noqa: E402
 VECTORS = ROOT / "tests/vectors"
 ENTRIES = json.loads((VECTORS / "vectors.json").read_text())
 RECORDS = json.loads((ROOT / "doc/records.json").read_text())["records"]
+LIMITS = dict(zip(ironmoat.LIMITS, (16 << 20, 64 << 20, 64 << 20, 144 << 20, 512)))
 SANITIZED = 0b10_0000_1010  # what a service built with a sanitizer has in force
 TOOL = SERVICE = TEST_SERVER = DUMP_TABLES = None
 
@@ -118,6 +119,25 @@ class Vectors(unittest.TestCase):
                 self.assertEqual(comparable(shown(answer), entry), outcome(entry))
 
 
+class Answers(unittest.TestCase):
+    """The program `answers`, if need be in an emulator."""
+
+    def test_vectors(self):
+        asked = [(entry, file) for entry in ENTRIES for file in entry["files"]]
+        requests = b""
+        for number, (entry, file) in enumerate(asked):
+            name = entry["outputType"].encode()
+            body = struct.pack("<QB", number, len(name)) + name + (VECTORS / file).read_bytes()
+            requests += struct.pack("<I", len(body)) + body
+        program = pathlib.Path(TEST_SERVER).parent / "answers"
+        result = subprocess.run([*os.environ.get("EMULATOR", "").split(), program], input=requests,
+                                stdout=subprocess.PIPE, check=True)
+        for (entry, file), body in zip(asked, split(result.stdout), strict=True):
+            with self.subTest(file):
+                answer = ironmoat.Reply(body, RECORDS, LIMITS).outcome(entry["outputType"])
+                self.assertEqual(comparable(shown(answer), entry), outcome(entry))
+
+
 class FramesPage(unittest.TestCase):
     def test_exchange(self):
         """The one that the page shows; the hello's confinement is the machine's."""
@@ -129,14 +149,19 @@ class FramesPage(unittest.TestCase):
         self.assertEqual(frames(result.stdout), frames(received))
 
 
-def frames(stream):
-    """The hello without its confinement, and the replies, which come in any order."""
+def split(stream):
+    """The frames' bodies."""
     bodies = []
     while stream:
         end = 4 + int.from_bytes(stream[:4], "little")
         bodies.append(stream[4:end])
         stream = stream[end:]
-    hello, *replies = bodies
+    return bodies
+
+
+def frames(stream):
+    """The hello without its confinement, and the replies, which come in any order."""
+    hello, *replies = split(stream)
     return [hello[:10] + hello[14:], *sorted(replies)]
 
 
@@ -159,10 +184,8 @@ class PythonClient(unittest.TestCase):
         client.close()
 
     def test_replies_that_lie(self):
-        limits = dict(zip(ironmoat.LIMITS, (16 << 20, 64 << 20, 64 << 20, 144 << 20, 512)))
-
         def take(output_type, body):
-            return ironmoat.Reply(bytes(8) + body, RECORDS, limits).outcome(output_type)
+            return ironmoat.Reply(bytes(8) + body, RECORDS, LIMITS).outcome(output_type)
 
         self.assertEqual(take(RESPONSE, b"\0\x01\0" + bytes(8)), {"command": 0})
         self.assertEqual(vars(take(RESPONSE, REFUSAL + b"why")),
