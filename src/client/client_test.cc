@@ -425,8 +425,8 @@ TEST_F(ClientTest, ReplacesProcessesWithoutARequestNoticing) {
   EXPECT_GE(client.stats().retired, 4U);
   EXPECT_EQ(client.stats().retried, 0U);
 
-  Client slow(fake(100ms));
-  for (int i = 0; i < 3; ++i) EXPECT_EQ(outcome(slow, "slow 70"), "70");
+  Client slow(fake(1s));
+  for (int i = 0; i < 3; ++i) EXPECT_EQ(outcome(slow, "slow 510"), "510");
   for (int i = 0; i < 50 && slow.stats().retired == 0; ++i) {
     std::this_thread::sleep_for(1ms);
     EXPECT_EQ(outcome(slow, "echo 1"), "1");
