@@ -7,7 +7,7 @@ root=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
 packages=(cmake g++ libgtest-dev libseccomp-dev ninja-build pkg-config python3)
 # shellcheck disable=SC2034 # used by those who source this
 check_packages=("${packages[@]}" clang clang-format clang-tidy doxygen dpkg-dev file golang-go
-  libclang-rt-dev mandoc rustc systemd valgrind)
+  libclang-rt-dev libsystemd-dev mandoc rustc systemd valgrind)
 
 # Runs a command that has nothing to say unless it fails.
 quietly() {

@@ -1,5 +1,5 @@
 #!/usr/bin/env python3
-"""drive.py SOCKET COMMAND...: starts payload_daemon as COMMAND (which has to name SOCKET in its own
+"""drive.py SOCKET COMMAND...: starts an example daemon as COMMAND (which has to name SOCKET in its own
 way), sends it good, bad and poisonous messages, and checks what it makes of each."""
 
 import collections
@@ -119,6 +119,8 @@ def drive(daemon: Daemon):
     assert sum(lines.values()) == len(burst)
     print(f"{len(burst)} at once had as many lines, each the right one")
 
+    for message, _ in burst[:20]:
+        daemon.send(message)
     daemon.process.send_signal(signal.SIGTERM)
     assert daemon.process.wait(10) == 0
     time.sleep(0.1)
