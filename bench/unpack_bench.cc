@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "confinement/confinement.h"
+#include "confinement/memory.h"
 #include "messages.h"
 #include "plist/property_list_decoder.h"
 #include "protobuf_peer.h"

@@ -17,7 +17,7 @@ import (
 )
 
 // Confined has the bits of confinement that a service as it should be has on any kernel.
-const Confined = 0b10_1111_1111
+const Confined = 0b110_1111_1111
 
 var kinds = []string{
 	"malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound", "rejectedByHost",

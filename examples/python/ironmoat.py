@@ -14,7 +14,7 @@ import time
 
 KINDS = ["malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound",
          "rejectedByHost", "notEnoughMemory"]
-CONFINED = 0b10_1111_1111  # the bits that a client insists on
+CONFINED = 0b110_1111_1111  # the bits that a client insists on
 LIMITS = ["message", "memory", "delivered", "reply", "nesting"]  # in bytes, but for the last
 
 

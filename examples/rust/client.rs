@@ -8,7 +8,7 @@ use std::process::{Child, Command, Stdio};
 use std::time::{Duration, Instant};
 
 /// The bits of confinement that a service as it should be has on any kernel.
-pub const CONFINED: u32 = 0b10_1111_1111;
+pub const CONFINED: u32 = 0b110_1111_1111;
 
 const KINDS: [&str; 7] =
     ["malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound", "rejectedByHost",

@@ -22,7 +22,7 @@ struct ClientOptions {
 
   /// Service processes at most, each of which works on one message at a time. 0: one for each
   /// processor, 4 at most. The first is started with the first message, another only while all are
-  /// busy. `Client` may run one more for the requests made with `submit`.
+  /// busy. A `Client` whose `unpack` and `submit` are both used has so many for each.
   std::size_t processes = 0;
 
   /// A process that has been idle for so long is ended, but for the last one. Looked at whenever a

@@ -22,17 +22,16 @@ namespace ironmoat::client {
 /// One service process, as a state machine, and the requests that were given to it. Knows no
 /// process, socket or thread: its owner reports events and carries out what it asks for.
 ///
-/// | state    | event                        | next     | and |
-/// |----------|------------------------------|----------|-------------------------------------------|
-/// | absent   | started                      | greeting | the start deadline runs | | absent   |
-/// startFailed                  | absent   | the next start waits; the fifth in a row, | | | | | or
-/// a lasting failure, fails all requests  | | greeting | receive (a hello)            | ready    |
-/// requests are sent                         | | greeting | lost                         | absent
-/// | as startFailed                            | | ready    | receive (the front's reply)  | ready
-/// | the front has its outcome                 | | ready    | lost                         | absent
-/// | retry or blame, see below                 | | ready    | dismissed                    | absent
-/// |                                           | | ready    | replaced                     | ready
-/// | the process is a fresh one                |
+///     state     event                   next
+///     absent    started                 greeting  the start deadline runs
+///     absent    startFailed             absent    the next start waits; the fifth failure in a
+///                                                 row, or a lasting one, fails all requests
+///     greeting  receive (a hello)       ready     requests are sent
+///     greeting  lost                    absent    as startFailed
+///     ready     receive (a reply)       ready     the front has its outcome
+///     ready     lost                    absent    retry or blame, see below
+///     ready     dismissed               absent    an idle process was ended
+///     ready     replaced                ready     an idle process gave way to a fresh one
 ///
 /// A service answers in the order of the requests. The front is the oldest request without an
 /// outcome; its deadline runs from when it becomes the front of a ready process.

@@ -90,7 +90,8 @@ void printTables() {
     wireRecords.append(separator).append(wireRecord<Wire>());
     outputRecords.append(separator).append(outputRecord<Output>());
   });
-  std::cout << "{\"version\": " << frames::kVersion << ",\n\"limits\": {\"messageBytes\": " << limits::messageBytes
+  std::cout << "{\"version\": " << frames::kVersion
+            << ",\n\"limits\": {\"messageBytes\": " << limits::messageBytes
             << ", \"nestedContainers\": " << limits::nestedContainers
             << ", \"recordBytes\": " << limits::recordBytes
             << ", \"deliveredBytes\": " << limits::deliveredBytes << "},\n\"wireRecords\": ["

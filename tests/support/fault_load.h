@@ -83,6 +83,7 @@ struct Tally {
       if (killed && error.kind() == ServiceError::Kind::crashed) {
         ++crashed;
       } else if (what.ends_with("was killed by SIGKILL before its hello") ||
+                 what.ends_with("was killed by SIGKILL before its first reply") ||
                  what == "the client was destroyed") {
         ++unavailable;
       } else {
