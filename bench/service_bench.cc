@@ -29,8 +29,6 @@
 #include "messages.h"
 #include "unpackers/corvel_payload_unpacker.h"
 
-extern char** environ;
-
 namespace ironmoat::bench {
 namespace {
 
