@@ -20,17 +20,35 @@ Clock::duration timeOfFirstReply() {
   return Clock::now() - start;
 }
 
+/// Each run with `--gtest_repeat` kills at other times: ten with `--full` are 100,000 kills.
 TEST_F(FaultsTest, KilledAtRandomTimesUnderLoad) {
   const auto spell = 4 * std::min({timeOfFirstReply(), timeOfFirstReply(), timeOfFirstReply()});
   Client client(optionsFor(SERVICE));
-  Load load(client, 4);
   Killer kill;
-  std::mt19937 random(1);
+  const auto unpack = [&] {
+    const auto outcome = client.tryUnpack<VeskCommandResponse>(message(2));
+    EXPECT_TRUE(outcome && outcome->command == 2)
+        << (outcome.serviceError() != nullptr ? outcome.serviceError()->what() : "another outcome");
+  };
+  Times alone;
+  for (int i = sized(20, 1000); i > 0; --i) {
+    unpack();
+    EXPECT_TRUE(kill());
+    alone.measure(unpack);
+  }
+  alone.print("kill to the reply to the next request");
+
+  Load load(client, 4);
+  Times loaded;
+  static std::mt19937 random(1);
   const int most = sized(200, 10'000);
   for (int kills = 0; kills < most;) {
     std::this_thread::sleep_for(spell * (random() % 1000) / 1000);
-    if (kill()) ++kills;
+    if (!kill()) continue;
+    // After the others a process that replaces one may be killed while it starts.
+    if (++kills % 2 == 0) loaded.measure(unpack);
   }
+  loaded.print("the same under load");
   const Tally& tally = load.stop();
   std::printf("%d kills: %d right, %d crashed, %d unavailable, %d wrong\n", most,
               tally.right.load(), tally.crashed.load(), tally.unavailable.load(),

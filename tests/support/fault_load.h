@@ -162,6 +162,8 @@ class Killer {
  public:
   bool operator()() {
     const std::vector<pid_t> all = serviceProcesses();
+    // Numbers are given again.
+    std::erase_if(killed_, [&](pid_t pid) { return std::ranges::count(all, pid) == 0; });
     const auto next =
         std::find_if(all.begin(), all.end(), [this](pid_t pid) { return !killed_.contains(pid); });
     if (next == all.end()) return false;
