@@ -1,6 +1,7 @@
-// growth SMALLEST LARGEST [time]: what unpacking costs against the message's size, for each shape
-// and sample in each form and what is refused at its end, as JSON lines: bytes of the message,
-// allocations, peak bytes of heap and, when asked, the least CPU nanoseconds of several runs.
+// growth SMALLEST LARGEST [time]: what unpacking costs, as JSON lines for each sample, what is
+// refused at its end, each stream, and each shape in several sizes; in each form: messages, and for
+// one of them bytes, allocations and, of a shape and when asked, the least CPU nanoseconds of
+// several runs; and peak bytes of heap.
 //
 // Every unpacking to be counted goes through `measured`, once, in the order of the lines: under
 // callgrind with --toggle-collect and --dump-after on it, instructions come out in the same order.
@@ -10,12 +11,14 @@
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
+#include <span>
 #include <string_view>
 
 #include "confinement/memory.h"
 #include "heap_count.h"
 #include "messages.h"
 #include "shapes.h"
+#include "streams.h"
 #include "unpackers/corvel_payload_unpacker.h"
 
 static void unpackOnce(const ironmoat::Data& message) {
@@ -26,7 +29,9 @@ static void unpackOnce(const ironmoat::Data& message) {
   }
 }
 
-extern "C" [[gnu::noinline]] void measured(const ironmoat::Data& message) { unpackOnce(message); }
+extern "C" [[gnu::noinline]] void measured(std::span<const ironmoat::Data> messages) {
+  for (const ironmoat::Data& message : messages) unpackOnce(message);
+}
 
 namespace ironmoat::bench {
 namespace {
@@ -57,43 +62,54 @@ double leastTime(const Data& message) {
   return least;
 }
 
-void report(std::string_view kind, std::string_view name, plist::Form form, const Data& message,
-            bool timed) {
+void report(std::string_view kind, std::string_view name, plist::Form form,
+            std::span<const Data> messages, bool timed) {
+  // What happens once in a process, and what the processor soon learns.
+  for (int i = 0; i < 3; ++i) unpackOnce(messages[0]);
+  std::size_t bytes = 0;
+  for (const Data& message : messages) bytes += message.size();
   const HeapCount before = heapCount();
   restartPeak();
-  measured(message);
+  measured(messages);
   const HeapCount after = heapCount();
   std::printf(
-      "{\"kind\": \"%.*s\", \"name\": \"%.*s\", \"form\": \"%s\", \"bytes\": %zu, "
-      "\"allocations\": %zu, \"peak\": %zu",
+      "{\"kind\": \"%.*s\", \"name\": \"%.*s\", \"form\": \"%s\", \"messages\": %zu, \"bytes\": "
+      "%zu, "
+      "\"allocations\": %.3f, \"peak\": %zu",
       static_cast<int>(kind.size()), kind.data(), static_cast<int>(name.size()), name.data(),
-      nameOf(form).data(), message.size(), after.allocations - before.allocations,
+      nameOf(form).data(), messages.size(), bytes / messages.size(),
+      static_cast<double>(after.allocations - before.allocations) /
+          static_cast<double>(messages.size()),
       after.peak - before.bytes);
-  if (timed) std::printf(", \"nanoseconds\": %.0f", leastTime(message));
+  if (kind == "shape" && timed) std::printf(", \"nanoseconds\": %.0f", leastTime(messages[0]));
   std::printf("}\n");
 }
 
 void run(std::size_t smallest, std::size_t largest, bool timed) {
   constexpr plist::Form kForms[] = {plist::Form::binary, plist::Form::xml};
-  const VeskCorvelProtocolPayload& full = sample("full").record;
-  for (const plist::Form form : kForms) {  // what happens once in a process
-    unpackOnce(messageOf(full, form));
-    unpackOnce(messageOf(WrongAtLast{full}, form));
-    unpackOnce(brokenAtLast(messageOf(full, form), form));
-  }
+  constexpr std::size_t kStream = 256;  // messages: enough for counts
+  const auto one = [timed](std::string_view kind, std::string_view name, plist::Form form,
+                           const Data& message) {
+    report(kind, name, form, {&message, 1}, timed);
+  };
   for (const Sample& each : samples()) {
     for (const plist::Form form : kForms) {
       const Data message = messageOf(each.record, form);
-      report("sample", each.name, form, message, timed);
-      report("wrong", each.name, form, messageOf(WrongAtLast{each.record}, form), timed);
-      report("broken", each.name, form, brokenAtLast(message, form), timed);
+      one("sample", each.name, form, message);
+      one("wrong", each.name, form, messageOf(WrongAtLast{each.record}, form));
+      one("broken", each.name, form, brokenAtLast(message, form));
+    }
+  }
+  for (const Stream& stream : streams(kStream)) {
+    for (const plist::Form form : kForms) {
+      report("stream", stream.name, form, messagesOf(stream, form), timed);
     }
   }
   for (const Shape& shape : shapes()) {
     for (const plist::Form form : kForms) {
       for (std::size_t bytes = smallest; bytes <= largest; bytes *= 4) {
         const auto message = messageOfSize(shape, form, bytes);
-        if (message) report("shape", shape.name, form, *message, timed);
+        if (message) one("shape", shape.name, form, *message);
       }
     }
   }

@@ -34,12 +34,7 @@ def curves(lines):
 
 def main():
     lines = read(sys.argv[1])
-    print("| message | form | bytes | allocations | peak heap, bytes |\n|---|---|---|---|---|")
-    for line in lines:
-        if line["kind"] == "sample":
-            print(f"| {line['name']} | {line['form']} | {line['bytes']:,} | {line['allocations']} "
-                  f"| {line['peak']:,} |")
-    print("\n| shape | form | bytes | slope of time | slope of memory | ns per byte, smallest "
+    print("| shape | form | bytes | slope of time | slope of memory | ns per byte, smallest "
           "and largest | peak heap per byte of the largest |\n|---|---|---|---|---|---|---|")
     for (name, form), points in curves(lines).items():
         first, last = points[0], points[-1]

@@ -1,32 +1,13 @@
 #include "messages.h"
 
-#include <cstdint>
+#include <algorithm>
 #include <stdexcept>
-#include <string>
-#include <type_traits>
+
+#include "filler.h"
 
 namespace ironmoat::bench {
 
 namespace {
-
-/// Bytes that look like a token's: the same ones for the same number, always.
-std::string noise(std::size_t size, std::uint64_t number) {
-  std::string bytes;
-  std::uint64_t state = number * 2654435761U + 88172645463325252U;
-  while (bytes.size() < size) {
-    state ^= state << 13;
-    state ^= state >> 7;
-    state ^= state << 17;
-    bytes.push_back(static_cast<char>(state >> 32));
-  }
-  return bytes;
-}
-
-std::string hex(std::size_t digits, std::uint64_t number) {
-  std::string text;
-  for (const char byte : noise(digits, number)) text += "0123456789abcdef"[byte & 15];
-  return text;
-}
 
 Data data(std::size_t size, std::uint64_t number) { return Data(noise(size, number)); }
 
@@ -42,42 +23,6 @@ VeskCorvelProtocolPayload unicodePayload() {
       Data(std::string_view("Привет! 今日はとても良い天気ですね。 שלום עולם 😀 Καλημέρα"));
   return record;
 }
-
-/// Gives every field of a record a value, unlike any other field's.
-class Filler {
- public:
-  template <class R>
-  void fill(R& record) {
-    using Fields =
-        typename std::remove_const_t<decltype(records::Table<R>::rows)>::template Fields<R>;
-    Fields::forEach([&](auto field) { value(field.in(record)); });
-  }
-
- private:
-  template <class T>
-  void value(Optional<T>& field) {
-    T inner{};
-    value(inner);
-    field = Optional<T>(std::move(inner));
-  }
-  void value(Int& field) { field = static_cast<Int>(1000 * ++number_); }
-  void value(Int64& field) { field = static_cast<Int64>(1732309874123456789 + ++number_); }
-  void value(Bool& field) { field = (++number_ & 1) != 0; }
-  void value(String& field) { field = String("text-" + hex(34, ++number_)); }
-  void value(Data& field) { field = data(32, ++number_); }
-  template <class T>
-  void value(List<T>& field) {
-    for (int i = 0; i < 3; ++i) value(field.emplace_back());
-  }
-  void value(List<VeskCorvelProtocolPayload>& field) {
-    field.push_back(typicalPayload(static_cast<unsigned>(++number_)));
-  }
-  template <class R>
-  requires requires { typename R::CodingKeys; }
-  void value(R& field) { fill(field); }
-
-  std::uint64_t number_ = 0;
-};
 
 std::vector<Sample> makeSamples() {
   VeskCorvelProtocolPayload min;
@@ -95,6 +40,24 @@ std::vector<Sample> makeSamples() {
 }
 
 }  // namespace
+
+std::string noise(std::size_t size, std::uint64_t number) {
+  std::string bytes;
+  std::uint64_t state = number * 2654435761U + 88172645463325252U;
+  while (bytes.size() < size) {
+    state ^= state << 13;
+    state ^= state >> 7;
+    state ^= state << 17;
+    bytes.push_back(static_cast<char>(state >> 32));
+  }
+  return bytes;
+}
+
+std::string hex(std::size_t digits, std::uint64_t number) {
+  std::string text;
+  for (const char byte : noise(digits, number)) text += "0123456789abcdef"[byte & 15];
+  return text;
+}
 
 VeskCorvelProtocolPayload typicalPayload(unsigned number) {
   VeskCorvelProtocolPayload record;
@@ -127,6 +90,37 @@ const Sample& sample(std::string_view name) {
     if (each.name == name) return each;
   }
   throw std::invalid_argument("no such sample");
+}
+
+std::string asOrdinaryWriters(std::string_view xml) {
+  constexpr std::string_view kStart = "<data>";
+  constexpr std::size_t kWidth = 76;
+  constexpr std::size_t kTab = 8;
+  std::string out;
+  const auto takeUntil = [&](std::string_view mark) {
+    const std::size_t length = std::min(xml.find(mark), xml.size());
+    const std::string_view text = xml.substr(0, length);
+    xml.remove_prefix(length);
+    return text;
+  };
+  out += takeUntil("<plist");
+  out += "<!DOCTYPE plist SYSTEM \"plist.dtd\">\n";
+  for (;;) {
+    out += takeUntil(kStart);
+    if (xml.empty()) return out;
+    xml.remove_prefix(kStart.size());
+    const std::size_t indent = out.size() - 1 - out.rfind('\n');
+    std::string newLine(1 + indent, '\t');
+    newLine[0] = '\n';
+    const std::size_t width = std::max<std::size_t>(16, kWidth - std::min(kWidth, kTab * indent));
+    std::string_view base64 = takeUntil("<");
+    out += kStart;
+    for (; !base64.empty(); base64.remove_prefix(std::min(width / 4 * 4, base64.size()))) {
+      out += newLine;
+      out += base64.substr(0, width / 4 * 4);
+    }
+    out += newLine;
+  }
 }
 
 Data inOneThreadBlock(std::string_view bytes) {

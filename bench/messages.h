@@ -1,5 +1,8 @@
 #pragma once
 
+#include <cstddef>
+#include <cstdint>
+#include <string>
 #include <string_view>
 #include <vector>
 
@@ -24,13 +27,22 @@ const Sample& sample(std::string_view name);
 /// No two payloads of different `number` share a text, data or large integer.
 VeskCorvelProtocolPayload typicalPayload(unsigned number);
 
+/// Bytes that look like a token's, and hexadecimal digits: the same for the same number, always.
+std::string noise(std::size_t size, std::uint64_t number);
+std::string hex(std::size_t digits, std::uint64_t number);
+
 /// The bytes as a message that one thread has to itself, which is how the host makes them.
 Data inOneThreadBlock(std::string_view bytes);
+
+/// A message of our own writer as others put it: with a DOCTYPE, and data in lines of 76 columns.
+std::string asOrdinaryWriters(std::string_view xml);
 
 /// The record as a message, ready to be unpacked.
 template <class R>
 Data messageOf(const R& record, plist::Form form) {
-  return inOneThreadBlock(plist::PropertyListEncoder(form).encode(record).view());
+  const Data message = plist::PropertyListEncoder(form).encode(record);
+  if (form == plist::Form::binary) return inOneThreadBlock(message.view());
+  return inOneThreadBlock(asOrdinaryWriters(message.view()));
 }
 
 /// The record with a last field of the wrong kind: the document is read by then, and the other

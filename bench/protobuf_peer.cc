@@ -2,6 +2,7 @@
 
 #include <google/protobuf/arena.h>
 #include <google/protobuf/message.h>
+#include <google/protobuf/parse_context.h>
 
 #include <cstddef>
 #include <memory>
@@ -71,7 +72,12 @@ class Copier {
 using Payload = peer::VeskCorvelProtocolPayload;
 
 long long parseInto(Payload& message, const std::string& bytes) {
-  if (!message.ParseFromArray(bytes.data(), static_cast<int>(bytes.size()))) {
+  // What ParseFromArray does, but that goes no deeper than 100 messages.
+  constexpr int kDeepest = 1000;
+  const char* at = nullptr;
+  google::protobuf::internal::ParseContext context(kDeepest, false, &at, bytes);
+  at = message._InternalParse(at, &context);
+  if (at == nullptr || !context.EndedAtLimit()) {
     throw std::runtime_error("protobuf refuses its own bytes");
   }
   return message.command();
@@ -79,9 +85,14 @@ long long parseInto(Payload& message, const std::string& bytes) {
 
 }  // namespace
 
-std::string protobufOf(const VeskCorvelProtocolPayload& record) {
+std::string protobufOf(const VeskCorvelProtocolPayload& record, std::size_t unknown) {
+  constexpr int kFirstUnknown = 1000;
   Payload message;
   Copier::copy(record, message);
+  auto* const others = message.GetReflection()->MutableUnknownFields(&message);
+  for (std::size_t i = 0; i < unknown; ++i) {
+    others->AddVarint(kFirstUnknown + static_cast<int>(i), i);
+  }
   return message.SerializeAsString();
 }
 

@@ -1,13 +1,15 @@
 #pragma once
 
+#include <cstddef>
 #include <string>
 
 #include "records/message_payload.h"
 
 namespace ironmoat::bench {
 
-/// The same content as a serialized message of the schema that is made from the records' tables.
-std::string protobufOf(const VeskCorvelProtocolPayload& record);
+/// The same content as a serialized message of the schema that is made from the records' tables,
+/// and so many integers that the schema does not know.
+std::string protobufOf(const VeskCorvelProtocolPayload& record, std::size_t unknown = 0);
 
 /// Each parses one message and destroys it; returns its `command`.
 long long parseProtobuf(const std::string& bytes);

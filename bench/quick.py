@@ -1,10 +1,11 @@
 #!/usr/bin/env python3
 """quick.py GROWTH-PROGRAM: has unpacking become worse in a way that shows on any machine?
 
-Counts allocations and, where there is valgrind, instructions; looks at no clock. Fails when a
-message needs more than it is granted below, when refusing it at its end takes more than twice the
-instructions of accepting it and those of an exception, when instructions or memory grow faster than
-the message, or when allocations come with the number of texts or records.
+Counts allocations and, where there is valgrind, instructions, branches and, as a simple processor
+would, mispredictions; looks at no clock. Fails when a message needs more than it is granted below,
+when refusing it at its end takes more than twice the instructions of accepting it and those of an
+exception, when instructions or memory grow faster than the message, or when allocations come with
+the number of texts or records.
 """
 
 import math
@@ -17,21 +18,38 @@ import tempfile
 
 import growth_table
 
-# message, form: allocations and instructions that it may take. The instructions are what was
-# counted last (g++ 12, -O3) and a fifth more; lower them when they have become far too many.
+COUNTS = ("allocations", "instructions", "branches", "mispredictions")
+# message, form: what one message may take of each, on average over a stream. It is what was counted
+# last (g++ 12, -O3) and a tenth more; of mispredictions a quarter, for they depend on where in
+# memory the branches lie. Lower them when they have become far too many: `quick.py GROWTH-PROGRAM
+# grant` prints them anew.
 GRANTED = {
-    ("min", "binary"): (0, 2_650),
-    ("min", "xml"): (0, 3_560),
-    ("typical", "binary"): (0, 7_950),
-    ("typical", "xml"): (1, 17_100),
-    ("full", "binary"): (17, 112_000),
-    ("full", "xml"): (27, 248_000),
-    ("fanout", "binary"): (11, 3_450_000),
-    ("fanout", "xml"): (31, 8_550_000),
-    ("blob", "binary"): (0, 8_000),
-    ("blob", "xml"): (1, 5_750_000),
-    ("unicode", "binary"): (2, 14_100),
-    ("unicode", "xml"): (1, 21_000),
+    ("min", "binary"): (0, 2520, 680, 23),
+    ("min", "xml"): (0, 3970, 1020, 43),
+    ("typical", "binary"): (0, 7390, 1400, 65),
+    ("typical", "xml"): (1, 16400, 3250, 207),
+    ("full", "binary"): (17, 104000, 16600, 1230),
+    ("full", "xml"): (27, 248000, 47200, 3600),
+    ("fanout", "binary"): (11, 3220000, 691000, 27900),
+    ("fanout", "xml"): (31, 8430000, 2170000, 115000),
+    ("blob", "binary"): (0, 7440, 1400, 69),
+    ("blob", "xml"): (1, 8920000, 1140000, 77400),
+    ("unicode", "binary"): (2, 13100, 2140, 128),
+    ("unicode", "xml"): (1, 20700, 4530, 273),
+    ("lengths", "binary"): (0, 7320, 1390, 72),
+    ("lengths", "xml"): (1.3, 16200, 3270, 200),
+    ("kinds", "binary"): (2.0, 14200, 2500, 212),
+    ("kinds", "xml"): (4.0, 31400, 6180, 494),
+    ("some", "binary"): (0.5, 8790, 1640, 112),
+    ("some", "xml"): (1.8, 19500, 3910, 264),
+    ("order", "binary"): (0, 7490, 1420, 65),
+    ("order", "xml"): (1, 16600, 3360, 183),
+    ("varied", "binary"): (0.5, 8470, 1580, 117),
+    ("varied", "xml"): (1.8, 18900, 3790, 282),
+    ("deep", "binary"): (405, 893000, 221000, 5440),
+    ("deep", "xml"): (416, 1110000, 277000, 9690),
+    ("unknown", "binary"): (2, 754000, 104000, 440),
+    ("unknown", "xml"): (16, 2270000, 633000, 20300),
 }
 REFUSED_AT_MOST = 2.0  # against accepted
 THROWN = 22_000  # one exception through three frames: about 18,000 were counted
@@ -48,24 +66,36 @@ def count(program):
         out = pathlib.Path(folder) / "calls"
         sizes = [str(size) for size in SIZES]
         lines_file = pathlib.Path(folder) / "lines"
-        counter = ["valgrind", "--quiet", "--tool=callgrind", "--toggle-collect=measured",
-                   "--dump-after=measured", f"--callgrind-out-file={out}"]
+        counter = ["valgrind", "--quiet", "--tool=callgrind", "--branch-sim=yes",
+                   "--toggle-collect=measured", "--dump-after=measured",
+                   f"--callgrind-out-file={out}"]
         counted = shutil.which(counter[0]) is not None
         with lines_file.open("w", encoding="utf-8") as lines:
             subprocess.run([*(counter if counted else []), program, *sizes], stdout=lines,
                            check=True)
         found = growth_table.read(lines_file)
         if not counted:
-            print("No valgrind: instructions are not counted.")
+            print("No valgrind: only allocations are counted.")
             return found
         for number, line in enumerate(found, 1):
             dump = pathlib.Path(f"{out}.{number}").read_text(encoding="utf-8")
-            line["instructions"] = int(re.search(r"^totals: (\d+)", dump, re.MULTILINE)[1])
+            events, totals = (re.search(rf"^{what}: (.*)", dump, re.MULTILINE)[1].split()
+                              for what in ("events", "totals"))
+            # callgrind leaves out what is 0 at the end.
+            of = dict(zip(events, map(int, totals + ["0"] * len(events))))
+            for what, parts in (("instructions", ("Ir",)), ("branches", ("Bc", "Bi")),
+                                ("mispredictions", ("Bcm", "Bim"))):
+                line[what] = round(sum(of[part] for part in parts) / line["messages"])
         return found
 
 
+def number(value):
+    return f"{value:,.3g}" if value < 10 else f"{round(value):,}"
+
+
 def faults(lines):
-    accepted = {(line["name"], line["form"]): line for line in lines if line["kind"] == "sample"}
+    accepted = {(line["name"], line["form"]): line for line in lines
+                if line["kind"] in ("sample", "stream")}
     for line in lines:
         if line["kind"] in ("wrong", "broken") and "instructions" in line:
             decoded = line["instructions"] - THROWN
@@ -74,10 +104,9 @@ def faults(lines):
                 yield (f"{line['name']}, {line['form']}, {line['kind']} at its end: {decoded:,} "
                        f"instructions before it throws, {ratio:.2f} times what accepting takes")
     for line in accepted.values():
-        allocations, instructions = GRANTED[line["name"], line["form"]]
-        for what, most in (("allocations", allocations), ("instructions", instructions)):
+        for what, most in zip(COUNTS, GRANTED[line["name"], line["form"]]):
             if line.get(what, 0) > most:
-                yield f"{line['name']}, {line['form']}: {line[what]:,} {what}, granted {most:,}"
+                yield f"{line['name']}, {line['form']}: {number(line[what])} {what}, granted {most:,}"
     for (name, form), points in growth_table.curves(lines).items():
         for what in ("instructions", "peak"):
             if what not in points[0]:
@@ -94,12 +123,30 @@ def faults(lines):
                        f"{point['bytes']:,} bytes, granted {most:.0f}")
 
 
+def grants(lines):
+    """The table above as it would be now."""
+    for line in lines:
+        if line["kind"] in ("sample", "stream"):
+            mean = line["allocations"]
+            counts = [round(mean) if mean == round(mean) else math.ceil(mean * 12) / 10]
+            for what in COUNTS[1:]:
+                exact = line[what] * (1.25 if what == "mispredictions" else 1.1)
+                unit = 10 ** max(0, math.floor(math.log10(exact)) - 2)
+                counts.append(math.ceil(exact / unit) * unit)
+            print(f"    {line['name'], line['form']}: ({', '.join(map(str, counts))}),"
+                  .replace("'", '"'))
+
+
 def main():
     lines = count(sys.argv[1])
+    if sys.argv[2:] == ["grant"]:
+        return grants(lines)
+    print(f"| one message | form | bytes | {' | '.join(COUNTS)} | most heap, bytes |")
+    print("|---" * (len(COUNTS) + 4) + "|")
     for line in lines:
-        print(f"{line['kind']:<7}{line['name']:<14}{line['form']:<8}{line['bytes']:>10,} bytes"
-              f"{line.get('instructions', 0):>12,} instructions{line['allocations']:>6} allocations"
-              f"{line['peak']:>12,} bytes of heap")
+        if line["kind"] in ("sample", "stream"):
+            cells = [number(line.get(what, 0)) for what in ("bytes", *COUNTS, "peak")]
+            print(f"| {line['name']} | {line['form']} | {' | '.join(cells)} |")
     found = list(faults(lines))
     for fault in found:
         print(f"FAULT {fault}", file=sys.stderr)

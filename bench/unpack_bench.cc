@@ -1,9 +1,8 @@
-// Time of unpacking each sample, and of what other parsers need for the same content, in one
-// process and one run: scripts/bench runs it and makes the table.
+// Time of unpacking each sample and each stream, and of what other parsers need for the same
+// content, in one process and one run: scripts/bench runs it and makes the table.
 
 #include <benchmark/benchmark.h>
 
-#include <cstring>
 #include <string>
 #include <vector>
 
@@ -12,72 +11,76 @@
 #include "plist/property_list_decoder.h"
 #include "protobuf_peer.h"
 #include "records/message_payload.h"
+#include "streams.h"
 #include "unpackers/corvel_payload_unpacker.h"
 #include "xml_peers.h"
 
 namespace ironmoat::bench {
 namespace {
 
-template <class Function>
-void add(std::string_view message, std::string_view what, Function once, std::size_t bytes) {
-  const std::string name = std::string(message) + "/" + std::string(what);
-  benchmark::RegisterBenchmark(name.c_str(), [once, bytes](benchmark::State& state) mutable {
-    for (auto _ : state) benchmark::DoNotOptimize(once());
-    state.counters["bytes"] = static_cast<double>(bytes);
+/// `once(message)` for each of the messages in turn.
+template <class Message, class Function>
+void add(std::string_view name, std::string_view what, std::vector<Message> messages,
+         Function once) {
+  std::size_t bytes = 0;
+  for (const Message& message : messages) bytes += message.size();
+  const std::string full = std::string(name) + "/" + std::string(what);
+  benchmark::RegisterBenchmark(full.c_str(), [=](benchmark::State& state) {
+    std::size_t next = 0;
+    for (auto _ : state) {
+      benchmark::DoNotOptimize(once(messages[next]));
+      if (++next == messages.size()) next = 0;
+    }
+    state.counters["bytes"] = static_cast<double>(bytes / messages.size());
   });
 }
 
-void addForm(const Sample& sample, plist::Form form) {
-  const Data message = messageOf(sample.record, form);
+Int unpack(const Data& message) { return VeskCorvelPayloadUnpacker().unpack(message).command; }
+
+void addForm(std::string_view name, const std::vector<Data>& messages, plist::Form form) {
   const std::string prefix = std::string(nameOf(form)) + "/";
-  const std::size_t size = message.size();
-  add(
-      sample.name, prefix + "unpack",
-      [message] { return VeskCorvelPayloadUnpacker().unpack(message).command; }, size);
-  add(
-      sample.name, prefix + "copy_and_unpack",
-      [bytes = std::string(message.view())] {
-        return VeskCorvelPayloadUnpacker().unpack(inOneThreadBlock(bytes)).command;
-      },
-      size);
-  const auto addRefused = [&](const char* what, const Data& bad) {
-    add(
-        sample.name, prefix + what,
-        [bad] {  // what depends on the message: throwing takes the same time for each
-          VeskCorvelProtocolPayload wire;
-          return plist::PropertyListDecoder().decode(bad, wire).value().kind();
-        },
-        bad.size());
-  };
-  addRefused("wrong", messageOf(WrongAtLast{sample.record}, form));
-  addRefused("broken", brokenAtLast(message, form));
-  add(
-      sample.name, prefix + "memcpy",
-      [bytes = std::string(message.view()), to = std::vector<char>(size)]() mutable {
-        std::memcpy(to.data(), bytes.data(), bytes.size());
-        benchmark::ClobberMemory();
-        return to.data();
-      },
-      size);
+  std::vector<std::string> texts;
+  for (const Data& message : messages) texts.emplace_back(message.view());
+  add(name, prefix + "unpack", messages, unpack);
+  add(name, prefix + "copy_and_unpack", texts,
+      [](const std::string& text) { return unpack(inOneThreadBlock(text)); });
   if (form != plist::Form::xml) return;
-  const std::string text(message.view());
-  add(
-      sample.name, "expat", [text] { return expatEvents(text); }, size);
-  add(
-      sample.name, "pugixml", [text] { return pugixmlDom(text); }, size);
+  add(name, "expat", texts, expatEvents);
+  add(name, "pugixml", texts, pugixmlDom);
+}
+
+void addProtobuf(std::string_view name, const std::vector<std::string>& messages) {
+  add(name, "protobuf", messages, parseProtobuf);
+  add(name, "protobuf_arena", messages, parseProtobufInArena);
+  add(name, "protobuf_warm_arena", messages, parseProtobufInWarmArena);
 }
 
 void addSample(const Sample& sample) {
-  addForm(sample, plist::Form::binary);
-  addForm(sample, plist::Form::xml);
-  const std::string bytes = protobufOf(sample.record);
-  add(
-      sample.name, "protobuf", [bytes] { return parseProtobuf(bytes); }, bytes.size());
-  add(
-      sample.name, "protobuf_arena", [bytes] { return parseProtobufInArena(bytes); }, bytes.size());
-  add(
-      sample.name, "protobuf_warm_arena", [bytes] { return parseProtobufInWarmArena(bytes); },
-      bytes.size());
+  for (const plist::Form form : {plist::Form::binary, plist::Form::xml}) {
+    const Data message = messageOf(sample.record, form);
+    addForm(sample.name, {message}, form);
+    const auto addRefused = [&](const char* what, const Data& bad) {
+      add(sample.name, std::string(nameOf(form)) + what, std::vector{bad}, [](const Data& refused) {
+        // What depends on the message: throwing takes the same time for each.
+        VeskCorvelProtocolPayload wire;
+        return plist::PropertyListDecoder().decode(refused, wire).value().kind();
+      });
+    };
+    addRefused("/wrong", messageOf(WrongAtLast{sample.record}, form));
+    addRefused("/broken", brokenAtLast(message, form));
+  }
+  addProtobuf(sample.name, {protobufOf(sample.record)});
+}
+
+void addStream(const Stream& stream) {
+  for (const plist::Form form : {plist::Form::binary, plist::Form::xml}) {
+    addForm(stream.name, messagesOf(stream, form), form);
+  }
+  std::vector<std::string> messages;
+  for (const auto& record : stream.records) {
+    messages.push_back(protobufOf(record, stream.unknownKeys));
+  }
+  addProtobuf(stream.name, messages);
 }
 
 }  // namespace
@@ -86,7 +89,9 @@ void addSample(const Sample& sample) {
 int main(int argc, char** argv) {
   // For everyone alike: large blocks are kept, not given back to the kernel after each message.
   ironmoat::confinement::prepareMemory();
+  constexpr std::size_t kStream = 2048;
   for (const auto& sample : ironmoat::bench::samples()) ironmoat::bench::addSample(sample);
+  for (const auto& stream : ironmoat::bench::streams(kStream)) ironmoat::bench::addStream(stream);
   benchmark::Initialize(&argc, argv);
   benchmark::RunSpecifiedBenchmarks();
 }
