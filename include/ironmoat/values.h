@@ -61,6 +61,13 @@ class Slice {
     }
   }
 
+  /// What `other` holds, its reference included: `other` ends without being destroyed.
+  static constexpr Slice takenFrom(const Slice& other) noexcept {
+    Slice slice;
+    slice.range_ = other.range_;
+    return slice;
+  }
+
   static constexpr Slice absent() noexcept {
     Slice slice;
     slice.range_ = kAbsent;
@@ -198,10 +205,14 @@ struct SliceNiche {
 template <>
 struct Niche<String> : SliceNiche<String> {
   static bool isAbsent(const String& value) noexcept { return value.slice_.isAbsent(); }
+  static String takenFrom(const String& value) noexcept {
+    return String(Slice::takenFrom(value.slice_));
+  }
 };
 template <>
 struct Niche<Data> : SliceNiche<Data> {
   static bool isAbsent(const Data& value) noexcept { return value.slice_.isAbsent(); }
+  static Data takenFrom(const Data& value) noexcept { return Data(Slice::takenFrom(value.slice_)); }
 };
 
 }  // namespace detail

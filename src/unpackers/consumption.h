@@ -59,8 +59,8 @@ class Consumable {
     }
   }
   /// The arguments of the current record's output, `converted` among them; ends the record: what
-  /// was converted is destroyed here, and every other field moved from, after which it owns nothing
-  /// (argumentOf checks it). Requires !done().
+  /// was converted is destroyed here, and every other field taken, or moved from, after which it
+  /// owns nothing (argumentOf checks it). Requires !done().
   template <class Output, class Converted>
   typename Output::Arguments consume(Converted&& converted) noexcept {
     auto& record = current();
@@ -68,7 +68,7 @@ class Consumable {
     std::remove_cvref_t<Converted>::Fields::forEach([&]<class Part>(Part) {
       std::destroy_at(&detail::FieldNamed<std::remove_cvref_t<decltype(record)>, Part>::in(record));
     });
-    return argumentsFrom<Output>(std::move(record), std::forward<Converted>(converted));
+    return detail::argumentsFrom<Output, detail::Wires::abandoned>(record, converted);
   }
 
  private:

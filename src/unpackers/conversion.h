@@ -69,11 +69,14 @@ inline constexpr bool ownsNothingOnceMovedFrom<List<T>> = true;
 template <class T>
 inline constexpr bool ownsNothingOnceMovedFrom<Optional<T>> = ownsNothingOnceMovedFrom<T>;
 
+/// What happens to the wire record afterwards: it is destroyed, or left as it is.
+enum class Wires { destroyed, abandoned };
+
 /// What argument `Argument` is made of: the converted part of its name, else the wire field of its
-/// name, which must be of exactly its type. An rvalue reference, so that the argument is made from
-/// it in place (by way of a temporary each of 150 would cost two copies).
-template <class Argument, class Wire, class Converted>
-auto&& argumentOf(Wire& wire, Converted& converted) noexcept {
+/// name, which must be of exactly its type. The argument is made of it in place (by way of a
+/// temporary each of 150 would cost two copies).
+template <class Argument, Wires wires, class Wire, class Converted>
+decltype(auto) argumentOf(Wire& wire, Converted& converted) noexcept {
   using Part = FieldNamed<Converted, Argument>;
   using Same = FieldNamed<Wire, Argument>;
   static_assert(!std::is_void_v<Same>, "no wire field has this argument's name");
@@ -85,8 +88,24 @@ auto&& argumentOf(Wire& wire, Converted& converted) noexcept {
                   "the wire field of this argument's name is of another type");
     static_assert(ownsNothingOnceMovedFrom<typename Same::Type>,
                   "nobody destroys the wire field of this argument's name");
-    return std::move(Same::in(wire));
+    if constexpr (wires == Wires::abandoned &&
+                  requires { Same::Type::takenFrom(Same::in(wire)); }) {
+      return Same::Type::takenFrom(Same::in(wire));
+    } else {
+      return std::move(Same::in(wire));
+    }
   }
+}
+
+template <class Output, Wires wires, class Wire, class Converted>
+typename Output::Arguments argumentsFrom(Wire& wire, Converted& converted) noexcept {
+  using Arguments = typename Output::Arguments;
+  return [&]<auto... Members>(FieldList<Arguments, Members...>) {
+    static_assert(sizeof...(Members) == FieldsOf<Wire>::Type::count,
+                  "a wire field has no argument");
+    return Arguments{argumentOf<Field<Members>, wires>(wire, converted)...};
+  }
+  (typename Arguments::Fields());
 }
 
 }  // namespace detail
@@ -96,13 +115,7 @@ auto&& argumentOf(Wire& wire, Converted& converted) noexcept {
 template <class Output, class Wire, class Converted = NothingConverted>
 typename Output::Arguments argumentsFrom(Wire&& wire, Converted&& converted = {}) noexcept {
   static_assert(std::is_rvalue_reference_v<Wire&&>);
-  using Arguments = typename Output::Arguments;
-  return [&]<auto... Members>(FieldList<Arguments, Members...>) {
-    static_assert(sizeof...(Members) == detail::FieldsOf<Wire>::Type::count,
-                  "a wire field has no argument");
-    return Arguments{detail::argumentOf<Field<Members>>(wire, converted)...};
-  }
-  (typename Arguments::Fields());
+  return detail::argumentsFrom<Output, detail::Wires::destroyed>(wire, converted);
 }
 
 }  // namespace ironmoat
