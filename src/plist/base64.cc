@@ -92,12 +92,22 @@ void decodeSixteens(const char*&, const char*, char*&) noexcept {}
 /// past what was written. Returns null, or where the text is wrong.
 const char* decode(const char* at, const char* end, char*& out, Base64Way way) noexcept {
   for (;;) {
+    at = skipSpace(at, end);  // between two lines, mostly
     if (way == Base64Way::shuffles) decodeSixteens(at, end, out);
     for (; end - at >= 8; at += 8, out += 6) {
       const std::uint32_t first = groupBits(at);
       const std::uint32_t second = groupBits(at + 4);
       if (((first | second) & kForeign) != 0) break;
       putTwoGroups(first, second, out);
+    }
+    // The last four of a line: what follows is no foreign character, but the next line.
+    if (end - at >= 4) {
+      const std::uint32_t group = groupBits(at);
+      if ((group & kForeign) == 0) {
+        out = putBytes(group, 3, out);
+        at += 4;
+        continue;
+      }
     }
     // Something else is near, or the end: one group, character by character.
     std::uint32_t group = 0;
