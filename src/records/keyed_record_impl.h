@@ -3,6 +3,8 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <type_traits>
+#include <variant>
 
 #include "plist/decoder.h"
 #include "plist/encoder.h"
@@ -23,26 +25,39 @@ constexpr bool wellFormed() {
       });
 }
 
+template <class Container, class T, class Keys>
+[[nodiscard]] bool decodeField(const Container& container, T& field, Keys key) {
+  if constexpr (detail::isRequired<T>) {
+    return container.decode(field, key);
+  } else {
+    // forEach visits a key that is not required only when it has an entry. Said to the compiler,
+    // this saves a second test of it for each field; a sanitized build checks.
+    if (!container.contains(key)) __builtin_unreachable();
+    return container.decodeIfPresent(field, key);
+  }
+}
+
 template <class R>
 [[nodiscard]] bool decodeFields(const plist::Decoder& decoder, R& record) {
   static_assert(wellFormed<R>());
   using Keys = typename R::CodingKeys;
   using Container = plist::KeyedDecodingContainer<Keys>;
+  // A scalar by its type, of which there are few: calls to a function for each of 150 fields no
+  // processor foretells, nor do so many functions stay in its caches.
   using DecodeOne = bool (*)(const Container&, R&, Keys);
-  static constexpr auto decodeOne = detail::overMembers(
+  using Way = std::variant<Optional<String> R::*, Optional<Data> R::*, Optional<Int> R::*,
+                           Optional<Int64> R::*, Optional<Bool> R::*, Int R::*, DecodeOne>;
+  static constexpr auto ways = detail::overMembers(
       Table<R>::rows, []<auto... Members>() {
-        return std::array<DecodeOne, Keys::count>{
-            [](const Container& container, R& into, Keys key) {
-              if constexpr (detail::isRequired<typename Field<Members>::Type>) {
-                return container.decode(into.*Members, key);
-              } else {
-                // forEach visits a key that is not required only when it has an entry. Said to the
-                // compiler, this saves a second test of it for each field; a sanitized build
-                // checks.
-                if (!container.contains(key)) __builtin_unreachable();
-                return container.decodeIfPresent(into.*Members, key);
-              }
-            }...};
+        return std::array<Way, Keys::count>{[] {
+          if constexpr (std::is_constructible_v<Way, decltype(Members)>) {
+            return Way(Members);
+          } else {
+            return Way(DecodeOne([](const Container& container, R& into, Keys key) {
+              return decodeField(container, into.*Members, key);
+            }));
+          }
+        }()...};
       });
   static constexpr auto required = detail::overMembers(
       Table<R>::rows, []<auto... Members>() {
@@ -57,7 +72,14 @@ template <class R>
       });
   const auto container = decoder.container<Keys>();
   return container && container.forEach(required, [&](Keys key) {
-    return decodeOne[key.index()](container, record, key);
+    const auto by = [&](auto way) {
+      if constexpr (std::is_member_pointer_v<decltype(way)>) {
+        return decodeField(container, record.*way, key);
+      } else {
+        return way(container, record, key);
+      }
+    };
+    return std::visit(by, ways[key.index()]);
   });
 }
 
