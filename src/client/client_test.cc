@@ -434,6 +434,22 @@ TEST_F(ClientTest, ReplacesProcessesWithoutARequestNoticing) {
   EXPECT_EQ(slow.stats().retired, 1U) << "answers just in time, again and again";
 }
 
+TEST_F(ClientTest, LoopSleepsWhileARequestIsHeldBack) {
+  Client::Options all = fake();
+  all.processes = 1;
+  Loop loop(all);
+  loop.submit("echo 0");
+  loop.run(1);
+  loop.submit("slow 300");
+  for (int i = 0; i < 5; ++i) loop.submit("echo 1");
+  loop.client().dispatch();
+  loop.submit("echo 1");
+  loop.client().dispatch();
+  pollfd ready = {loop.client().fd(), POLLIN, 0};
+  EXPECT_EQ(::poll(&ready, 1, 50), 0) << "nothing to do before the slow one has its reply";
+  loop.run(8);
+}
+
 TEST_F(ClientTest, CountsWhatItDoes) {
   Client client(fake(200ms));
   for (const char* message : {"echo 1", "echo 2", "refuse", "exit 1", "hang", "notServed"}) {

@@ -197,7 +197,7 @@ void Connection::wait() noexcept {
   std::array<pollfd, 2> fds = {{{-1, POLLIN, 0}, {-1, POLLIN, 0}}};
   if (process_) {
     fds[0].fd = process_->service.socket();
-    if (channel_.hasUnsent()) fds[0].events |= POLLOUT;
+    if (channel_.isWorthSending()) fds[0].events |= POLLOUT;
     fds[1].fd = process_->service.endedFd();
   }
   ::poll(fds.data(), fds.size(), millisecondsUntil(channel_.wakeAt()));
@@ -206,7 +206,7 @@ void Connection::wait() noexcept {
 }
 
 void Connection::watch() noexcept {
-  const unsigned wanted = EPOLLIN | (channel_.hasUnsent() ? unsigned{EPOLLOUT} : 0U);
+  const unsigned wanted = EPOLLIN | (channel_.isWorthSending() ? unsigned{EPOLLOUT} : 0U);
   if (watched_ == wanted) return;
   epoll_event event = {};
   event.events = wanted;
