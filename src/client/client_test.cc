@@ -434,6 +434,26 @@ TEST_F(ClientTest, ReplacesProcessesWithoutARequestNoticing) {
   EXPECT_EQ(slow.stats().retired, 1U) << "answers just in time, again and again";
 }
 
+TEST_F(ClientTest, KeepsAProcessThatCannotBeReplaced) {
+  Client::Options old = fake();
+  old.program = fakeCalled("passing");
+  old.processes = old.requestsPerProcess = 1;
+  Loop loop(old);
+  loop.submit("echo 1");
+  EXPECT_EQ(loop.run(1)[0], "1");
+  std::filesystem::remove(old.program);
+  int answered = 0;
+  const auto until = std::chrono::steady_clock::now() + 5s;
+  for (int i = 1; i <= 5; ++i) {
+    loop.client().submit<VeskCommandResponse>(Data("echo 2"), [&](const Outcome& outcome) {
+      EXPECT_EQ(inWords(outcome), "2");
+      ++answered;
+    });
+    while (answered < i && std::chrono::steady_clock::now() < until) loop.client().dispatch();
+  }
+  EXPECT_EQ(answered, 5);
+}
+
 TEST_F(ClientTest, LoopSleepsWhileARequestIsHeldBack) {
   Client::Options all = fake();
   all.processes = 1;

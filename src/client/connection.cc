@@ -142,8 +142,10 @@ void Connection::dismiss() noexcept {
 }
 
 bool Connection::isDue(TimePoint now) const noexcept {
-  return successor_ != nullptr || channel_.answered() >= settings_.requestsPerProcess ||
-         now - startedAt_ >= settings_.processLifetime || channel_.slowInARow() >= kSlowInARow;
+  if (successor_ != nullptr) return true;
+  return now >= renewAfter_ &&
+         (channel_.answered() >= settings_.requestsPerProcess ||
+          now - startedAt_ >= settings_.processLifetime || channel_.slowInARow() >= kSlowInARow);
 }
 
 bool Connection::wantsRest(TimePoint now) noexcept {
@@ -170,7 +172,7 @@ void Connection::renew() noexcept {
     }
   } catch (const std::exception&) {  // not to be had now: the present one goes on
     successor_.reset();
-    startedAt_ = now;
+    renewAfter_ = now + kRenewPause;
   }
 }
 

@@ -45,6 +45,7 @@ class Connection {
  private:
   static constexpr auto kGrace = std::chrono::milliseconds(100);
   static constexpr unsigned kSlowInARow = 3;
+  static constexpr auto kRenewPause = std::chrono::seconds(1);  // after a successor that failed
 
   struct Process {
     explicit Process(ServiceProcess started)
@@ -72,6 +73,7 @@ class Connection {
   std::unique_ptr<Process> successor_;
   bool successorGreeted_ = false;
   TimePoint startedAt_{};
+  TimePoint renewAfter_{};
   unsigned watched_ = 0;  // events of the socket that `epoll_` waits for; 0: not in it
   frames::Spin spin_;
 };
