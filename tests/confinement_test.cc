@@ -2,6 +2,7 @@
 
 #include "confinement/confinement.h"
 
+#include <alloca.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/mman.h>
@@ -21,6 +22,8 @@
 #include <map>
 #include <ostream>
 #include <string>
+
+#include "confinement/memory.h"
 
 namespace ironmoat::confinement {
 namespace {
@@ -267,6 +270,21 @@ TEST_F(ConfinementTest, DropsCapabilities) {
   }
   kill(child, SIGKILL);
   waitpid(child, nullptr, 0);
+}
+
+/// The pages that are released end below the frames in use, wherever in a page those lie.
+TEST(WipeMemory, LeavesTheStackInUse) {
+  for (std::size_t offset = 0; offset < 4096; offset += 16) {
+    EXPECT_EQ(outcomeOf([&] {
+                prepareMemory();
+                auto* const moved = static_cast<volatile char*>(alloca(offset + 16));
+                moved[0] = 0;
+                wipeAndReleaseMemory();
+                return long{moved[0]};
+              }),
+              "returned")
+        << offset;
+  }
 }
 
 }  // namespace

@@ -32,12 +32,18 @@ std::uintptr_t stackEnd = 0;        // the lowest address that belongs to the st
   stackEnd = reinterpret_cast<std::uintptr_t>(below);
 }
 
-/// Overwrites what lies just below the caller's frame and releases the pages below that.
-[[gnu::noinline]] void wipeStack() noexcept {
-  volatile char below[2 * kPage];
+[[gnu::noinline]] void overwriteStack() noexcept {
+  volatile char below[3 * kPage];
   for (volatile char& byte : below) byte = 0;
+}
+
+/// Overwrites what lies just below the caller's frame and releases the pages below that, but for
+/// the frames of the call that releases them.
+[[gnu::noinline]] void wipeStack() noexcept {
+  overwriteStack();
+  volatile char here = 0;
   const std::uintptr_t first = (stackEnd + kPage - 1) / kPage * kPage;
-  const std::uintptr_t last = reinterpret_cast<std::uintptr_t>(below) / kPage * kPage;
+  const std::uintptr_t last = (reinterpret_cast<std::uintptr_t>(&here) - kPage) / kPage * kPage;
   if (stackEnd == 0 || first >= last) return;
   ::madvise(reinterpret_cast<void*>(first), last - first, MADV_DONTNEED);
 }
