@@ -48,25 +48,19 @@ std::unique_ptr<Connection> Pool::leaseFor(std::shared_ptr<Request> request) {
   return connection;
 }
 
-/// The connection used last, or a new one; null when all are in use.
+/// The connection used last, or a new one; null when all are in use. A new one is made under the
+/// lock: whoever finds all in use then waits for one that there is.
 std::unique_ptr<Connection> Pool::takeIdle() {
-  {
-    Lock lock(mutex_);
-    if (!idle_.empty()) {
-      std::unique_ptr<Connection> connection = std::move(idle_.back().connection);
-      idle_.pop_back();
-      return connection;
-    }
-    if (made_ == settings_.processes) return nullptr;
-    ++made_;
+  Lock lock(mutex_);
+  if (!idle_.empty()) {
+    std::unique_ptr<Connection> connection = std::move(idle_.back().connection);
+    idle_.pop_back();
+    return connection;
   }
-  try {
-    return std::make_unique<Connection>(settings_, counters_);
-  } catch (...) {
-    Lock lock(mutex_);
-    --made_;
-    throw;
-  }
+  if (made_ == settings_.processes) return nullptr;
+  auto connection = std::make_unique<Connection>(settings_, counters_);
+  ++made_;
+  return connection;
 }
 
 void Pool::begin(Connection& connection, std::shared_ptr<Request> request) noexcept {
