@@ -43,6 +43,7 @@ void SharedEngine::submit(std::shared_ptr<SubmittedRequest> request) {
     }
   }
   if (first || completions_ > 0) threadWakes_.notify_one();
+  if (!driven_) passOn();  // to one that came to wait while this thread drove
 }
 
 bool SharedEngine::hasRoom(std::size_t bytes) const {
@@ -92,14 +93,18 @@ void SharedEngine::drive(TimePoint until) noexcept {
 
 void SharedEngine::driveOrWait(Lock& lock, const SubmittedRequest* request, TimePoint until) {
   if (!driven_ && !stopping_) return drive(until);
-  Waiter self{request, {}};
-  waiters_.push_back(&self);
+  Waiter self{request, {}, nullptr};
+  Waiter** place = &firstWaiter_;
+  while (*place != nullptr) place = &(*place)->next;
+  *place = &self;
   if (until == TimePoint::max()) {
     lock.wait(self.changed);
   } else {
     lock.waitUntil(self.changed, until);
   }
-  waiters_.erase(std::find(waiters_.begin(), waiters_.end(), &self));
+  place = &firstWaiter_;
+  while (*place != &self) place = &(*place)->next;
+  *place = self.next;
 }
 
 bool SharedEngine::await(const SubmittedRequest& request, TimePoint until) {
@@ -113,7 +118,7 @@ bool SharedEngine::await(const SubmittedRequest& request, TimePoint until) {
 }
 
 void SharedEngine::passOn() noexcept {
-  if (!waiters_.empty()) waiters_.front()->changed.notify_one();
+  if (firstWaiter_ != nullptr) firstWaiter_->changed.notify_one();
 }
 
 void SharedEngine::publish(RequestList finished) noexcept {
@@ -127,7 +132,7 @@ void SharedEngine::publish(RequestList finished) noexcept {
     --completions_;
     completed_.push(std::move(request));
   }
-  for (Waiter* const waiter : waiters_) {
+  for (Waiter* waiter = firstWaiter_; waiter != nullptr; waiter = waiter->next) {
     if (waiter->request == nullptr || waiter->request->isDone()) waiter->changed.notify_one();
   }
   if (!completed_.empty()) threadWakes_.notify_one();

@@ -6,7 +6,6 @@
 #include <cstdint>
 #include <memory>
 #include <thread>
-#include <vector>
 
 #include "client/engine.h"
 #include "client/mutex.h"
@@ -60,10 +59,12 @@ class SharedEngine {
  private:
   static constexpr auto kTick = std::chrono::milliseconds(10);
 
-  /// A thread that waits for an outcome, or for room, and does not drive.
+  /// A thread that waits for an outcome, or for room, and does not drive. In a list that takes no
+  /// memory: a thread that failed to wait for its turn would hold up all that come after it.
   struct Waiter {
     const SubmittedRequest* request;  // null: for room
     std::condition_variable changed;
+    Waiter* next;
   };
 
   void startThread() IRONMOAT_REQUIRES(mutex_);
@@ -93,9 +94,9 @@ class SharedEngine {
   bool asleep_ IRONMOAT_GUARDED_BY(mutex_) = false;  // whoever drives waits for the descriptor
   bool stopping_ IRONMOAT_GUARDED_BY(mutex_) = false;
   std::uint64_t drives_ IRONMOAT_GUARDED_BY(mutex_) = 0;
-  std::vector<Waiter*> waiters_ IRONMOAT_GUARDED_BY(mutex_);
-  RequestList completed_ IRONMOAT_GUARDED_BY(mutex_);        // to be delivered by the thread
-  std::size_t completions_ IRONMOAT_GUARDED_BY(mutex_) = 0;  // in flight
+  Waiter* firstWaiter_ IRONMOAT_GUARDED_BY(mutex_) = nullptr;  // the one that came first
+  RequestList completed_ IRONMOAT_GUARDED_BY(mutex_);          // to be delivered by the thread
+  std::size_t completions_ IRONMOAT_GUARDED_BY(mutex_) = 0;    // in flight
   std::condition_variable threadWakes_;
 
   std::size_t inFlight_ IRONMOAT_GUARDED_BY(mutex_) = 0;
