@@ -67,7 +67,8 @@ class IRONMOAT_API EventLoopClient {
   template <MessageSchema R>
   Handle submit(const Data& message, std::function<void(Outcome<R>)> completion,
                 Deadline deadline = {});
-  /// Drops the request: its completion will not be called. False if it was called before.
+  /// Drops the request: its completion will not be called. False if it was called before, or
+  /// dropped.
   bool cancel(const Handle& handle);
 
   [[nodiscard]] Stats stats() const noexcept;

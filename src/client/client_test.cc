@@ -513,6 +513,16 @@ TEST_F(ClientTest, CancelsARequestOfALoop) {
   EXPECT_EQ(outcomes[1] + outcomes[2], "");
   EXPECT_EQ(outcomes[3] + outcomes[4], "78");
   EXPECT_FALSE(loop.client().cancel(done));
+  EXPECT_FALSE(loop.client().cancel(inFlight)) << "once is enough";
+  bool cancelledItself = true;
+  EventLoopClient::Handle own;
+  own = loop.client().submit<VeskCommandResponse>(Data("echo 9"), [&](const Outcome&) {
+    cancelledItself = loop.client().cancel(own);
+    loop.client().submit<VeskCommandResponse>(Data("echo 10"), [](const Outcome&) {});
+  });
+  loop.submit("echo 11");
+  loop.run(4);
+  EXPECT_FALSE(cancelledItself);
   EXPECT_EQ(loop.client().stats().cancelled, 1U) << "the other has not been answered yet";
 }
 

@@ -36,7 +36,8 @@ namespace {
 class LoopRequest : public Request {
  public:
   using Request::Request;
-  virtual void dropCompletion() noexcept = 0;
+  /// Returns whether it was there: neither called, nor being called, nor dropped.
+  virtual bool dropCompletion() noexcept = 0;
 };
 
 template <MessageSchema R>
@@ -50,7 +51,7 @@ class LoopRequestFor final : public client::RecordRequest<R, LoopRequest> {
   void deliver() noexcept override {
     if (const auto completion = std::exchange(completion_, nullptr)) completion(this->take());
   }
-  void dropCompletion() noexcept override { completion_ = nullptr; }
+  bool dropCompletion() noexcept override { return std::exchange(completion_, nullptr) != nullptr; }
 
  private:
   const client::InFlight counted_;
@@ -103,8 +104,7 @@ EventLoopClient::Handle EventLoopClient::submit(const Data& message,
 
 bool EventLoopClient::cancel(const Handle& handle) {
   const auto request = std::static_pointer_cast<LoopRequest>(handle.request_.lock());
-  if (request == nullptr) return false;
-  request->dropCompletion();
+  if (request == nullptr || !request->dropCompletion()) return false;
   if (!core_->forkMark.inCopy()) core_->engine.cancel(*request);
   return true;
 }
