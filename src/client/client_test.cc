@@ -470,6 +470,22 @@ TEST_F(ClientTest, LoopSleepsWhileARequestIsHeldBack) {
   loop.run(8);
 }
 
+TEST_F(ClientTest, ACompletionThatSubmitsAtTheEndOfItsClientIsHeard) {
+  std::string outcomes;
+  {
+    Client client(fake());
+    client.submit<VeskCommandResponse>(Data("hang"), [&](const Outcome&) {
+      const auto started = client.stats().started;
+      client.submit<VeskCommandResponse>(
+          Data("echo 1"), [&](const Outcome& outcome) { outcomes += inWords(outcome); });
+      EXPECT_EQ(client.stats().started, started);
+      EXPECT_EQ(outcomes, "unavailable: the client was destroyed");
+    });
+    std::this_thread::sleep_for(20ms);
+  }
+  EXPECT_EQ(outcomes, "unavailable: the client was destroyed");
+}
+
 TEST_F(ClientTest, CountsWhatItDoes) {
   Client client(fake(200ms));
   for (const char* message : {"echo 1", "echo 2", "refuse", "exit 1", "hang", "notServed"}) {

@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <string_view>
 #include <system_error>
 #include <utility>
 
@@ -17,12 +18,21 @@ namespace {
 
 constexpr std::size_t kOverhead = 512;  // about what comes with a message until its outcome
 
+constexpr std::string_view kDestroyed = "the client was destroyed";
+
 std::size_t cost(const Request& request) noexcept { return request.message().size() + kOverhead; }
 
 }  // namespace
 
 void SharedEngine::submit(std::shared_ptr<SubmittedRequest> request) {
   Lock lock(mutex_);
+  if (stopping_) {
+    lock.unlock();
+    Failure failure = serviceError(ServiceError::Kind::unavailable, kDestroyed);
+    counters_.count(&failure);
+    request->fail(std::move(failure));
+    return complete(*request);
+  }
   if (!thread_.joinable()) startThread();
   const std::size_t bytes = cost(*request);
   // A completion that submits runs on the thread that makes room: it does not wait.
@@ -184,7 +194,7 @@ void SharedEngine::stop() noexcept {
   while (driven_) lock.waitUntil(threadWakes_, Clock::now() + std::chrono::milliseconds(1));
   RequestList unsent(std::move(submitted_));
   while (std::shared_ptr<Request> request = unsent.pop()) engine_->add(std::move(request));
-  engine_->stop("the client was destroyed");
+  engine_->stop(kDestroyed);
   publish(std::move(engine_->finished()));
   RequestList completed(std::move(completed_));
   lock.unlock();
