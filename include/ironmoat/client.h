@@ -56,8 +56,9 @@ class IRONMOAT_API Client {
   /// in flight. `message` is shared, not copied.
   template <MessageSchema R>
   [[nodiscard]] Pending<R> submit(const Data& message, Deadline deadline = {});
-  /// Calls `completion` on the client's thread. It must not throw, and everything submitted waits
-  /// until it returns. It may submit, which does not wait there, but not destroy the client.
+  /// Calls `completion` on the client's thread. It must not throw, wait for another outcome or
+  /// destroy the client. It may submit, which does not wait there; but after `unavailable` it
+  /// should not at once, since that is also what the end of the client gives.
   template <MessageSchema R>
   void submit(const Data& message, std::function<void(Outcome<R>)> completion,
               Deadline deadline = {});

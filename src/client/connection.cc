@@ -20,6 +20,11 @@ using namespace std::chrono_literals;
 namespace {
 
 constexpr Clock::duration kMinStartTime = 2s;
+/// That a process may take to send its hello.
+Clock::duration startTime(const Settings& settings) noexcept {
+  return std::max(settings.deadline, kMinStartTime);
+}
+
 constexpr int kReadsInARow = 4;         // before anything else is looked at
 constexpr std::size_t kMaxParts = 128;  // of a write
 
@@ -27,7 +32,7 @@ constexpr std::size_t kMaxParts = 128;  // of a write
 
 Connection::Connection(const Settings& settings, Counters& counters, int epoll)
     : settings_(settings),
-      channel_(std::max(settings.deadline, kMinStartTime), counters),
+      channel_(startTime(settings), counters),
       epoll_(epoll) {}
 
 Connection::~Connection() {
@@ -149,7 +154,7 @@ bool Connection::isDue(TimePoint now) const noexcept {
 }
 
 bool Connection::wantsRest(TimePoint now) noexcept {
-  if (!process_ || !isDue(now)) return false;
+  if (channel_.state() != Channel::State::ready || !isDue(now)) return false;
   try {
     return !successor_ || hasSuccessor();
   } catch (const std::exception&) {
@@ -164,6 +169,7 @@ void Connection::renew() noexcept {
     if (!successor_) {
       successor_ = std::make_unique<Process>(ServiceProcess::start(settings_.program));
       successorGreeted_ = false;
+      successorStartedAt_ = now;
     } else if (hasSuccessor()) {
       unwatch();
       process_ = std::move(successor_);
@@ -178,6 +184,9 @@ void Connection::renew() noexcept {
 
 bool Connection::hasSuccessor() {
   if (successorGreeted_) return true;
+  if (Clock::now() - successorStartedAt_ > startTime(settings_)) {
+    throw StartError("sent no hello before the start deadline", false);
+  }
   if (readSome(*successor_) == Received::end) throw StartError("ended before its hello", false);
   if (const std::optional<Data> body = successor_->assembler.next()) {
     requireUsable(frames::parseHello(*body));

@@ -72,6 +72,7 @@ class Connection {
   std::unique_ptr<Process> process_;
   std::unique_ptr<Process> successor_;
   bool successorGreeted_ = false;
+  TimePoint successorStartedAt_{};
   TimePoint startedAt_{};
   TimePoint renewAfter_{};
   unsigned watched_ = 0;  // events of the socket that `epoll_` waits for; 0: not in it

@@ -100,7 +100,7 @@ bool Engine::takes(const Member& member, const Request& request, TimePoint now) 
   const Channel& channel = member.connection->channel();
   if (channel.isClosed() || channel.isRetrying() || member.connection->wantsRest(now)) return false;
   if (channel.empty()) return true;
-  return !member.hasLarge && !isLarge(request) && channel.size() < Channel::kWindow &&
+  return !member.hasLarge && !isLarge(request) && !request.isRetried() && channel.size() < Channel::kWindow &&
          now < channel.stalledAt(kPatience);
 }
 

@@ -52,6 +52,9 @@ class Request {
   [[nodiscard]] const Data& message() const noexcept { return message_; }
   [[nodiscard]] Clock::duration deadline() const noexcept { return deadline_; }
 
+  /// It has lost a process, and is to be alone in the next one.
+  [[nodiscard]] bool isRetried() const noexcept { return losses_ > 0; }
+
   /// Takes the outcome out of a reply; returns the failure, or null for a record. Throws
   /// frames::RecordError or frames::FrameError when no service sends such a reply: the request is
   /// then still without an outcome.

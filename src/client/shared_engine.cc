@@ -40,6 +40,9 @@ void SharedEngine::submit(std::shared_ptr<SubmittedRequest> request) {
     const std::uint64_t ticket = nextTicket_++;
     while (ticket != admitted_ || !hasRoom(bytes)) driveOrWait(lock, nullptr, TimePoint::max());
     ++admitted_;
+    for (Waiter* next = firstWaiter_; next != nullptr; next = next->next) {
+      if (next->request == nullptr) next->changed.notify_one();  // there may be room for more
+    }
   }
   bytesInFlight_ += bytes;
   if (request->hasCompletion_) ++completions_;

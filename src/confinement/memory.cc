@@ -24,6 +24,7 @@ constexpr std::size_t kStack = std::size_t{2} << 20;
 
 constexpr std::uintptr_t kPage = 4096;
 constexpr int kTopPad = 128 << 10;  // by which the heap grows at least
+std::uintptr_t pageSize = kPage;
 std::uintptr_t stackEnd = 0;        // the lowest address that belongs to the stack for certain
 
 [[gnu::noinline]] void growStack() noexcept {
@@ -42,8 +43,9 @@ std::uintptr_t stackEnd = 0;        // the lowest address that belongs to the st
 [[gnu::noinline]] void wipeStack() noexcept {
   overwriteStack();
   volatile char here = 0;
-  const std::uintptr_t first = (stackEnd + kPage - 1) / kPage * kPage;
-  const std::uintptr_t last = (reinterpret_cast<std::uintptr_t>(&here) - kPage) / kPage * kPage;
+  const std::uintptr_t first = (stackEnd + pageSize - 1) / pageSize * pageSize;
+  const std::uintptr_t last =
+      (reinterpret_cast<std::uintptr_t>(&here) - kPage) / pageSize * pageSize;
   if (stackEnd == 0 || first >= last) return;
   ::madvise(reinterpret_cast<void*>(first), last - first, MADV_DONTNEED);
 }
@@ -83,6 +85,7 @@ void prepareMemory() noexcept {
     stack.rlim_cur = std::min<rlim_t>(stack.rlim_max, 2 * kStack);
     ::setrlimit(RLIMIT_STACK, &stack);
   }
+  pageSize = static_cast<std::uintptr_t>(::sysconf(_SC_PAGESIZE));
   growStack();
 }
 
