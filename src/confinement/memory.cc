@@ -51,14 +51,14 @@ std::uintptr_t stackEnd = 0;        // the lowest address that belongs to the st
 }
 
 /// Where the heap ends. No system call.
-const void* heapEnd() noexcept { return ::sbrk(0); }
+[[maybe_unused]] const void* heapEnd() noexcept { return ::sbrk(0); }
 
 struct Piece {
   Piece* next;
 };
 
 /// Overwrites free pieces of `size` bytes and puts them before `taken`, until the heap would grow.
-Piece* overwritePieces(std::size_t size, Piece* taken) noexcept {
+[[maybe_unused]] Piece* overwritePieces(std::size_t size, Piece* taken) noexcept {
   for (;;) {
     const void* const end = heapEnd();
     void* const memory = std::malloc(size);
