@@ -31,9 +31,7 @@ constexpr std::size_t kMaxParts = 128;  // of a write
 }  // namespace
 
 Connection::Connection(const Settings& settings, Counters& counters, int epoll)
-    : settings_(settings),
-      channel_(startTime(settings), counters),
-      epoll_(epoll) {}
+    : settings_(settings), channel_(startTime(settings), counters), epoll_(epoll) {}
 
 Connection::~Connection() {
   if (process_) dismiss();

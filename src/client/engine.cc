@@ -100,8 +100,8 @@ bool Engine::takes(const Member& member, const Request& request, TimePoint now) 
   const Channel& channel = member.connection->channel();
   if (channel.isClosed() || channel.isRetrying() || member.connection->wantsRest(now)) return false;
   if (channel.empty()) return true;
-  return !member.hasLarge && !isLarge(request) && !request.isRetried() && channel.size() < Channel::kWindow &&
-         now < channel.stalledAt(kPatience);
+  return !member.hasLarge && !isLarge(request) && !request.isRetried() &&
+         channel.size() < Channel::kWindow && now < channel.stalledAt(kPatience);
 }
 
 Engine::Member* Engine::memberFor(const Request& request, TimePoint now) noexcept {

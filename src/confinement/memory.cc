@@ -25,7 +25,7 @@ constexpr std::size_t kStack = std::size_t{2} << 20;
 constexpr std::uintptr_t kPage = 4096;
 constexpr int kTopPad = 128 << 10;  // by which the heap grows at least
 std::uintptr_t pageSize = kPage;
-std::uintptr_t stackEnd = 0;        // the lowest address that belongs to the stack for certain
+std::uintptr_t stackEnd = 0;  // the lowest address that belongs to the stack for certain
 
 [[gnu::noinline]] void growStack() noexcept {
   volatile char below[kStack];
