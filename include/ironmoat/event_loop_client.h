@@ -18,8 +18,9 @@ namespace client {
 class Request;
 }
 
-/// The client for a daemon with an event loop of its own: no thread, no blocking call, completions
-/// on the thread that calls `dispatch`.
+/// The client for a daemon with an event loop of its own: no thread, completions on the thread that
+/// calls `dispatch`. Blocks only after the loss of a process, for its exit status: microseconds as a
+/// rule, at most 100 ms, or a second if the process cannot be killed.
 ///
 ///     loop:
 ///       poll `fd()` for reading, for at most `timeout()`
