@@ -132,7 +132,8 @@ class CommandLine(InFolder):
         hidden = ["unshare", "-m", "sh", "-c", 'mount -t tmpfs none /proc && exec "$@"', "sh"]
         if run(*hidden, "true").returncode == 0:
             result = run(*hidden, tool, "../good", cwd="open")
-            self.assertIn(b"../good", result.stdout + result.stderr)
+            if b"AddressSanitizer" not in result.stderr:  # which cannot do without /proc
+                self.assertIn(b"../good", result.stdout + result.stderr)
         self.assertFalse(os.path.exists("ran") or os.path.exists("open/ran"))
 
     def test_rejects_messages_that_are_too_long_without_reading_them_whole(self):
