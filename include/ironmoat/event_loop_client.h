@@ -19,8 +19,8 @@ class Request;
 }
 
 /// The client for a daemon with an event loop of its own: no thread, completions on the thread that
-/// calls `dispatch`. Blocks only after the loss of a process, for its exit status: microseconds as a
-/// rule, at most 100 ms, or a second if the process cannot be killed.
+/// calls `dispatch`. Blocks only after the loss of a process, for its exit status: microseconds as
+/// a rule, at most 100 ms, or a second if the process cannot be killed.
 ///
 ///     loop:
 ///       poll `fd()` for reading, for at most `timeout()`

@@ -37,7 +37,9 @@ class [[nodiscard]] Outcome {
 
   /// The record; throws the error when there is none.
   R value() && {
-    if (error() != nullptr) std::visit([](const auto& thrown) { throw thrown; }, *error());
+    if (error() != nullptr) {
+      std::visit([](const auto& thrown) { throw thrown; }, *error());  // NOLINT(cert-err60-cpp)
+    }
     return *std::move(*this);
   }
 

@@ -47,6 +47,7 @@ std::uintptr_t stackEnd = 0;  // the lowest address that belongs to the stack fo
   const std::uintptr_t last =
       (reinterpret_cast<std::uintptr_t>(&here) - kPage) / pageSize * pageSize;
   if (stackEnd == 0 || first >= last) return;
+  // NOLINTNEXTLINE(performance-no-int-to-ptr): a page by its number
   ::madvise(reinterpret_cast<void*>(first), last - first, MADV_DONTNEED);
 }
 
