@@ -78,7 +78,7 @@ void Channel::startClock(TimePoint now) noexcept {
 void Channel::started(TimePoint now) noexcept {
   state_ = State::greeting;
   greetBy_ = now + startTime_;
-  counters_.started.add();
+  counters_.add(&Stats::started);
 }
 
 void Channel::startFailed(std::string_view why, bool lasting, TimePoint now) noexcept {
@@ -91,7 +91,7 @@ void Channel::receive(const Data& body, TimePoint now) {
   if (state_ == State::greeting) {
     const frames::Hello hello = frames::parseHello(body);
     requireUsable(hello);
-    if (hasLimitedMemory(hello)) counters_.limitedMemory.add();
+    if (hasLimitedMemory(hello)) counters_.add(&Stats::limitedMemory);
     state_ = State::ready;
     return startClock(now);
   }
@@ -120,7 +120,7 @@ std::shared_ptr<Request> Channel::popFront() noexcept {
 }
 
 void Channel::finish(std::shared_ptr<Request> request) noexcept {
-  if (request->cancelled_) counters_.cancelled.add();
+  if (request->cancelled_) counters_.add(&Stats::cancelled);
   finished_.push(std::move(request));
 }
 
@@ -151,7 +151,7 @@ bool Channel::blame(const Loss& loss) noexcept {
 }
 
 void Channel::lost(const Loss& loss, TimePoint now) noexcept {
-  counters_.ended.add();
+  counters_.add(&Stats::ended);
   if (std::exchange(state_, State::absent) == State::greeting) {
     return startFailed(loss.what, loss.why == Loss::Why::violation, now);
   }
@@ -169,7 +169,7 @@ void Channel::lost(const Loss& loss, TimePoint now) noexcept {
     }
     if (request->losses_ < 2) ++request->losses_;
     if (restartClocks) request->due_ = {};
-    counters_.retried.add();
+    counters_.add(&Stats::retried);
     retried.push(std::move(request));
   }
   retried.append(std::move(requests_));
@@ -190,14 +190,14 @@ void Channel::resetProcess() noexcept {
 
 void Channel::dismissed() noexcept {
   state_ = State::absent;
-  counters_.ended.add();
+  counters_.add(&Stats::ended);
   resetProcess();
 }
 
 void Channel::replaced() noexcept {
-  counters_.started.add();
-  counters_.ended.add();
-  counters_.retired.add();
+  counters_.add(&Stats::started);
+  counters_.add(&Stats::ended);
+  counters_.add(&Stats::retired);
   resetProcess();
 }
 

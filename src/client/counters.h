@@ -1,8 +1,11 @@
 #pragma once
 
+#include <array>
 #include <atomic>
+#include <bit>
 #include <cstddef>
 #include <cstdint>
+#include <type_traits>
 #include <variant>
 
 #include "client/request.h"
@@ -10,83 +13,59 @@
 
 namespace ironmoat::client {
 
-/// The running totals behind `Stats`. Any thread may add and read; each is exact by itself, and
-/// nothing is ordered by them (relaxed).
+/// A `Stats` that any thread may add to and read. Each number is exact by itself; nothing is
+/// ordered by them (relaxed).
 class Counters {
  public:
-  class Counter {
-   public:
-    void add(std::uint64_t n = 1) noexcept { value_.fetch_add(n, std::memory_order_relaxed); }
-    void subtract(std::uint64_t n) noexcept { value_.fetch_sub(n, std::memory_order_relaxed); }
-    [[nodiscard]] std::uint64_t get() const noexcept {
-      return value_.load(std::memory_order_relaxed);
-    }
+  using Number = std::uint64_t Stats::*;
 
-   private:
-    std::atomic<std::uint64_t> value_ = 0;
-  };
-
-  Counter accepted;
-  Counter rejected[Stats::kRejectionKinds];
-  Counter crashed;
-  Counter timedOut;
-  Counter unavailable;
-  Counter outOfMemory;
-  Counter cancelled;
-  Counter retried;
-  Counter started;
-  Counter ended;
-  Counter retired;
-  Counter limitedMemory;
-  Counter inFlight;
-  Counter bytesInFlight;
+  void add(Number number, std::uint64_t n = 1) noexcept { add(stats_.*number, n); }
+  void subtract(Number number, std::uint64_t n = 1) noexcept { add(stats_.*number, 0 - n); }
 
   /// An outcome: null for a record.
   void count(const Failure* failure) noexcept {
-    if (failure == nullptr) return accepted.add();
+    if (failure == nullptr) return add(&Stats::accepted);
     if (const auto* const error = std::get_if<DecodingError>(failure)) {
-      return rejected[static_cast<std::size_t>(error->kind())].add();
+      return add(stats_.rejected[static_cast<std::size_t>(error->kind())], 1);
     }
     const auto* const error = std::get_if<ServiceError>(failure);
-    if (error == nullptr) return outOfMemory.add();
-    (error->kind() == ServiceError::Kind::crashed    ? crashed
-     : error->kind() == ServiceError::Kind::timedOut ? timedOut
-                                                     : unavailable)
-        .add();
+    if (error == nullptr) return add(&Stats::outOfMemory);
+    add(error->kind() == ServiceError::Kind::crashed    ? &Stats::crashed
+        : error->kind() == ServiceError::Kind::timedOut ? &Stats::timedOut
+                                                        : &Stats::unavailable);
   }
 
-  [[nodiscard]] Stats snapshot() const noexcept {
-    Stats stats;
-    stats.accepted = accepted.get();
-    for (std::size_t i = 0; i < Stats::kRejectionKinds; ++i) stats.rejected[i] = rejected[i].get();
-    stats.crashed = crashed.get();
-    stats.timedOut = timedOut.get();
-    stats.unavailable = unavailable.get();
-    stats.outOfMemory = outOfMemory.get();
-    stats.cancelled = cancelled.get();
-    stats.retried = retried.get();
-    stats.started = started.get();
-    stats.ended = ended.get();
-    stats.retired = retired.get();
-    stats.limitedMemory = limitedMemory.get();
-    stats.inFlight = inFlight.get();
-    stats.bytesInFlight = bytesInFlight.get();
-    return stats;
+  [[nodiscard]] Stats snapshot() noexcept {
+    static_assert(std::is_trivially_copyable_v<Stats>);
+    std::array<std::uint64_t, sizeof(Stats) / sizeof(std::uint64_t)> numbers{};
+    static_assert(sizeof numbers == sizeof(Stats), "every member is a number of 64 bits");
+    auto* number = reinterpret_cast<std::uint64_t*>(&stats_);
+    for (std::uint64_t& each : numbers) {
+      each = std::atomic_ref(*number++).load(std::memory_order_relaxed);
+    }
+    return std::bit_cast<Stats>(numbers);
   }
+
+ private:
+  static void add(std::uint64_t& number, std::uint64_t n) noexcept {
+    std::atomic_ref(number).fetch_add(n, std::memory_order_relaxed);
+  }
+
+  Stats stats_;
 };
 
 /// Counts a request for as long as it has no outcome.
 class InFlight {
  public:
   InFlight(Counters& counters, std::size_t bytes) noexcept : counters_(counters), bytes_(bytes) {
-    counters_.inFlight.add();
-    counters_.bytesInFlight.add(bytes_);
+    counters_.add(&Stats::inFlight);
+    counters_.add(&Stats::bytesInFlight, bytes_);
   }
   InFlight(const InFlight&) = delete;
   InFlight& operator=(const InFlight&) = delete;
   ~InFlight() {
-    counters_.inFlight.subtract(1);
-    counters_.bytesInFlight.subtract(bytes_);
+    counters_.subtract(&Stats::inFlight);
+    counters_.subtract(&Stats::bytesInFlight, bytes_);
   }
 
  private:

@@ -19,7 +19,7 @@ Engine::Engine(const Settings& settings, Counters& counters)
 void Engine::cancel(Request& request) noexcept {
   for (Request* each = waiting_.front(); each != nullptr; each = RequestList::after(*each)) {
     if (each != &request) continue;
-    counters_.cancelled.add();
+    counters_.add(&Stats::cancelled);
     return finished_.push(waiting_.remove(request));
   }
   const TimePoint now = Clock::now();
