@@ -5,10 +5,10 @@
 
 #include <string_view>
 
-#include "client/service_process.h"
 #include "frames/frame.h"
 #include "frames/frame_assembler.h"
 #include "frames/record_codec.h"
+#include "process/service_process.h"
 #include "support/fault_load.h"
 
 namespace ironmoat::testing {
@@ -40,7 +40,7 @@ constexpr std::size_t kMostMemory = frames::kSanitizedBuild ? 4096 : 256;  // Mi
 /// Writes first, until nothing more is taken; then reads a little at a time. The server neither
 /// grows nor gives up.
 TEST_F(FaultsTest, APeerThatHardlyReads) {
-  const auto server = client::ServiceProcess::start(TEST_SERVER);
+  const auto server = process::ServiceProcess::start(TEST_SERVER);
   const pid_t pid = [] {
     std::ifstream children("/proc/self/task/" + std::to_string(::getpid()) + "/children");
     pid_t child = 0;

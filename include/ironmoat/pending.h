@@ -13,7 +13,7 @@ namespace ironmoat {
 
 namespace client {
 struct Core;
-class SubmittedRequest;
+class Request;
 }  // namespace client
 
 /// The outcome-to-be of a request, used as a std::future is.
@@ -58,11 +58,11 @@ class IRONMOAT_API Pending {
   using Clock = std::chrono::steady_clock;
   using Seconds = std::chrono::duration<long double>;  // no time overflows it
 
-  Pending(std::shared_ptr<client::SubmittedRequest> request, std::shared_ptr<client::Core> core)
+  Pending(std::shared_ptr<client::Request> request, std::shared_ptr<client::Core> core)
       : request_(std::move(request)), core_(std::move(core)) {}
   std::future_status waitUntil(Clock::time_point until) const;
 
-  std::shared_ptr<client::SubmittedRequest> request_;
+  std::shared_ptr<client::Request> request_;
   std::shared_ptr<client::Core> core_;
 };
 

@@ -1,8 +1,12 @@
 #include "client/channel.h"
 
+#include <sys/random.h>
+
+#include <algorithm>
+#include <iterator>
 #include <utility>
 
-#include "client/greeting.h"
+#include "frames/confinement_bits.h"
 #include "frames/frame.h"
 
 namespace ironmoat::client {
@@ -14,65 +18,81 @@ namespace {
 constexpr auto kFirstBackOff = 10ms;  // doubled four times: five starts take 150 ms
 constexpr unsigned kMaxDoublings = 4;
 
-/// "the service sent a broken frame over this message: ...", the reason last.
-Failure crashed(const Loss& loss) noexcept {
-  const std::string text = textOrNone([&] {
-    std::string made = "the service " + loss.what;
-    const std::size_t reason =
-        loss.why == Loss::Why::violation ? made.find(": ") : std::string::npos;
-    return made.insert(std::min(reason, made.size()), " over this message");
-  });
-  return serviceError(ServiceError::Kind::crashed, text);
+// Messages up to kMaxCopied bytes are copied into one piece with their neighbours, as long as that
+// has less than kBatch.
+constexpr std::size_t kBatch = std::size_t{64} << 10;
+constexpr std::size_t kMaxCopied = std::size_t{16} << 10;
+
+bool has(const frames::Hello& hello, frames::Confinement part) noexcept {
+  return (hello.confinement & static_cast<std::uint32_t>(part)) != 0;
 }
 
-std::size_t frameSize(const Request& request) noexcept {
-  return frames::requestHeadBytes(request.outputType()) + request.message().size();
+void requireUsable(const frames::Hello& hello) {
+  frames::Hello expected = frames::Hello::ours();
+  expected.confinement = hello.confinement;
+  if (hello != expected) throw frames::FrameError("its limits differ from this library's");
+  for (const auto& [part, name, required] : frames::kConfinementNames) {
+    const bool isRequired = (frames::kRequiredConfinement & static_cast<std::uint32_t>(part)) != 0;
+    if (isRequired && !has(hello, part)) {
+      throw frames::FrameError("its sandbox lacks: " + std::string(name));
+    }
+  }
+}
+
+/// "the service sent a broken frame over this message: ...", the reason last.
+Failure crashed(const Loss& loss) noexcept {
+  return serviceError(ServiceError::Kind::crashed, [&] {
+    std::string text = "the service " + loss.what;
+    const bool hasReason = loss.why == Loss::Why::violation;
+    const std::size_t reason = hasReason ? text.find(": ") : std::string::npos;
+    return text.insert(std::min(reason, text.size()), " over this message");
+  });
 }
 
 }  // namespace
 
+std::uint64_t RequestIds::next() noexcept {
+  if (left_ == 0) {
+    // 256 bytes come whole. A kernel that has none to give leaves ids that are merely different.
+    if (::getrandom(pool_.data(), sizeof pool_, 0) != static_cast<ssize_t>(sizeof pool_)) {
+      for (std::uint64_t& id : pool_) ++id;
+    }
+    left_ = pool_.size();
+  }
+  const std::uint64_t id = pool_[--left_];
+  return id == 0 ? next() : id;
+}
+
 Channel::Channel(Clock::duration startTime, Counters& counters)
     : startTime_(startTime), counters_(counters) {
-  staged_.reserve(kAtOnce * (frames::kMaxRequestHead + kWorthCopying));
+  encoded_.reserve(kBatch + frames::kMaxRequestHead + kMaxCopied);  // encoding never allocates
 }
 
-void Channel::add(std::shared_ptr<Request> request, TimePoint now) noexcept {
-  if (unsent_ == nullptr) unsent_ = request.get();
-  requests_.push(std::move(request));
-  if (++size_ == 1) startClock(now);
-}
-
-void Channel::cancel(Request& request, TimePoint now) noexcept {
-  request.cancelled_ = true;
-  Request* unsent = unsent_;
-  if (unsent != nullptr && sentOfNext_ > 0) unsent = RequestList::after(*unsent);
-  while (unsent != nullptr && unsent != &request) unsent = RequestList::after(*unsent);
-  if (unsent == nullptr) return;  // sent: its place in the order of replies stays
-  if (unsent_ == &request) unsent_ = RequestList::after(request);
-  const bool wasFront = requests_.front() == &request;
-  --size_;
-  finish(requests_.remove(request));
-  if (wasFront) startClock(now);
+void Channel::add(RequestList requests, TimePoint now) noexcept {
+  const bool first = requests_.empty();
+  const auto added = requests.begin();
+  append(requests_, requests);
+  if (unsent_ == requests_.end()) unsent_ = added;
+  if (first) startClock(now);
 }
 
 RequestList Channel::takeFollowers() noexcept {
-  std::shared_ptr<Request> front = requests_.pop();
-  RequestList followers(std::move(requests_));
-  requests_.push(std::move(front));
+  RequestList followers;
+  followers.splice(followers.end(), requests_, std::next(requests_.begin()), requests_.end());
   closed_ = true;
-  wasShared_ = begun() > 1;
-  size_ = inFlight_ = 1;
-  unsent_ = nullptr;
-  sentOfNext_ = 0;
+  wasShared_ = inFlight_ > 1;
+  if (wasShared_) tail_ = {};  // of a follower
+  inFlight_ = 1;
+  unsent_ = requests_.end();
   return followers;
 }
 
-/// Called when the front of a ready process is another one.
+/// To be called whenever another request is the front of a ready process.
 void Channel::startClock(TimePoint now) noexcept {
   if (state_ != State::ready || requests_.empty()) return;
   Request& front = *requests_.front();
   frontSince_ = now;
-  if (front.due_ == TimePoint()) front.due_ = now + front.deadline_;
+  if (front.due_ == TimePoint()) front.due_ = now + front.deadline();
 }
 
 void Channel::started(TimePoint now) noexcept {
@@ -91,62 +111,40 @@ void Channel::receive(const Data& body, TimePoint now) {
   if (state_ == State::greeting) {
     const frames::Hello hello = frames::parseHello(body);
     requireUsable(hello);
-    if (hasLimitedMemory(hello)) counters_.add(&Stats::limitedMemory);
+    if (!has(hello, frames::Confinement::fullMemory)) counters_.add(&Stats::limitedMemory);
     state_ = State::ready;
     return startClock(now);
   }
   const frames::Reply reply = frames::parseReply(body);
-  if (inFlight_ == 0 || reply.id != requests_.front()->id_) {
-    throw frames::FrameError("a reply to no request");
-  }
-  Request& front = *requests_.front();
-  if (!front.cancelled_) counters_.count(front.resolve(reply));
-  slowInARow_ = now - frontSince_ > front.deadline_ / 2 ? slowInARow_ + 1 : 0;
+  // A long message is sent from where it is: it must not be released before it is sent.
+  const bool isSent = inFlight_ > 1 || (inFlight_ == 1 && tail_.empty());
+  if (!isSent || reply.id != front().id_) throw frames::FrameError("a reply to no request");
+  requests_.front()->resolve(reply);
+  slowInARow_ = now - frontSince_ > front().deadline() / 2 ? slowInARow_ + 1 : 0;
   ++answered_;
   startFailures_ = 0;
   --inFlight_;
-  finish(popFront());
+  finished_.splice(finished_.end(), requests_, requests_.begin());
   startClock(now);
 }
 
-std::shared_ptr<Request> Channel::popFront() noexcept {
-  std::shared_ptr<Request> request = requests_.pop();
-  if (unsent_ == request.get()) {
-    unsent_ = requests_.front();
-    sentOfNext_ = 0;
-  }
-  --size_;
-  return request;
-}
-
-void Channel::finish(std::shared_ptr<Request> request) noexcept {
-  if (request->cancelled_) counters_.add(&Stats::cancelled);
-  finished_.push(std::move(request));
-}
-
-void Channel::fail(std::shared_ptr<Request> request, Failure failure) noexcept {
-  if (!request->cancelled_) {
-    counters_.count(&failure);
-    request->fail(std::move(failure));
-  }
-  finish(std::move(request));
-}
-
 void Channel::failAll(std::string_view why) noexcept {
-  while (!requests_.empty()) {
-    fail(popFront(), serviceError(ServiceError::Kind::unavailable, why));
-  }
+  client::failAll(requests_, finished_, why);
+  forgetProcess();
 }
 
 /// Takes the front out if it fails by rule 1 or 2.
-bool Channel::blame(const Loss& loss) noexcept {
-  if (begun() == 1 && !wasShared_ && loss.why == Loss::Why::deadline) {
-    fail(popFront(), serviceError(ServiceError::Kind::timedOut, loss.what));
-  } else if (begun() > 0 && given_ == 1 && requests_.front()->losses_ > 0) {
-    fail(popFront(), crashed(loss));
+bool Channel::blame(RequestList& suspects, const Loss& loss) noexcept {
+  if (suspects.empty()) return false;
+  Request& front = *suspects.front();
+  if (suspects.size() == 1 && !wasShared_ && loss.why == Loss::Why::deadline) {
+    front.fail(serviceError(ServiceError::Kind::timedOut, [&] { return loss.what; }));
+  } else if (given_ == 1 && front.isRetried()) {
+    front.fail(crashed(loss));
   } else {
     return false;
   }
+  finished_.splice(finished_.end(), suspects, suspects.begin());
   return true;
 }
 
@@ -155,61 +153,55 @@ void Channel::lost(const Loss& loss, TimePoint now) noexcept {
   if (std::exchange(state_, State::absent) == State::greeting) {
     return startFailed(loss.what, loss.why == Loss::Why::violation, now);
   }
-  std::size_t suspects = begun();
-  const bool blamed = blame(loss);
-  if (blamed) --suspects;
-  const bool restartClocks = suspects > 1 || loss.why == Loss::Why::deadline;
+  RequestList suspects;
+  suspects.splice(suspects.end(), requests_, requests_.begin(),
+                  std::next(requests_.begin(), static_cast<std::ptrdiff_t>(inFlight_)));
+  const bool blamed = blame(suspects, loss);
+  const bool restartClocks = suspects.size() > 1 || loss.why == Loss::Why::deadline;
   RequestList retried;
-  for (; suspects > 0; --suspects) {
-    std::shared_ptr<Request> request = requests_.pop();
-    if (request->cancelled_) {
-      --size_;
-      finish(std::move(request));
-      continue;
-    }
-    if (request->losses_ < 2) ++request->losses_;
-    if (restartClocks) request->due_ = {};
+  while (!suspects.empty()) {
+    Request& request = *suspects.front();
+    if (request.isCancelled()) request.drop();
+    RequestList& to = request.isDone() ? finished_ : retried;
+    to.splice(to.end(), suspects, suspects.begin());
+    if (request.isDone()) continue;
+    if (request.losses_ < 2) ++request.losses_;
+    if (restartClocks) request.due_ = {};
     counters_.add(&Stats::retried);
-    retried.push(std::move(request));
   }
-  retried.append(std::move(requests_));
-  requests_.append(std::move(retried));
+  requests_.splice(requests_.begin(), retried);
   const bool failedStart = answered_ == 0 && !blamed;
-  resetProcess();
+  forgetProcess();
   if (!failedStart) return;
   startFailed(textOrNone([&] { return "the service " + loss.what + " before its first reply"; }),
               false, now);
 }
 
-void Channel::resetProcess() noexcept {
-  unsent_ = requests_.front();
-  sentOfNext_ = inFlight_ = 0;
+void Channel::dismissed() noexcept {
+  state_ = State::absent;
+  counters_.add(&Stats::ended);
+  forgetProcess();
+}
+
+void Channel::forgetProcess() noexcept {
+  unsent_ = requests_.begin();
+  encoded_.truncate(0);
+  tail_ = {};
+  encodedSent_ = inFlight_ = 0;
   given_ = answered_ = slowInARow_ = 0;
   closed_ = wasShared_ = false;
 }
 
-void Channel::dismissed() noexcept {
-  state_ = State::absent;
-  counters_.add(&Stats::ended);
-  resetProcess();
-}
-
-void Channel::replaced() noexcept {
-  counters_.add(&Stats::started);
-  counters_.add(&Stats::ended);
-  counters_.add(&Stats::retired);
-  resetProcess();
-}
-
 std::optional<Loss> Channel::expire(TimePoint now) noexcept {
-  if (const Request* const front = requests_.front();
-      front != nullptr && front->due_ != TimePoint() && now >= front->due_) {
+  if (!empty() && front().due_ != TimePoint() && now >= front().due_) {
     std::string what = textOrNone([&] {
-      const auto limit = std::chrono::duration_cast<std::chrono::milliseconds>(front->deadline_);
+      const auto limit = std::chrono::duration_cast<std::chrono::milliseconds>(front().deadline());
       return "no reply within " + std::to_string(limit.count()) + " ms";
     });
     if (state_ == State::ready) return Loss{Loss::Why::deadline, std::move(what)};
-    fail(popFront(), serviceError(ServiceError::Kind::timedOut, what));
+    requests_.front()->fail(serviceError(ServiceError::Kind::timedOut, [&] { return what; }));
+    finished_.splice(finished_.end(), requests_, requests_.begin());
+    unsent_ = requests_.begin();
   }
   if (state_ != State::greeting || now < greetBy_) return std::nullopt;
   return Loss{Loss::Why::violation,
@@ -219,60 +211,39 @@ std::optional<Loss> Channel::expire(TimePoint now) noexcept {
 TimePoint Channel::wakeAt() const noexcept {
   TimePoint at = TimePoint::max();
   if (state_ == State::greeting) at = greetBy_;
-  if (requests_.empty()) return at;
+  if (empty()) return at;
   if (state_ == State::absent) at = nextStart_;
-  const TimePoint due = requests_.front()->due_;
-  return due == TimePoint() ? at : std::min(at, due);
+  return front().due_ == TimePoint() ? at : std::min(at, front().due_);
 }
 
-std::size_t Channel::gather(std::span<iovec> parts) noexcept {
-  if (!hasUnsent()) return 0;
-  staged_.truncate(0);
-  char* const staged = staged_.bytes();  // stays where it is: there is room for all
-  std::size_t used = 0;
-  std::size_t partStart = 0;  // of the staged part under way
-  const auto endPart = [&] {
-    if (staged_.size() == partStart) return;
-    parts[used++] = {staged + partStart, staged_.size() - partStart};
-    partStart = staged_.size();
-  };
-  std::size_t room = std::min(kAtOnce, window() - inFlight_);
-  for (Request* request = unsent_; request != nullptr && room > 0 && parts.size() - used >= 2;
-       request = RequestList::after(*request), --room) {
-    if (request != unsent_ || sentOfNext_ == 0) request->id_ = ids_.next();
-    const std::string_view message = request->message().view();
-    frames::appendRequestHead(staged_, request->id_, request->outputType(), message.size());
-    if (message.size() <= kWorthCopying) {
-      staged_.append(message);
-    } else {
-      endPart();
-      parts[used++] = {const_cast<char*>(message.data()), message.size()};
-    }
+void Channel::encodeNext() noexcept {
+  Request& request = **unsent_++;
+  const std::string_view message = request.message().view();
+  request.id_ = ids_.next();
+  frames::appendRequestHead(encoded_, request.id_, request.outputType(), message.size());
+  if (message.size() <= kMaxCopied) {
+    encoded_.append(message);
+  } else {
+    tail_ = message;
   }
-  endPart();
-  std::size_t skip = sentOfNext_;
-  for (std::size_t i = 0; skip > 0; ++i) {
-    const std::size_t skipped = std::min(skip, parts[i].iov_len);
-    parts[i].iov_base = static_cast<char*>(parts[i].iov_base) + skipped;
-    parts[i].iov_len -= skipped;
-    skip -= skipped;
+  ++inFlight_;
+  ++given_;
+}
+
+std::array<iovec, 2> Channel::output() noexcept {
+  if (!hasEncoded()) {
+    encoded_.truncate(0);
+    encodedSent_ = 0;
+    while (canEncode() && tail_.empty() && encoded_.size() < kBatch) encodeNext();
   }
-  return used;
+  return {{{encoded_.bytes() + encodedSent_, encoded_.size() - encodedSent_},
+           {const_cast<char*>(tail_.data()), tail_.size()}}};
 }
 
 void Channel::sent(std::size_t bytes) noexcept {
-  while (bytes > 0) {
-    if (sentOfNext_ == 0) ++given_;
-    const std::size_t left = frameSize(*unsent_) - sentOfNext_;
-    if (bytes < left) {
-      sentOfNext_ += bytes;
-      return;
-    }
-    bytes -= left;
-    sentOfNext_ = 0;
-    unsent_ = RequestList::after(*unsent_);
-    ++inFlight_;
-  }
+  const std::size_t encoded = std::min(bytes, encoded_.size() - encodedSent_);
+  encodedSent_ += encoded;
+  tail_.remove_prefix(bytes - encoded);
 }
 
 }  // namespace ironmoat::client

@@ -2,22 +2,49 @@
 
 #include <sys/uio.h>
 
-#include <algorithm>
+#include <array>
 #include <cstddef>
 #include <cstdint>
-#include <memory>
 #include <optional>
-#include <span>
 #include <string>
 #include <string_view>
 
-#include "client/counters.h"
-#include "client/loss.h"
 #include "client/request.h"
-#include "client/request_ids.h"
 #include "values/block_builder.h"
 
 namespace ironmoat::client {
+
+/// What ended a service process or made it useless.
+struct Loss {
+  enum class Why : std::uint8_t {
+    ended,      ///< it ended or closed its connection by itself
+    violation,  ///< it sent what no service sends
+    deadline,   ///< it did not answer in time
+  };
+  Why why = Why::ended;
+  std::string what;  ///< "was killed by SIGSEGV", "sent a broken frame: ..."
+};
+
+/// The text that `make` returns, or none for want of memory: the loss is what counts.
+template <class Make>
+std::string textOrNone(const Make& make) noexcept {
+  try {
+    return make();
+  } catch (const std::bad_alloc&) {
+    return {};
+  }
+}
+
+/// Ids that a service cannot guess before it has read them, so that nothing it sent earlier can
+/// pass for the reply. Never 0, which answers a frame without an id.
+class RequestIds {
+ public:
+  std::uint64_t next() noexcept;
+
+ private:
+  std::array<std::uint64_t, 32> pool_;  // NOLINT: read only below left_
+  std::size_t left_ = 0;
+};
 
 /// One service process, as a state machine, and the requests that were given to it. Knows no
 /// process, socket or thread: its owner reports events and carries out what it asks for.
@@ -30,8 +57,7 @@ namespace ironmoat::client {
 ///     greeting  lost                    absent    as startFailed
 ///     ready     receive (a reply)       ready     the front has its outcome
 ///     ready     lost                    absent    retry or blame, see below
-///     ready     dismissed               absent    an idle process was ended
-///     ready     replaced                ready     an idle process gave way to a fresh one
+///     ready     dismissed               absent    its owner ended an idle process
 ///
 /// A service answers in the order of the requests. The front is the oldest request without an
 /// outcome; its deadline runs from when it becomes the front of a ready process.
@@ -51,34 +77,20 @@ class Channel {
  public:
   enum class State : std::uint8_t { absent, greeting, ready };
 
-  /// Requests sent and not yet answered, at most: bounds how many are sent again.
+  /// Requests in flight, at most: bounds how many are sent again.
   static constexpr std::size_t kWindow = 256;
-  /// A message of up to so many bytes is copied into one piece with its neighbours.
-  static constexpr std::size_t kWorthCopying = 1024;
   static constexpr unsigned kStartAttempts = 5;
 
   /// A process has `startTime` to send its hello.
   Channel(Clock::duration startTime, Counters& counters);
 
-  // From callers.
-  void add(std::shared_ptr<Request> request, TimePoint now) noexcept;
-  /// Drops a request that is here. It gets no outcome, and its reply is ignored.
-  void cancel(Request& request, TimePoint now) noexcept;
-  /// Takes out all requests but the front, which then is the last that this process answers.
+  // Requests.
+  void add(RequestList requests, TimePoint now) noexcept;
+  /// Takes out all requests but the front, which is the last that this process answers. Requires
+  /// that the front is in flight.
   RequestList takeFollowers() noexcept;
-  [[nodiscard]] State state() const noexcept { return state_; }
-  [[nodiscard]] bool empty() const noexcept { return requests_.empty(); }
-  [[nodiscard]] const Request* front() const noexcept { return requests_.front(); }
-  /// When the front, if it was sent, will have been in work for `patience`.
-  [[nodiscard]] TimePoint stalledAt(Clock::duration patience) const noexcept {
-    return inFlight_ == 0 || closed_ ? TimePoint::max() : frontSince_ + patience;
-  }
-  [[nodiscard]] std::size_t size() const noexcept { return size_; }
-  /// Requests are being sent again one at a time.
-  [[nodiscard]] bool isRetrying() const noexcept {
-    return !requests_.empty() && requests_.front()->losses_ > 0;
-  }
-  /// Requests with an outcome, to be delivered.
+  void failAll(std::string_view why) noexcept;
+  /// Complete requests, for the owner to take.
   [[nodiscard]] RequestList& finished() noexcept { return finished_; }
 
   // Events.
@@ -86,80 +98,84 @@ class Channel {
   /// `lasting`: trying again is useless.
   void startFailed(std::string_view why, bool lasting, TimePoint now) noexcept;
   /// Takes the body of one frame. Throws frames::FrameError, frames::RecordError or std::bad_alloc:
-  /// the process is then to be killed and reported as lost.
+  /// the owner must then kill the process and report it as lost.
   void receive(const Data& body, TimePoint now);
   void lost(const Loss& loss, TimePoint now) noexcept;
-  /// The process, which owes no reply, was ended or replaced by a fresh one that sent its hello.
   void dismissed() noexcept;
-  void replaced() noexcept;
   /// The loss that time has brought about, if any; to be called at `wakeAt`.
   [[nodiscard]] std::optional<Loss> expire(TimePoint now) noexcept;
-  void failAll(std::string_view why) noexcept;
 
   // What it asks for.
   [[nodiscard]] bool wantsProcess(TimePoint now) const noexcept {
     return state_ == State::absent && !requests_.empty() && now >= nextStart_;
   }
   [[nodiscard]] TimePoint wakeAt() const noexcept;
-  [[nodiscard]] bool hasUnsent() const noexcept {
-    return state_ == State::ready && unsent_ != nullptr && inFlight_ < window();
-  }
-  /// There is enough unsent to be worth a system call while the process has work: half as much.
+  [[nodiscard]] bool hasOutput() const noexcept { return hasEncoded() || canEncode(); }
+  /// There is enough to send to be worth a system call: half as much as is in flight.
   [[nodiscard]] bool isWorthSending() const noexcept {
-    return hasUnsent() && (sentOfNext_ > 0 || size_ - inFlight_ >= inFlight_ / 2);
+    return hasEncoded() || (canEncode() && unsent() >= inFlight_ / 2);
   }
-  [[nodiscard]] std::size_t inFlight() const noexcept { return inFlight_; }
-  /// Something was sent and is not answered.
-  [[nodiscard]] bool owesReply() const noexcept { return begun() > 0; }
-  /// Fills `parts`, at least two, with what can be sent and returns how many it used. They are
-  /// valid until the next call of any function here.
-  std::size_t gather(std::span<iovec> parts) noexcept;
-  /// The first `bytes` of what `gather` gave were sent.
+  /// Bytes to send, valid until the next call of any function here.
+  [[nodiscard]] std::array<iovec, 2> output() noexcept;
+  /// The first `bytes` of `output` were sent.
   void sent(std::size_t bytes) noexcept;
 
-  /// No other request may be added: the process answers the front and nothing else.
+  [[nodiscard]] State state() const noexcept { return state_; }
+  [[nodiscard]] bool empty() const noexcept { return requests_.empty(); }
+  [[nodiscard]] std::size_t size() const noexcept { return requests_.size(); }
+  [[nodiscard]] const Request& front() const noexcept { return *requests_.front(); }
+  /// The one behind the front.
+  [[nodiscard]] const Request& follower() const noexcept { return **++requests_.begin(); }
+  [[nodiscard]] std::size_t inFlight() const noexcept { return inFlight_; }
+  [[nodiscard]] std::size_t unsent() const noexcept { return requests_.size() - inFlight_; }
+  /// When the front, if it is in flight, will have been in work for `patience`.
+  [[nodiscard]] TimePoint stalledAt(Clock::duration patience) const noexcept {
+    return inFlight_ == 0 || closed_ ? TimePoint::max() : frontSince_ + patience;
+  }
+  /// Requests are being sent again one at a time.
+  [[nodiscard]] bool isRetrying() const noexcept { return !empty() && front().isRetried(); }
+  /// The followers were taken out: no request may be added.
   [[nodiscard]] bool isClosed() const noexcept { return closed_; }
-  /// Requests answered by the present process, and how many of them in a row took more than half of
+  /// Requests that this process answered, and how many of them in a row took more than half of
   /// their deadline.
   [[nodiscard]] std::uint64_t answered() const noexcept { return answered_; }
   [[nodiscard]] unsigned slowInARow() const noexcept { return slowInARow_; }
 
  private:
-  static constexpr std::size_t kAtOnce = 64;  // requests that `gather` gives out
-
-  std::shared_ptr<Request> popFront() noexcept;
-  void finish(std::shared_ptr<Request> request) noexcept;
-  void fail(std::shared_ptr<Request> request, Failure failure) noexcept;
-  void startClock(TimePoint now) noexcept;
-  void resetProcess() noexcept;
   [[nodiscard]] std::size_t window() const noexcept { return isRetrying() ? 1 : kWindow; }
-  [[nodiscard]] std::size_t begun() const noexcept { return inFlight_ + (sentOfNext_ > 0 ? 1 : 0); }
-  [[nodiscard]] bool blame(const Loss& loss) noexcept;
+  [[nodiscard]] bool hasEncoded() const noexcept {
+    return encodedSent_ < encoded_.size() || !tail_.empty();
+  }
+  [[nodiscard]] bool canEncode() const noexcept {
+    return state_ == State::ready && unsent_ != requests_.end() && inFlight_ < window();
+  }
+  void encodeNext() noexcept;
+  void startClock(TimePoint now) noexcept;
+  [[nodiscard]] bool blame(RequestList& suspects, const Loss& loss) noexcept;
+  void forgetProcess() noexcept;
 
   const Clock::duration startTime_;
   Counters& counters_;
   RequestIds ids_;
   State state_ = State::absent;
-
   RequestList requests_;
-  std::size_t size_ = 0;        // of requests_
-  Request* unsent_ = nullptr;   // the first one not wholly sent
-  std::size_t sentOfNext_ = 0;  // bytes of its frame that were sent
-  std::size_t inFlight_ = 0;    // wholly sent, not answered
   RequestList finished_;
-  BlockBuilder staged_;  // what `gather` writes
+  unsigned startFailures_ = 0;  // in a row
+  TimePoint nextStart_{};
+  TimePoint greetBy_{};
 
-  // Of the present process.
-  std::uint64_t given_ = 0;  // requests of which it got any byte
+  // Of the current process.
+  std::size_t inFlight_ = 0;                          // encoded and not answered
+  RequestList::iterator unsent_ = requests_.begin();  // the first one that is not encoded
+  BlockBuilder encoded_;                              // frames, sent up to encodedSent_
+  std::size_t encodedSent_ = 0;
+  std::string_view tail_;  // what is not yet sent of a long message, the last of encoded_
+  std::uint64_t given_ = 0;
   std::uint64_t answered_ = 0;
   unsigned slowInARow_ = 0;
   bool closed_ = false;
-  bool wasShared_ = false;  // requests that were taken out had been sent behind the front
+  bool wasShared_ = false;  // the requests that were taken out were in flight
   TimePoint frontSince_{};
-  TimePoint greetBy_{};
-
-  unsigned startFailures_ = 0;  // in a row
-  TimePoint nextStart_{};
 };
 
 }  // namespace ironmoat::client

@@ -40,7 +40,7 @@ TEST(Channel, GivesEachOrderOfEventsItsOutcomes) {
       {"starts fail for now", "a2222b2", "a unavailable, b unavailable", ""},
       {"four starts fail", "a222204", "a record", "a"},
       {"a start fails for good", "ab3", "a unavailable, b unavailable", ""},
-      {"cancelled before it is sent", "aAb04", "a, b record", "b"},
+      {"cancelled before it is sent", "aAb044", "a, b record", "ab"},
       {"cancelled in flight", "ab0A44", "a, b record", "ab"},
       {"cancelled, then death", "ab0A6044", "a, b record", "ab|b"},
       {"a process that is let go", "a049b04", "a record, b record", "a|b"},

@@ -10,7 +10,6 @@
 #include <string>
 #include <utility>
 
-#include "client/greeting.h"
 #include "frames/record_codec.h"
 
 namespace ironmoat::client {
@@ -19,23 +18,24 @@ using namespace std::chrono_literals;
 
 namespace {
 
-constexpr Clock::duration kMinStartTime = 2s;
-/// That a process may take to send its hello.
-Clock::duration startTime(const Settings& settings) noexcept {
-  return std::max(settings.deadline, kMinStartTime);
+constexpr auto kMinStartTime = 2s;
+constexpr int kReadsInARow = 4;  // before anything else is looked at
+constexpr unsigned kSlowInARow = 3;
+constexpr auto kRenewPause = 1s;  // after a successor that failed
+
+Clock::duration startTime(const Context& context) noexcept {
+  return std::max<Clock::duration>(context.settings.deadline, kMinStartTime);
 }
 
-constexpr int kReadsInARow = 4;         // before anything else is looked at
-constexpr std::size_t kMaxParts = 128;  // of a write
+bool isReadable(int fd) noexcept {
+  pollfd ready = {fd, POLLIN, 0};
+  return ::poll(&ready, 1, 0) > 0;
+}
 
 }  // namespace
 
-Connection::Connection(const Settings& settings, Counters& counters, int epoll)
-    : settings_(settings), channel_(startTime(settings), counters), epoll_(epoll) {}
-
-Connection::~Connection() {
-  if (process_) dismiss();
-}
+Connection::Connection(Context& context, int epoll)
+    : context_(context), channel_(startTime(context), context.counters), epoll_(epoll) {}
 
 void Connection::pull() noexcept {
   for (int i = 0; i < kReadsInARow && process_ && receive(); ++i) {
@@ -46,15 +46,19 @@ void Connection::pull() noexcept {
 void Connection::push() noexcept {
   if (const TimePoint now = Clock::now(); channel_.wantsProcess(now)) start(now);
   if (process_ && channel_.isWorthSending()) send();
-  if (epoll_ >= 0 && process_) watch();
+  if (process_) watch(EPOLLIN | (channel_.isWorthSending() ? unsigned{EPOLLOUT} : 0U));
+}
+
+std::unique_ptr<Connection::Process> Connection::startProcess() const {
+  return std::unique_ptr<Process>(
+      new Process{process::ServiceProcess::start(context_.settings.program), Clock::now()});
 }
 
 void Connection::start(TimePoint now) noexcept {
   try {
-    process_ = std::make_unique<Process>(ServiceProcess::start(settings_.program));
-    startedAt_ = now;
+    process_ = startProcess();
     channel_.started(now);
-  } catch (const StartError& error) {
+  } catch (const process::StartError& error) {
     channel_.startFailed(error.what(), error.lasting(), now);
   } catch (const std::bad_alloc& error) {
     channel_.startFailed(error.what(), false, now);
@@ -62,11 +66,11 @@ void Connection::start(TimePoint now) noexcept {
 }
 
 void Connection::send() noexcept {
-  std::array<iovec, kMaxParts> parts;
-  msghdr message = {};
-  message.msg_iov = parts.data();
-  while (channel_.hasUnsent()) {
-    message.msg_iovlen = channel_.gather(parts);
+  while (channel_.hasOutput()) {
+    auto parts = channel_.output();
+    msghdr message = {};
+    message.msg_iov = parts.data();
+    message.msg_iovlen = parts.size();
     const ssize_t count =
         ::sendmsg(process_->service.socket(), &message, MSG_NOSIGNAL | MSG_DONTWAIT);
     if (count >= 0) {
@@ -77,53 +81,45 @@ void Connection::send() noexcept {
     // It no longer reads. What it has still said counts first.
     while (process_ && receive()) {
     }
-    if (process_) lose({});
-    return;
+    return process_ ? lose({}) : void();
   }
-}
-
-Connection::Received Connection::readSome(Process& process) {
-  const std::span<char> room = process.assembler.room();
-  const ssize_t count = ::recv(process.service.socket(), room.data(), room.size(), MSG_DONTWAIT);
-  if (count > 0) process.assembler.commit(static_cast<std::size_t>(count));
-  if (count > 0) return Received::bytes;
-  return count < 0 && (errno == EAGAIN || errno == EINTR) ? Received::nothing : Received::end;
 }
 
 bool Connection::receive() noexcept {
-  const auto wrong = [&](std::string_view what, const char* how) {
-    lose({Loss::Why::violation, textOrNone([&] { return std::string(what).append(how); })});
-    return true;
+  using State = Channel::State;
+  const auto violation = [](std::string_view what, const char* how) {
+    return Loss{Loss::Why::violation, textOrNone([&] { return std::string(what).append(how); })};
   };
+  Loss loss;
   try {
-    const Received received = readSome(*process_);
-    if (received == Received::nothing) return false;
-    if (received == Received::end) {
-      lose({});
-      return true;
+    const std::span<char> room = process_->assembler.room();
+    const ssize_t count =
+        ::recv(process_->service.socket(), room.data(), room.size(), MSG_DONTWAIT);
+    if (count < 0 && (errno == EAGAIN || errno == EINTR)) return false;
+    if (count > 0) {
+      process_->assembler.commit(static_cast<std::size_t>(count));
+      const TimePoint now = Clock::now();
+      while (const std::optional<Data> body = process_->assembler.next()) {
+        channel_.receive(*body, now);
+      }
+      const bool isUnsolicited = process_->assembler.midFrame() && channel_.inFlight() == 0 &&
+                                 channel_.state() == State::ready;
+      if (!isUnsolicited) return true;
+      loss = violation("sent unsolicited data", "");
     }
-    const TimePoint now = Clock::now();
-    while (const std::optional<Data> body = process_->assembler.next()) {
-      channel_.receive(*body, now);
-    }
-    if (process_->assembler.midFrame() && !channel_.owesReply() &&
-        channel_.state() == Channel::State::ready) {
-      return wrong("sent unsolicited data", "");
-    }
-    return true;
   } catch (const frames::FrameError& error) {
-    return wrong(
-        channel_.state() == Channel::State::greeting ? "is unusable: " : "sent a broken frame: ",
-        error.what());
+    const bool greeting = channel_.state() == State::greeting;
+    loss = violation(greeting ? "is unusable: " : "sent a broken frame: ", error.what());
   } catch (const frames::RecordError& error) {
-    return wrong("sent a broken record: ", error.what());
+    loss = violation("sent a broken record: ", error.what());
   } catch (const std::bad_alloc&) {
-    return wrong("sent more than there is memory for", "");
+    loss = violation("sent more than there is memory for", "");
   }
+  lose(std::move(loss));
+  return true;
 }
 
 void Connection::lose(Loss loss) noexcept {
-  unwatch();
   const bool greeting = channel_.state() == Channel::State::greeting;
   loss.what = textOrNone([&] {
     std::string what = std::move(loss.what);
@@ -131,78 +127,61 @@ void Connection::lose(Loss loss) noexcept {
       what = process_->service.lastWord(kGrace);
       if (greeting) what += " before its hello";
     }
-    return greeting ? settings_.program + " " + what : what;
+    return greeting ? context_.settings.program + " " + what : what;
   });
+  watch(0);
   process_.reset();  // gone before anyone hears of it
   channel_.lost(loss, Clock::now());
 }
 
 void Connection::dismiss() noexcept {
-  unwatch();
   successor_.reset();
+  if (!process_) return;
+  watch(0);
   process_.reset();
   channel_.dismissed();
 }
 
 bool Connection::isDue(TimePoint now) const noexcept {
-  if (successor_ != nullptr) return true;
-  return now >= renewAfter_ &&
-         (channel_.answered() >= settings_.requestsPerProcess ||
-          now - startedAt_ >= settings_.processLifetime || channel_.slowInARow() >= kSlowInARow);
+  if (!process_ || channel_.state() != Channel::State::ready) return false;
+  if (successor_) return true;
+  return now >= renewAfter_ && (channel_.answered() >= context_.settings.requestsPerProcess ||
+                                now - process_->startedAt >= context_.settings.processLifetime ||
+                                channel_.slowInARow() >= kSlowInARow);
 }
 
-bool Connection::wantsRest(TimePoint now) noexcept {
-  if (channel_.state() != Channel::State::ready || !isDue(now)) return false;
-  try {
-    return !successor_ || hasSuccessor();
-  } catch (const std::exception&) {
-    return true;  // `renew` will see it again
-  }
+bool Connection::isYielding() const noexcept {
+  return successor_ && process_ && isReadable(successor_->service.socket());
 }
 
 void Connection::renew() noexcept {
   const TimePoint now = Clock::now();
-  if (!process_ || channel_.state() != Channel::State::ready || !isDue(now)) return;
+  if (!isDue(now)) return;
   try {
-    if (!successor_) {
-      successor_ = std::make_unique<Process>(ServiceProcess::start(settings_.program));
-      successorGreeted_ = false;
-      successorStartedAt_ = now;
-    } else if (hasSuccessor()) {
-      unwatch();
-      process_ = std::move(successor_);
-      startedAt_ = now;
-      channel_.replaced();
-    }
-  } catch (const std::exception&) {  // not to be had now: the present one goes on
+    if (!successor_) successor_ = startProcess();
+  } catch (const std::exception&) {  // the present process goes on
+    renewAfter_ = now + kRenewPause;
+    return;
+  }
+  if (now - successor_->startedAt > startTime(context_)) {
     successor_.reset();
     renewAfter_ = now + kRenewPause;
+  } else if (channel_.empty() && isYielding()) {
+    std::unique_ptr<Process> next = std::move(successor_);
+    dismiss();
+    process_ = std::move(next);
+    channel_.started(now);
+    context_.counters.add(&Stats::retired);
+    receive();  // its hello
   }
 }
 
-bool Connection::hasSuccessor() {
-  if (successorGreeted_) return true;
-  if (Clock::now() - successorStartedAt_ > startTime(settings_)) {
-    throw StartError("sent no hello before the start deadline", false);
-  }
-  if (readSome(*successor_) == Received::end) throw StartError("ended before its hello", false);
-  if (const std::optional<Data> body = successor_->assembler.next()) {
-    requireUsable(frames::parseHello(*body));
-    successorGreeted_ = true;
-  }
-  return successorGreeted_;
-}
-
-void Connection::processEnded() noexcept {
-  if (process_ && !receive()) lose({});
-}
-
-bool Connection::spin() noexcept {
-  return process_ && channel_.owesReply() && spin_([&] { return receive(); });
+void Connection::checkEnd() noexcept {
+  if (process_ && isReadable(process_->service.endedFd()) && !receive()) lose({});
 }
 
 void Connection::wait() noexcept {
-  if (spin()) return;
+  if (process_ && channel_.inFlight() > 0 && spin_([this] { return receive(); })) return;
   std::array<pollfd, 2> fds = {{{-1, POLLIN, 0}, {-1, POLLIN, 0}}};
   if (process_) {
     fds[0].fd = process_->service.socket();
@@ -210,31 +189,20 @@ void Connection::wait() noexcept {
     fds[1].fd = process_->service.endedFd();
   }
   ::poll(fds.data(), fds.size(), millisecondsUntil(channel_.wakeAt()));
-  // A child that the daemon has forked may keep the connection open.
-  if (fds[0].revents == 0 && fds[1].revents != 0) processEnded();
+  if (fds[0].revents == 0 && fds[1].revents != 0) checkEnd();
 }
 
-void Connection::watch() noexcept {
-  const unsigned wanted = EPOLLIN | (channel_.isWorthSending() ? unsigned{EPOLLOUT} : 0U);
-  if (watched_ == wanted) return;
+void Connection::watch(unsigned events) noexcept {
+  const unsigned before = std::exchange(watched_, events);
+  if (epoll_ < 0 || before == events) return;
+  const int change = before == 0 ? EPOLL_CTL_ADD : events == 0 ? EPOLL_CTL_DEL : EPOLL_CTL_MOD;
   epoll_event event = {};
-  event.events = wanted;
-  ::epoll_ctl(epoll_, watched_ == 0 ? EPOLL_CTL_ADD : EPOLL_CTL_MOD, process_->service.socket(),
-              &event);
-  if (watched_ == 0 && process_->service.endedFd() >= 0) {
-    event.events = EPOLLIN;
-    event.data.ptr = this;
-    ::epoll_ctl(epoll_, EPOLL_CTL_ADD, process_->service.endedFd(), &event);
-  }
-  watched_ = wanted;
-}
-
-void Connection::unwatch() noexcept {
-  if (std::exchange(watched_, 0) == 0) return;
-  ::epoll_ctl(epoll_, EPOLL_CTL_DEL, process_->service.socket(), nullptr);
-  if (process_->service.endedFd() >= 0) {
-    ::epoll_ctl(epoll_, EPOLL_CTL_DEL, process_->service.endedFd(), nullptr);
-  }
+  event.events = events;
+  ::epoll_ctl(epoll_, change, process_->service.socket(), &event);
+  if (change == EPOLL_CTL_MOD || process_->service.endedFd() < 0) return;
+  event.events = EPOLLIN;
+  event.data.ptr = this;
+  ::epoll_ctl(epoll_, change, process_->service.endedFd(), &event);
 }
 
 }  // namespace ironmoat::client

@@ -5,16 +5,19 @@
 #include <bit>
 #include <cstddef>
 #include <cstdint>
+#include <new>
 #include <type_traits>
 #include <variant>
 
-#include "client/request.h"
+#include "ironmoat/errors.h"
 #include "ironmoat/stats.h"
 
 namespace ironmoat::client {
 
-/// A `Stats` that any thread may add to and read. Each number is exact by itself; nothing is
-/// ordered by them (relaxed).
+using Failure = std::variant<DecodingError, ServiceError, std::bad_alloc>;
+
+/// A `Stats` that any thread may add to and read. Each number is exact by itself; no other memory
+/// is ordered by them (relaxed).
 class Counters {
  public:
   using Number = std::uint64_t Stats::*;
@@ -22,7 +25,7 @@ class Counters {
   void add(Number number, std::uint64_t n = 1) noexcept { add(stats_.*number, n); }
   void subtract(Number number, std::uint64_t n = 1) noexcept { add(stats_.*number, 0 - n); }
 
-  /// An outcome: null for a record.
+  /// An outcome; null for a record.
   void count(const Failure* failure) noexcept {
     if (failure == nullptr) return add(&Stats::accepted);
     if (const auto* const error = std::get_if<DecodingError>(failure)) {
@@ -54,7 +57,7 @@ class Counters {
   Stats stats_;
 };
 
-/// Counts a request for as long as it has no outcome.
+/// Counts a request as in flight for as long as this lives.
 class InFlight {
  public:
   InFlight(Counters& counters, std::size_t bytes) noexcept : counters_(counters), bytes_(bytes) {

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <chrono>
 #include <condition_variable>
 #include <mutex>
 
@@ -37,10 +38,13 @@ class IRONMOAT_THREAD_ANNOTATION(scoped_lockable) Lock {
 
   void unlock() IRONMOAT_THREAD_ANNOTATION(release_capability()) { lock_.unlock(); }
   void lock() IRONMOAT_THREAD_ANNOTATION(acquire_capability()) { lock_.lock(); }
-  void wait(std::condition_variable& condition) { condition.wait(lock_); }
-  template <class Time>
-  void waitUntil(std::condition_variable& condition, const Time& until) {
-    condition.wait_until(lock_, until);
+  /// Until time_point::max() is for ever.
+  void waitUntil(std::condition_variable& condition, std::chrono::steady_clock::time_point until) {
+    if (until == std::chrono::steady_clock::time_point::max()) {
+      condition.wait(lock_);
+    } else {
+      condition.wait_until(lock_, until);
+    }
   }
 
  private:

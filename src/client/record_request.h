@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <new>
 #include <optional>
 #include <utility>
@@ -11,52 +12,51 @@
 
 namespace ironmoat::client {
 
-/// A request for a record of type `R`, delivered as `Base` does.
-template <MessageSchema R, class Base>
-class RecordRequest : public Base {
+/// A request for a record of type `R`.
+template <MessageSchema R>
+class RecordRequest final : public Request {
  public:
-  template <class... More>
-  RecordRequest(const Data& message, Clock::duration deadline, More... more)
-      : Base(R::schemaName, message, deadline, more...) {}
+  using Completion = std::function<void(Outcome<R>)>;
 
-  const Failure* resolve(const frames::Reply& reply) override {
-    try {
-      take(reply);
-    } catch (const std::bad_alloc& error) {
-      fail(error);
-    }
-    return outcome_->error();
-  }
-  void fail(Failure failure) noexcept override { outcome_.emplace(std::move(failure)); }
+  RecordRequest(Counters& counters, const Data& message, Clock::duration deadline,
+                Completion completion = {})
+      : Request(counters, R::schemaName, message, deadline), completion_(std::move(completion)) {}
 
   /// The outcome, once; requires that there is one.
   Outcome<R> take() { return *std::move(outcome_); }
   /// Its record; throws the error if that is the outcome.
   R takeRecord() { return (*std::move(outcome_)).value(); }
 
- private:
-  void take(const frames::Reply& reply) {
-    switch (reply.status) {
-      case frames::Status::record:
-        return decode(reply.body);
-      case frames::Status::refused:
-        return fail(frames::parseRefusal(reply.body));
-      case frames::Status::notServed:
-      case frames::Status::failed:
-        return fail(
-            ServiceError(ServiceError::Kind::unavailable, frames::parseSentence(reply.body)));
-    }
-  }
-  void decode(const Data& body) {
-    try {
-      withHostRejections(
-          [&] { outcome_.emplace(std::in_place, [&] { return frames::decodeRecord<R>(body); }); });
-    } catch (const DecodingError& rejection) {  // by the record's initialiser
-      fail(rejection);
-    }
+  [[nodiscard]] bool hasCompletion() const noexcept override { return completion_ != nullptr; }
+  void deliver() noexcept override {
+    const Completion completion = std::exchange(completion_, nullptr);
+    if (completion && !isCancelled()) completion(take());
   }
 
+ private:
+  const Failure* read(const frames::Reply& reply) override {
+    using Status = frames::Status;
+    try {
+      if (reply.status == Status::record) {
+        withHostRejections([&] {
+          outcome_.emplace(std::in_place, [&] { return frames::decodeRecord<R>(reply.body); });
+        });
+      } else if (reply.status == Status::refused) {
+        set(frames::parseRefusal(reply.body));
+      } else {  // notServed, failed
+        set(ServiceError(ServiceError::Kind::unavailable, frames::parseSentence(reply.body)));
+      }
+    } catch (const DecodingError& rejection) {  // by the record's initialiser
+      set(rejection);
+    } catch (const std::bad_alloc& error) {
+      set(error);
+    }
+    return outcome_->error();
+  }
+  void set(Failure failure) noexcept override { outcome_.emplace(std::move(failure)); }
+
   std::optional<Outcome<R>> outcome_;
+  Completion completion_;
 };
 
 }  // namespace ironmoat::client

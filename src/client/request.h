@@ -1,16 +1,18 @@
 #pragma once
 
 #include <algorithm>
+#include <atomic>
 #include <chrono>
-#include <cstddef>
 #include <cstdint>
+#include <list>
 #include <memory>
 #include <new>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <utility>
-#include <variant>
 
+#include "client/counters.h"
 #include "frames/frame.h"
 #include "ironmoat/errors.h"
 #include "ironmoat/values.h"
@@ -20,29 +22,32 @@ namespace ironmoat::client {
 using Clock = std::chrono::steady_clock;
 using TimePoint = Clock::time_point;
 
-/// For poll and the like: -1 for TimePoint::max(), an hour at most.
+/// For poll and the like: -1 for TimePoint::max(), at most an hour.
 inline int millisecondsUntil(TimePoint at) noexcept {
   if (at == TimePoint::max()) return -1;
   const auto left = std::chrono::ceil<std::chrono::milliseconds>(at - Clock::now());
   return static_cast<int>(std::clamp<std::chrono::milliseconds::rep>(left.count(), 0, 3'600'000));
 }
 
-using Failure = std::variant<DecodingError, ServiceError, std::bad_alloc>;
-
-/// A ServiceError, or std::bad_alloc for want of memory for its text.
-inline Failure serviceError(ServiceError::Kind kind, std::string_view what) noexcept {
+/// A ServiceError with the text that `make` returns; std::bad_alloc if there is no memory for it.
+template <class Make>
+Failure serviceError(ServiceError::Kind kind, const Make& make) noexcept {
   try {
-    return ServiceError(kind, std::string(what));
+    return ServiceError(kind, make());
   } catch (const std::bad_alloc& error) {
     return error;
   }
 }
 
-/// One message on its way to one outcome. Belongs to one channel at a time, on one thread.
+/// One message on its way to one outcome. Used by one thread at a time, but for `isDone`.
 class Request {
  public:
-  Request(std::string_view outputType, Data message, Clock::duration deadline) noexcept
-      : outputType_(outputType), message_(std::move(message)), deadline_(deadline) {}
+  Request(Counters& counters, std::string_view outputType, Data message, Clock::duration deadline)
+      : outputType_(outputType),
+        message_(std::move(message)),
+        deadline_(deadline),
+        counters_(counters),
+        inFlight_(std::in_place, counters, message_.size()) {}
   Request(const Request&) = delete;
   Request& operator=(const Request&) = delete;
   virtual ~Request() = default;
@@ -51,84 +56,84 @@ class Request {
   [[nodiscard]] std::string_view outputType() const noexcept { return outputType_; }
   [[nodiscard]] const Data& message() const noexcept { return message_; }
   [[nodiscard]] Clock::duration deadline() const noexcept { return deadline_; }
-
-  /// It has lost a process, and is to be alone in the next one.
+  /// It lost a process and must be alone in the next one.
   [[nodiscard]] bool isRetried() const noexcept { return losses_ > 0; }
+  [[nodiscard]] bool isCancelled() const noexcept { return cancelled_; }
 
-  /// Takes the outcome out of a reply; returns the failure, or null for a record. Throws
-  /// frames::RecordError or frames::FrameError when no service sends such a reply: the request is
-  /// then still without an outcome.
-  virtual const Failure* resolve(const frames::Reply& reply) = 0;
-  virtual void fail(Failure failure) noexcept = 0;
-  /// Hands the outcome to whoever waits for it. Called once, by the owner of the channel.
+  /// Its outcome is no longer wanted: it will complete without one.
+  void cancel() noexcept { cancelled_ = true; }
+  /// Completes the request with what the reply says. Throws frames::RecordError or
+  /// frames::FrameError if no service sends such a reply; the request is then not complete.
+  void resolve(const frames::Reply& reply) {
+    if (!cancelled_) counters_.count(read(reply));
+    complete();
+  }
+  void fail(Failure failure) noexcept {
+    if (!cancelled_) {
+      counters_.count(&failure);
+      set(std::move(failure));
+    }
+    complete();
+  }
+  /// Completes a cancelled request.
+  void drop() noexcept { complete(); }
+  /// Any thread. The outcome belongs to the thread that has seen this return true. Pairs with the
+  /// release in `complete`.
+  [[nodiscard]] bool isDone() const noexcept { return done_.load(std::memory_order_acquire); }
+  /// `deliver` has a completion to call.
+  [[nodiscard]] virtual bool hasCompletion() const noexcept = 0;
+  /// Calls the completion, once.
   virtual void deliver() noexcept = 0;
 
  private:
   friend class Channel;
-  friend class RequestList;
+
+  /// Takes the outcome out of the reply; returns the failure, or null for a record.
+  virtual const Failure* read(const frames::Reply& reply) = 0;
+  virtual void set(Failure failure) noexcept = 0;
+  void complete() noexcept {
+    if (cancelled_) counters_.add(&Stats::cancelled);
+    inFlight_.reset();
+    done_.store(true, std::memory_order_release);
+  }
 
   const std::string_view outputType_;
   const Data message_;
   const Clock::duration deadline_;
-
-  std::shared_ptr<Request> next_;  // in a RequestList
+  Counters& counters_;
+  std::optional<InFlight> inFlight_;
+  bool cancelled_ = false;
+  std::atomic<bool> done_ = false;
 
   // The channel's notes.
-  std::uint64_t id_ = 0;     // in the frames of its present try
-  TimePoint due_{};          // when its deadline ends; none while it waits for others
+  std::uint64_t id_ = 0;     // in the frames of the current attempt
+  TimePoint due_{};          // when the deadline ends; none while other requests go first
   std::uint8_t losses_ = 0;  // processes lost while it was in flight, up to 2
-  bool cancelled_ = false;
 };
 
-/// Requests in order. Takes no memory, so that no request is ever lost for want of it.
-class RequestList {
- public:
-  RequestList() noexcept = default;
-  RequestList(RequestList&& other) noexcept { append(std::move(other)); }
-  RequestList& operator=(RequestList&&) = delete;
-  ~RequestList() {
-    while (pop() != nullptr) {
-    }
-  }
+/// Requests in order. Moving them between lists (`splice`) takes no memory, so that a request that
+/// was once accepted is never lost for want of it.
+using RequestList = std::list<std::shared_ptr<Request>>;
 
-  [[nodiscard]] bool empty() const noexcept { return first_ == nullptr; }
-  [[nodiscard]] Request* front() const noexcept { return first_.get(); }
-  [[nodiscard]] static Request* after(const Request& request) noexcept {
-    return request.next_.get();
-  }
-  void push(std::shared_ptr<Request> request) noexcept {
-    Request* const added = request.get();
-    (last_ == nullptr ? first_ : last_->next_) = std::move(request);
-    last_ = added;
-  }
-  /// The first request, taken out, or null.
-  std::shared_ptr<Request> pop() noexcept {
-    std::shared_ptr<Request> request = std::move(first_);
-    if (request != nullptr) first_ = std::move(request->next_);
-    if (first_ == nullptr) last_ = nullptr;
-    return request;
-  }
-  /// Takes out a request that is in the list.
-  std::shared_ptr<Request> remove(Request& request) noexcept {
-    RequestList before;
-    while (first_.get() != &request) before.push(pop());
-    std::shared_ptr<Request> removed = pop();
-    before.append(std::move(*this));
-    append(std::move(before));
-    return removed;
-  }
-  void append(RequestList&& other) noexcept {
-    if (other.first_ == nullptr) return;
-    (last_ == nullptr ? first_ : last_->next_) = std::move(other.first_);
-    last_ = std::exchange(other.last_, nullptr);
-  }
-  void deliverAll() noexcept {
-    while (const std::shared_ptr<Request> request = pop()) request->deliver();
-  }
+inline void append(RequestList& to, RequestList& from) noexcept { to.splice(to.end(), from); }
 
- private:
-  std::shared_ptr<Request> first_;
-  Request* last_ = nullptr;
-};
+inline RequestList takeFirst(RequestList& from) noexcept {
+  RequestList first;
+  first.splice(first.end(), from, from.begin());
+  return first;
+}
+
+/// Fails all of `requests` with `unavailable`; they are then in `finished`.
+inline void failAll(RequestList& requests, RequestList& finished, std::string_view why) noexcept {
+  for (const auto& request : requests) {
+    request->fail(serviceError(ServiceError::Kind::unavailable, [&] { return std::string(why); }));
+  }
+  append(finished, requests);
+}
+
+/// Calls the completions; these may change the list that the requests were taken from.
+inline void deliverAll(RequestList requests) noexcept {
+  for (const auto& request : requests) request->deliver();
+}
 
 }  // namespace ironmoat::client

@@ -1,10 +1,11 @@
 #include "client/settings.h"
 
 #include <algorithm>
+#include <cstddef>
+#include <cstdint>
 #include <thread>
-#include <utility>
 
-#include "client/default_program.h"
+#include "process/program.h"
 
 namespace ironmoat::client {
 
@@ -15,25 +16,25 @@ namespace {
 constexpr std::size_t kDefaultProcesses = 4;
 constexpr std::size_t kMaxProcesses = 256;
 
-std::size_t validProcesses(std::size_t wanted) noexcept {
-  if (wanted != 0) return std::min(wanted, kMaxProcesses);
-  const std::size_t processors = std::thread::hardware_concurrency();
-  return std::clamp<std::size_t>(processors, 1, kDefaultProcesses);
-}
-
 }  // namespace
 
-Clock::duration validDeadline(std::chrono::milliseconds deadline) noexcept {
+std::chrono::milliseconds validDeadline(std::chrono::milliseconds deadline) noexcept {
   return std::clamp<std::chrono::milliseconds>(deadline, 1ms, 24h);
 }
 
-Settings::Settings(ClientOptions options)
-    : program(options.program.empty() ? defaultProgram() : std::move(options.program)),
-      deadline(validDeadline(options.deadline)),
-      processes(validProcesses(options.processes)),
-      idleTime(std::clamp<std::chrono::milliseconds>(options.idleTime, 0ms, 24h)),
-      requestsPerProcess(std::max<std::uint64_t>(options.requestsPerProcess, 1)),
-      processLifetime(std::clamp<std::chrono::seconds>(options.processLifetime, 1s, 24h * 365)),
-      maxBytesInFlight(options.maxBytesInFlight) {}
+ClientOptions settingsFrom(ClientOptions options) {
+  if (options.program.empty()) options.program = process::defaultProgram();
+  options.deadline = validDeadline(options.deadline);
+  if (options.processes == 0) {
+    const std::size_t processors = std::thread::hardware_concurrency();
+    options.processes = std::clamp<std::size_t>(processors, 1, kDefaultProcesses);
+  }
+  options.processes = std::min(options.processes, kMaxProcesses);
+  options.idleTime = std::clamp<std::chrono::milliseconds>(options.idleTime, 0ms, 24h);
+  options.requestsPerProcess = std::max<std::uint64_t>(options.requestsPerProcess, 1);
+  options.processLifetime =
+      std::clamp<std::chrono::seconds>(options.processLifetime, 1s, 24h * 365);
+  return options;
+}
 
 }  // namespace ironmoat::client

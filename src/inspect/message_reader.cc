@@ -10,10 +10,10 @@
 #include <string_view>
 #include <system_error>
 
-#include "client/file_descriptor.h"
 #include "inspect/terminal_text.h"
 #include "ironmoat/errors.h"
 #include "ironmoat/limits.h"
+#include "process/file_descriptor.h"
 
 namespace ironmoat::inspect {
 
@@ -26,9 +26,9 @@ namespace fs = std::filesystem;
 /// small buffer.
 std::size_t readInto(std::string& buffer, const std::string& file, std::size_t limit) {
   constexpr std::size_t kFirstRead = std::size_t{64} << 10;
-  client::FileDescriptor opened;
+  process::FileDescriptor opened;
   if (file != kStandardInput) {
-    opened = client::FileDescriptor(::open(file.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY));
+    opened = process::FileDescriptor(::open(file.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY));
     if (!opened) throw std::system_error(errno, std::generic_category(), inQuotes(file));
   }
   std::size_t filled = 0;

@@ -18,10 +18,10 @@
 #include <iomanip>
 #include <string_view>
 
-#include "client/service_process.h"
 #include "confinement/confinement.h"
 #include "frames/frame.h"
 #include "frames/frame_assembler.h"
+#include "process/service_process.h"
 
 namespace ironmoat::inspect {
 
@@ -119,17 +119,17 @@ std::string resultOf(Action perform) {
 }
 
 /// The service's first frame. Throws StartError if there is none, FrameError if it is not valid.
-frames::Hello helloOf(client::ServiceProcess& process) {
+frames::Hello helloOf(process::ServiceProcess& process) {
   frames::FrameAssembler assembler(frames::kMaxReplyBody, Sharing::anyThread);
   for (;;) {
     if (const auto body = assembler.next()) return frames::parseHello(*body);
     pollfd ready = {process.socket(), POLLIN, 0};
     const int count = ::poll(&ready, 1, kHelloTimeout);
     if (count < 0 && errno == EINTR) continue;
-    if (count == 0) throw client::StartError("it sent no hello within 2 s", false);
+    if (count == 0) throw process::StartError("it sent no hello within 2 s", false);
     const auto room = assembler.room();
     const ssize_t got = ::recv(process.socket(), room.data(), room.size(), 0);
-    if (got <= 0) throw client::StartError("it " + process.lastWord(100ms), false);
+    if (got <= 0) throw process::StartError("it " + process.lastWord(100ms), false);
     assembler.commit(static_cast<std::size_t>(got));
   }
 }
@@ -139,7 +139,7 @@ frames::Hello helloOf(client::ServiceProcess& process) {
 int selfTest(std::ostream& out, const std::string& serviceProgram) {
   std::uint32_t bits = 0;
   try {
-    client::ServiceProcess process = client::ServiceProcess::start(serviceProgram);
+    process::ServiceProcess process = process::ServiceProcess::start(serviceProgram);
     bits = helloOf(process).confinement;
   } catch (const std::exception& error) {
     out << "cannot use " << serviceProgram << ": " << error.what() << '\n';

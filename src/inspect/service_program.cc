@@ -6,9 +6,8 @@
 #include <stdexcept>
 #include <system_error>
 
-#include "client/default_program.h"
-#include "client/trusted_path.h"
 #include "inspect/text_view.h"
+#include "process/program.h"
 
 namespace ironmoat::inspect {
 
@@ -17,16 +16,16 @@ std::string serviceProgram() {
   static constexpr const char* kName = "VeskIronmoatService";
   std::error_code error;
   const fs::path tool = fs::read_symlink("/proc/self/exe", error);
-  if (error) return client::defaultProgram();
+  if (error) return process::defaultProgram();
   const fs::path folder = tool.parent_path();
   for (const fs::path& path : {folder / kName, folder / IRONMOAT_LIBEXEC_FROM_BIN / kName}) {
     const fs::path program = fs::canonical(path, error);
     if (error || ::access(program.c_str(), X_OK) != 0) continue;
-    if (client::isOutOfOthersReach(program)) return program;
+    if (process::isOutOfOthersReach(program)) return program;
     throw std::runtime_error("service program not allowed: other users can replace " +
                              inQuotes(program.string()));
   }
-  return client::defaultProgram();
+  return process::defaultProgram();
 }
 
 }  // namespace ironmoat::inspect

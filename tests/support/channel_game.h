@@ -89,29 +89,29 @@ class ChannelGame {
 
   class GameRequest final : public client::Request {
    public:
-    GameRequest(std::vector<Asked>& asked, std::size_t index)
-        : Request("R", Data(std::string_view(&asked[index].name, 1)), kDeadline),
+    GameRequest(client::Counters& counters, std::vector<Asked>& asked, std::size_t index)
+        : Request(counters, "R", Data(std::string_view(&asked[index].name, 1)), kDeadline),
           asked_(asked),
           index_(index) {}
-    const client::Failure* resolve(const frames::Reply& reply) override {
+    [[nodiscard]] bool hasCompletion() const noexcept override { return false; }
+    void deliver() noexcept override {}
+
+   private:
+    const client::Failure* read(const frames::Reply& reply) override {
       const std::string_view name = asked_[index_].name == reply.body.view()[0] ? "record" : "LIE";
       give(std::string(name));
       return nullptr;
     }
-    void fail(client::Failure failure) noexcept override {
+    void set(client::Failure failure) noexcept override {
       const auto& error = std::get<ServiceError>(failure);
       give(std::string(nameOf(error.kind())));
     }
-    void deliver() noexcept override { delivered_ = true; }
-
-   private:
     void give(std::string outcome) {
       asked_[index_].outcome = std::move(outcome);
       ++asked_[index_].outcomes;
     }
     std::vector<Asked>& asked_;
     std::size_t index_;
-    bool delivered_ = false;
   };
 
   static void require(bool holds, const char* what) {
@@ -124,16 +124,16 @@ class ChannelGame {
       return;
     }
     asked_.push_back({.name = name});
-    auto request = std::make_shared<GameRequest>(asked_, asked_.size() - 1);
+    auto request = std::make_shared<GameRequest>(counters_, asked_, asked_.size() - 1);
     asked_.back().request = request;
-    channel_.add(std::move(request), now_);
+    channel_.add({std::move(request)}, now_);
   }
   void cancel(char name) {
     for (Asked& each : asked_) {
       const auto request = each.request.lock();
       if (each.name != name || request == nullptr || each.outcomes > 0 || each.cancelled) continue;
       each.cancelled = true;
-      channel_.cancel(*request, now_);
+      request->cancel();
     }
   }
 
@@ -166,7 +166,7 @@ class ChannelGame {
         if (state != State::absent) lose({client::Loss::Why::ended, "was killed by SIGKILL"});
         break;
       case '7':
-        if (channel_.front() != nullptr && channel_.wakeAt() != client::TimePoint::max()) {
+        if (!channel_.empty() && channel_.wakeAt() != client::TimePoint::max()) {
           const bool absent = state == State::absent;
           now_ = absent ? now_ + kDeadline : std::max(now_, channel_.wakeAt());
           expire();
@@ -176,7 +176,7 @@ class ChannelGame {
         send(1);
         break;
       case '9':
-        if (state == State::ready && channel_.empty() && !channel_.owesReply()) {
+        if (state == State::ready && channel_.empty() && channel_.inFlight() == 0) {
           channel_.dismissed();
           endProcess();
         }
@@ -219,7 +219,8 @@ class ChannelGame {
   void expire() {
     for (Asked& each : asked_) {
       const auto request = each.request.lock();
-      if (request != nullptr && request.get() == channel_.front()) each.mayTimeOut = true;
+      if (request != nullptr && !channel_.empty() && request.get() == &channel_.front())
+        each.mayTimeOut = true;
     }
     if (auto loss = channel_.expire(now_)) lose(*loss);
   }
@@ -257,13 +258,11 @@ class ChannelGame {
   }
 
   void send(std::size_t most) {
-    std::array<iovec, 4> parts;
-    while (channel_.hasUnsent() && most > 0) {
-      const std::size_t used = channel_.gather(parts);
+    while (channel_.hasOutput() && most > 0) {
       std::size_t count = 0;
-      for (std::size_t i = 0; i < used && most > 0; ++i) {
-        const std::size_t taken = std::min(parts[i].iov_len, most);
-        receiveBytes({static_cast<const char*>(parts[i].iov_base), taken});
+      for (const iovec& part : channel_.output()) {
+        const std::size_t taken = std::min(part.iov_len, most);
+        receiveBytes({static_cast<const char*>(part.iov_base), taken});
         count += taken;
         most -= taken;
       }
@@ -295,15 +294,14 @@ class ChannelGame {
   /// The first request of those that are open and not yet with the process.
   [[nodiscard]] char nextToSend() const {
     for (const Asked& each : asked_) {
-      if (each.outcomes > 0 || each.cancelled || begun().find(each.name) != std::string::npos) {
-        continue;
-      }
-      return each.name;
+      const bool isSent = begun().find(each.name) != std::string::npos;
+      const auto request = each.request.lock();
+      if (!isSent && request != nullptr && !request->isDone()) return each.name;
     }
     throw std::logic_error("sent what nobody asks for");
   }
 
-  void collect() { channel_.finished().deliverAll(); }
+  void collect() { channel_.finished().clear(); }
   void check() const {
     for (const Asked& each : asked_) {
       require(each.outcomes <= 1, "two outcomes");

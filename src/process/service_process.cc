@@ -1,4 +1,4 @@
-#include "client/service_process.h"
+#include "process/service_process.h"
 
 #include <fcntl.h>
 #include <poll.h>
@@ -16,7 +16,7 @@
 
 #include "frames/confinement_bits.h"
 
-namespace ironmoat::client {
+namespace ironmoat::process {
 
 namespace {
 
@@ -206,4 +206,4 @@ std::string ServiceProcess::wordsOnStandardError() const {
   return words;
 }
 
-}  // namespace ironmoat::client
+}  // namespace ironmoat::process

@@ -4,7 +4,7 @@
 
 #include <utility>
 
-namespace ironmoat::client {
+namespace ironmoat::process {
 
 /// Owns a descriptor, or none (-1).
 class FileDescriptor {
@@ -30,4 +30,4 @@ class FileDescriptor {
   int fd_ = -1;
 };
 
-}  // namespace ironmoat::client
+}  // namespace ironmoat::process

@@ -8,9 +8,9 @@
 #include <string>
 #include <utility>
 
-#include "client/file_descriptor.h"
+#include "process/file_descriptor.h"
 
-namespace ironmoat::client {
+namespace ironmoat::process {
 
 /// A process could not be started; `what()` says which program and why.
 class StartError : public std::runtime_error {
@@ -69,4 +69,4 @@ class ServiceProcess {
   siginfo_t status_ = {};
 };
 
-}  // namespace ironmoat::client
+}  // namespace ironmoat::process

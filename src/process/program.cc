@@ -1,15 +1,14 @@
-#include "client/default_program.h"
+#include "process/program.h"
 
 #include <dlfcn.h>
 #include <sys/auxv.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <filesystem>
 #include <system_error>
 
-#include "client/trusted_path.h"
-
-namespace ironmoat::client {
+namespace ironmoat::process {
 
 namespace {
 
@@ -39,9 +38,21 @@ std::string programOfThisInstallation() {
 
 }  // namespace
 
+bool isOutOfOthersReach(std::filesystem::path path) {
+  for (;; path = path.parent_path()) {
+    struct stat status = {};
+    if (::lstat(path.c_str(), &status) != 0) return false;
+    if (status.st_uid != 0 && status.st_uid != ::geteuid()) return false;
+    // In a sticky folder others cannot rename or remove what is not theirs.
+    const bool sticky = S_ISDIR(status.st_mode) && (status.st_mode & S_ISVTX) != 0;
+    if ((status.st_mode & (S_IWGRP | S_IWOTH)) != 0 && !sticky) return false;
+    if (!path.has_relative_path()) return true;
+  }
+}
+
 std::string defaultProgram() {
   std::string found = programOfThisInstallation();
   return found.empty() ? std::string(IRONMOAT_LIBEXEC) + '/' + kName : found;
 }
 
-}  // namespace ironmoat::client
+}  // namespace ironmoat::process

@@ -1,4 +1,4 @@
-#include "client/trusted_path.h"
+#include "process/program.h"
 
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -7,7 +7,7 @@
 #include <filesystem>
 #include <fstream>
 
-namespace ironmoat::client {
+namespace ironmoat::process {
 namespace {
 
 namespace fs = std::filesystem;
@@ -49,4 +49,4 @@ TEST(TrustedPath, HoldsUnlessOthersCanReplaceTheFile) {
 }
 
 }  // namespace
-}  // namespace ironmoat::client
+}  // namespace ironmoat::process
