@@ -83,6 +83,7 @@ RequestList Channel::takeFollowers() noexcept {
   wasShared_ = inFlight_ > 1;
   if (wasShared_) tail_ = {};  // of a follower
   inFlight_ = 1;
+  wholeInFlight_ = std::min(wholeInFlight_, inFlight_);
   unsent_ = requests_.end();
   return followers;
 }
@@ -124,6 +125,7 @@ void Channel::receive(const Data& body, TimePoint now) {
   ++answered_;
   startFailures_ = 0;
   --inFlight_;
+  if (wholeInFlight_ > 0) --wholeInFlight_;
   finished_.splice(finished_.end(), requests_, requests_.begin());
   startClock(now);
 }
@@ -187,7 +189,7 @@ void Channel::forgetProcess() noexcept {
   unsent_ = requests_.begin();
   encoded_.truncate(0);
   tail_ = {};
-  encodedSent_ = inFlight_ = 0;
+  encodedSent_ = inFlight_ = wholeInFlight_ = 0;
   given_ = answered_ = slowInARow_ = 0;
   closed_ = wasShared_ = false;
 }
@@ -234,6 +236,7 @@ std::array<iovec, 2> Channel::output() noexcept {
   if (!hasEncoded()) {
     encoded_.truncate(0);
     encodedSent_ = 0;
+    wholeInFlight_ = inFlight_;
     while (canEncode() && tail_.empty() && encoded_.size() < kBatch) encodeNext();
   }
   return {{{encoded_.bytes() + encodedSent_, encoded_.size() - encodedSent_},

@@ -115,6 +115,8 @@ class Channel {
   [[nodiscard]] bool isWorthSending() const noexcept {
     return hasEncoded() || (canEncode() && unsent() >= inFlight_ / 2);
   }
+  /// Its owner must wait for room in the socket: no reply will come before more was sent.
+  [[nodiscard]] bool wantsRoom() const noexcept { return hasEncoded() && wholeInFlight_ == 0; }
   /// Bytes to send, valid until the next call of any function here.
   [[nodiscard]] std::array<iovec, 2> output() noexcept;
   /// The first `bytes` of `output` were sent.
@@ -165,7 +167,8 @@ class Channel {
   TimePoint greetBy_{};
 
   // Of the current process.
-  std::size_t inFlight_ = 0;                          // encoded and not answered
+  std::size_t inFlight_ = 0;       // encoded and not answered
+  std::size_t wholeInFlight_ = 0;  // of these, at least so many were sent to the last byte
   RequestList::iterator unsent_ = requests_.begin();  // the first one that is not encoded
   BlockBuilder encoded_;                              // frames, sent up to encodedSent_
   std::size_t encodedSent_ = 0;

@@ -46,7 +46,7 @@ void Connection::pull() noexcept {
 void Connection::push() noexcept {
   if (const TimePoint now = Clock::now(); channel_.wantsProcess(now)) start(now);
   if (process_ && channel_.isWorthSending()) send();
-  if (process_) watch(EPOLLIN | (channel_.isWorthSending() ? unsigned{EPOLLOUT} : 0U));
+  if (process_) watch(EPOLLIN | (channel_.wantsRoom() ? unsigned{EPOLLOUT} : 0U));
 }
 
 std::unique_ptr<Connection::Process> Connection::startProcess() const {
@@ -185,7 +185,7 @@ void Connection::wait() noexcept {
   std::array<pollfd, 2> fds = {{{-1, POLLIN, 0}, {-1, POLLIN, 0}}};
   if (process_) {
     fds[0].fd = process_->service.socket();
-    if (channel_.isWorthSending()) fds[0].events |= POLLOUT;
+    if (channel_.wantsRoom()) fds[0].events |= POLLOUT;
     fds[1].fd = process_->service.endedFd();
   }
   ::poll(fds.data(), fds.size(), millisecondsUntil(channel_.wakeAt()));

@@ -62,7 +62,7 @@ EventLoopClient::Handle EventLoopClient::submit(const Data& message,
 
 bool EventLoopClient::cancel(const Handle& handle) {
   const std::shared_ptr<Request> request = handle.request_.lock();
-  if (request == nullptr || request->isCancelled() || !request->hasCompletion()) return false;
+  if (request == nullptr || !request->hasCompletion()) return false;
   request->cancel();
   return true;
 }

@@ -27,10 +27,14 @@ class RecordRequest final : public Request {
   /// Its record; throws the error if that is the outcome.
   R takeRecord() { return (*std::move(outcome_)).value(); }
 
+  /// Releases the completion at once.
+  void cancel() noexcept override {
+    Request::cancel();
+    static_cast<void>(std::exchange(completion_, nullptr));
+  }
   [[nodiscard]] bool hasCompletion() const noexcept override { return completion_ != nullptr; }
   void deliver() noexcept override {
-    const Completion completion = std::exchange(completion_, nullptr);
-    if (completion && !isCancelled()) completion(take());
+    if (const Completion completion = std::exchange(completion_, nullptr)) completion(take());
   }
 
  private:

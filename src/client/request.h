@@ -61,7 +61,7 @@ class Request {
   [[nodiscard]] bool isCancelled() const noexcept { return cancelled_; }
 
   /// Its outcome is no longer wanted: it will complete without one.
-  void cancel() noexcept { cancelled_ = true; }
+  virtual void cancel() noexcept { cancelled_ = true; }
   /// Completes the request with what the reply says. Throws frames::RecordError or
   /// frames::FrameError if no service sends such a reply; the request is then not complete.
   void resolve(const frames::Reply& reply) {

@@ -107,12 +107,12 @@ void SharedEngine::drive(TimePoint until) noexcept {
     step(seen);
   }
   driven_ = false;
-  ++drives_;
   changed_.notify_all();
 }
 
 bool SharedEngine::step(Engine::Seen seen) noexcept {
   engine_->step(seen);
+  ++steps_;
   return publish();
 }
 
@@ -144,11 +144,11 @@ void SharedEngine::run() noexcept {
       lock.lock();
     } else if (inFlight_ == 0) {
       lock.waitUntil(threadWakes_, TimePoint::max());
-    } else if (!driven_ && (completions_ > 0 || (waiters_ == 0 && drives_ == seen))) {
+    } else if (!driven_ && (completions_ > 0 || (waiters_ == 0 && steps_ == seen))) {
       drive(Clock::now() + kTick);
-      seen = drives_;
+      seen = steps_;
     } else {
-      seen = drives_;
+      seen = steps_;
       lock.waitUntil(threadWakes_, Clock::now() + kTick);
     }
   }

@@ -60,7 +60,7 @@ class SharedEngine {
   bool driven_ IRONMOAT_GUARDED_BY(mutex_) = false;
   bool stopping_ IRONMOAT_GUARDED_BY(mutex_) = false;
   std::size_t waiters_ IRONMOAT_GUARDED_BY(mutex_) = 0;  // threads that will drive next
-  std::uint64_t drives_ IRONMOAT_GUARDED_BY(mutex_) = 0;
+  std::uint64_t steps_ IRONMOAT_GUARDED_BY(mutex_) = 0;
   std::size_t inFlight_ IRONMOAT_GUARDED_BY(mutex_) = 0;       // requests
   std::size_t bytesInFlight_ IRONMOAT_GUARDED_BY(mutex_) = 0;  // with kOverhead for each
   std::size_t completions_ IRONMOAT_GUARDED_BY(mutex_) = 0;    // in flight, to be called
