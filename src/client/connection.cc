@@ -46,7 +46,9 @@ void Connection::pull() noexcept {
 void Connection::push() noexcept {
   if (const TimePoint now = Clock::now(); channel_.wantsProcess(now)) start(now);
   if (process_ && channel_.isWorthSending()) send();
-  if (process_) watch(EPOLLIN | (channel_.wantsRoom() ? unsigned{EPOLLOUT} : 0U));
+  if (process_ && !watch(EPOLLIN | (channel_.wantsRoom() ? unsigned{EPOLLOUT} : 0U))) {
+    lose({Loss::Why::ended, textOrNone([] { return std::string("could not be watched"); })});
+  }
 }
 
 std::unique_ptr<Connection::Process> Connection::startProcess() const {
@@ -123,13 +125,13 @@ void Connection::lose(Loss loss) noexcept {
   const bool greeting = channel_.state() == Channel::State::greeting;
   loss.what = textOrNone([&] {
     std::string what = std::move(loss.what);
-    if (loss.why == Loss::Why::ended) {
+    if (what.empty()) {
       what = process_->service.lastWord(kGrace);
       if (greeting) what += " before its hello";
     }
     return greeting ? context_.settings.program + " " + what : what;
   });
-  watch(0);
+  static_cast<void>(watch(0));
   process_.reset();  // gone before anyone hears of it
   channel_.lost(loss, Clock::now());
 }
@@ -137,7 +139,7 @@ void Connection::lose(Loss loss) noexcept {
 void Connection::dismiss() noexcept {
   successor_.reset();
   if (!process_) return;
-  watch(0);
+  static_cast<void>(watch(0));
   process_.reset();
   channel_.dismissed();
 }
@@ -192,17 +194,22 @@ void Connection::wait() noexcept {
   if (fds[0].revents == 0 && fds[1].revents != 0) checkEnd();
 }
 
-void Connection::watch(unsigned events) noexcept {
+/// Returns false when the kernel has no memory for it.
+bool Connection::watch(unsigned events) noexcept {
   const unsigned before = std::exchange(watched_, events);
-  if (epoll_ < 0 || before == events) return;
+  if (epoll_ < 0 || before == events) return true;
   const int change = before == 0 ? EPOLL_CTL_ADD : events == 0 ? EPOLL_CTL_DEL : EPOLL_CTL_MOD;
-  epoll_event event = {};
-  event.events = events;
-  ::epoll_ctl(epoll_, change, process_->service.socket(), &event);
-  if (change == EPOLL_CTL_MOD || process_->service.endedFd() < 0) return;
-  event.events = EPOLLIN;
-  event.data.ptr = this;
-  ::epoll_ctl(epoll_, change, process_->service.endedFd(), &event);
+  const auto apply = [&](int fd, unsigned reported, void* with) {
+    epoll_event event = {};
+    event.events = reported;
+    event.data.ptr = with;
+    return ::epoll_ctl(epoll_, change, fd, &event) == 0;
+  };
+  bool applied = apply(process_->service.socket(), events, nullptr);
+  if (change != EPOLL_CTL_MOD && process_->service.endedFd() >= 0) {
+    applied &= apply(process_->service.endedFd(), EPOLLIN, this);
+  }
+  return applied;
 }
 
 }  // namespace ironmoat::client

@@ -57,7 +57,7 @@ class Connection {
   /// Reads once and hands what came to the channel; returns whether anything came.
   bool receive() noexcept;
   void lose(Loss loss) noexcept;
-  void watch(unsigned events) noexcept;
+  [[nodiscard]] bool watch(unsigned events) noexcept;
   [[nodiscard]] bool isDue(TimePoint now) const noexcept;
 
   Context& context_;

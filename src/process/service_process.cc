@@ -142,7 +142,7 @@ bool ServiceProcess::reap(std::chrono::milliseconds time) noexcept {
     const int result =
         pidfd_ ? ::waitid(kPidfd, static_cast<id_t>(pidfd_.get()), &info, WEXITED | WNOHANG)
                : ::waitid(P_PID, static_cast<id_t>(pid_), &info, WEXITED | WNOHANG);
-    if (result != 0 && errno != EINTR) {
+    if (result != 0 && errno == ECHILD) {
       pid_ = 0;  // reaped by others
     } else if (result == 0 && info.si_pid != 0) {
       pid_ = 0;
@@ -151,7 +151,7 @@ bool ServiceProcess::reap(std::chrono::milliseconds time) noexcept {
       const auto left = std::chrono::ceil<std::chrono::milliseconds>(until - Clock::now()).count();
       if (left <= 0) return false;
       pollfd ended = {pidfd_.get(), POLLIN, 0};
-      ::poll(&ended, 1, pidfd_ ? static_cast<int>(left) : 1);
+      ::poll(&ended, 1, pidfd_ && result == 0 ? static_cast<int>(left) : 1);
     }
   }
   return true;
