@@ -23,7 +23,8 @@
 #include "ironmoat/client.h"
 #include "ironmoat/command_response.h"
 #include "ironmoat/event_loop_client.h"
-#include "support/leaves_nothing.h"
+#include "support/client_outcome.h"
+#include "support/leak_check.h"
 
 namespace {
 
@@ -76,12 +77,13 @@ namespace ironmoat {
 namespace {
 
 using namespace std::chrono_literals;
-using Outcome = ironmoat::Outcome<VeskCommandResponse>;
+using testing::inWords;
+using testing::Outcome;
 
-std::string inWords(const Outcome& outcome) {
-  if (outcome) return std::to_string(outcome->command);
-  if (const auto* const error = outcome.serviceError()) return std::string(nameOf(error->kind()));
-  return outcome.outOfMemory() ? "outOfMemory" : "rejected";
+/// The record's command or the kind of the error.
+std::string brief(const Outcome& outcome) {
+  const std::string words = inWords(outcome);
+  return words.substr(0, words.find(':'));
 }
 
 /// Each way to an outcome, a death of the service among them. Returns what came of each.
@@ -90,19 +92,18 @@ std::vector<std::string> useClients(const ClientOptions& options) {
   {
     Client client(options);
     for (const char* message : {"echo 1", "exit 3", "echo 2"}) {
-      outcomes.push_back(
-          inWords(client.tryUnpack<VeskCommandResponse>(Data(std::string(message)))));
+      outcomes.push_back(brief(client.tryUnpack<VeskCommandResponse>(Data(std::string(message)))));
     }
     auto first = client.submit<VeskCommandResponse>(Data(std::string("echo 3")));
     auto second = client.submit<VeskCommandResponse>(Data(std::string("slow 4")));
-    outcomes.push_back(inWords(first.outcome()));
-    outcomes.push_back(inWords(second.outcome()));
+    outcomes.push_back(brief(first.outcome()));
+    outcomes.push_back(brief(second.outcome()));
   }
   EventLoopClient loop(options);
   for (const char* message : {"echo 5", "echo 6"}) {
     bool done = false;
     loop.submit<VeskCommandResponse>(Data(std::string(message)), [&](const Outcome& outcome) {
-      outcomes.push_back(inWords(outcome));
+      outcomes.push_back(brief(outcome));
       done = true;
     });
     while (!done) {
@@ -114,7 +115,7 @@ std::vector<std::string> useClients(const ClientOptions& options) {
   return outcomes;
 }
 
-class SystemCallsTest : public testing::LeavesNothing {};
+class SystemCallsTest : public testing::LeakCheck {};
 
 TEST_F(SystemCallsTest, FailureOfAnyCallCostsAtMostARetry) {
   const struct {
@@ -127,9 +128,7 @@ TEST_F(SystemCallsTest, FailureOfAnyCallCostsAtMostARetry) {
       {"poll", {EINTR}},           {"epoll_ctl", {ENOMEM}},      {"epoll_wait", {EINTR}},
       {"read", {EAGAIN}},          {"getrandom", {ENOSYS}},
   };
-  ClientOptions options;
-  options.program = FAKE_SERVICE;
-  options.deadline = 5s;
+  const ClientOptions options = testing::optionsFor(FAKE_SERVICE, 5s);
   const std::vector<std::string> usual = {"1", "crashed", "2", "3", "4", "5", "6"};
   for (const auto& row : rows) {
     failingCall = row.call;
@@ -160,7 +159,7 @@ TEST_F(SystemCallsTest, AnEventLoopClientWithoutADescriptorThrows) {
   untilFailure = 1;
   Client client;
   EXPECT_EQ(inWords(client.submit<VeskCommandResponse>(Data(std::string("x"))).outcome()),
-            "unavailable");
+            "unavailable: cannot start the client's thread: epoll_create1: Too many open files");
 }
 
 }  // namespace

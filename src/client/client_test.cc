@@ -21,22 +21,19 @@
 #include "ironmoat/command_response.h"
 #include "ironmoat/event_loop_client.h"
 #include "ironmoat/limits.h"
-#include "support/leaves_nothing.h"
+#include "support/client_outcome.h"
+#include "support/leak_check.h"
 
 namespace ironmoat {
 namespace {
 
 using namespace std::chrono_literals;
-using Pending = ironmoat::Pending<ironmoat::VeskCommandResponse>;
+using testing::inWords;
+using testing::Outcome;
+using testing::Pending;
 
-Client::Options options(std::string program, std::chrono::milliseconds deadline) {
-  Client::Options all;
-  all.program = std::move(program);
-  all.deadline = deadline;
-  return all;
-}
 Client::Options fake(std::chrono::milliseconds deadline = 20s) {
-  return options(FAKE_SERVICE, deadline);
+  return testing::optionsFor(FAKE_SERVICE, deadline);
 }
 
 std::filesystem::path ownFolder() {
@@ -62,17 +59,6 @@ std::vector<Pending> submitEchoes(Client& client, int count) {
   return all;
 }
 
-using Outcome = ironmoat::Outcome<ironmoat::VeskCommandResponse>;
-
-/// An outcome as text: the record's number, or the error.
-std::string inWords(const Outcome& outcome) {
-  if (outcome) return std::to_string(outcome->command);
-  if (const auto* const error = outcome.serviceError()) {
-    return std::string(nameOf(error->kind())) + ": " + error->what();
-  }
-  const auto* const error = outcome.decodingError();
-  return std::string(nameOf(error->kind())) + " at " + error->path() + ": " + error->what();
-}
 std::string outcome(Client& client, const std::string& message) {
   return inWords(client.tryUnpack<VeskCommandResponse>(Data(message)));
 }
@@ -112,9 +98,9 @@ std::string throughUnpack(Client::Options options, const std::string& message) {
   try {
     return std::to_string(client.unpack<VeskCommandResponse>(Data(message)).command);
   } catch (const ServiceError& error) {
-    return std::string(nameOf(error.kind())) + ": " + error.what();
+    return inWords(Outcome(error));
   } catch (const DecodingError& error) {
-    return std::string(nameOf(error.kind())) + " at " + error.path() + ": " + error.what();
+    return inWords(Outcome(error));
   }
 }
 std::string throughPending(Client::Options options, const std::string& message) {
@@ -140,7 +126,7 @@ void expectEchoes(std::vector<Pending>& all) {
   for (std::size_t i = 0; i < all.size(); ++i) EXPECT_EQ(outcome(all[i]), std::to_string(i));
 }
 
-class ClientTest : public testing::LeavesNothing {
+class ClientTest : public testing::LeakCheck {
  public:
   static void TearDownTestSuite() { std::filesystem::remove_all(ownFolder()); }
 };
@@ -200,7 +186,7 @@ TEST_F(ClientTest, FailsTheCulpritAndNotItsNeighbours) {
   }
 }
 
-TEST_F(ClientTest, BelievesNothingThatWasNotAskedFor) {
+TEST_F(ClientTest, IgnoresUnsolicitedReplies) {
   for (const char* first : {"takeOver 1", "twice 1", "unasked 1", "foresee 1"}) {
     Client client(fake(300ms));
     EXPECT_EQ(outcome(client, first), "1") << "answered before it shows";
@@ -214,7 +200,7 @@ TEST_F(ClientTest, BelievesNothingThatWasNotAskedFor) {
 
 TEST_F(ClientTest, StopsStartingAServiceThatNeverAnswers) {
   for (const char* name : {"chatty", "leaves_after_hello", "leaves"}) {
-    Client client(options(fakeCalled(name), 2s));
+    Client client(testing::optionsFor(fakeCalled(name), 2s));
     for (int i = 0; i < 3; ++i) {
       const std::string got = outcome(client, "echo 1");
       EXPECT_TRUE(got.starts_with("unavailable: ") || got.starts_with("crashed: ")) << got;
@@ -237,7 +223,7 @@ TEST_F(ClientTest, TimesOutOnlyTheRequestThatHangs) {
   }
 }
 
-TEST_F(ClientTest, BytesInFlightAreBounded) {
+TEST_F(ClientTest, SubmitWaitsWhileTooManyBytesAreInFlight) {
   Client::Options all = fake();
   all.maxBytesInFlight = 10000;
   Client client(all);
@@ -258,7 +244,7 @@ TEST_F(ClientTest, BytesInFlightAreBounded) {
   EXPECT_EQ(submitted, 5);
 }
 
-TEST_F(ClientTest, OutcomesComeWhoeverWaitsForThem) {
+TEST_F(ClientTest, OutcomesComeWhicheverThreadWaits) {
   Client::Options all = fake();
   all.maxBytesInFlight = 3000;
   std::vector<Pending> waiting;
@@ -300,7 +286,7 @@ TEST_F(ClientTest, OutcomesComeWhoeverWaitsForThem) {
   expectEchoes(unheard);
 }
 
-TEST_F(ClientTest, WhoeverIsCancelledHoldsUpNobody) {
+TEST_F(ClientTest, ACancelledThreadHoldsUpNoOther) {
   Client::Options all = fake();
   all.maxBytesInFlight = 1200;
   Client client(all);
@@ -343,7 +329,7 @@ TEST_F(ClientTest, IsUnavailableWithoutAUsableService) {
       {fakeCalled("silent"), "silent sent no hello before the start deadline"},
   };
   for (const auto& row : rows) {
-    Client client(options(row.program, 1ms));
+    Client client(testing::optionsFor(row.program, 1ms));
     Pending first = submit(client, "echo 1");
     for (const std::string& got : {outcome(client, "echo 2"), outcome(first)}) {
       EXPECT_TRUE(got.starts_with("unavailable: ")) << got;
@@ -352,10 +338,10 @@ TEST_F(ClientTest, IsUnavailableWithoutAUsableService) {
   }
 }
 
-TEST_F(ClientTest, AServiceThatComesBackIsUsed) {
+TEST_F(ClientTest, UsesAServiceThatWasInstalledLater) {
   const std::string program = fakeCalled("replaced");
   std::filesystem::remove(program);
-  Client client(options(program, 2s));
+  Client client(testing::optionsFor(program, 2s));
   for (int i = 0; i < 4; ++i) EXPECT_EQ(outcome(client, "echo 1").substr(0, 11), "unavailable");
   fakeCalled("replaced");
   EXPECT_EQ(outcome(client, "echo 1"), "1");
@@ -401,7 +387,7 @@ TEST_F(ClientTest, ServesCallersInTheirOrder) {
   EXPECT_EQ(order, (std::vector<int>{0, 1, 2, 3, 4}));
 }
 
-TEST_F(ClientTest, LetsNothingSlowOrLargeHoldUpOthers) {
+TEST_F(ClientTest, SlowAndLargeRequestsDoNotHoldUpOthers) {
   Client::Options all = fake();
   all.processes = 2;
   Loop loop(all);
@@ -470,7 +456,7 @@ TEST_F(ClientTest, LoopSleepsWhileARequestIsHeldBack) {
   loop.run(8);
 }
 
-TEST_F(ClientTest, ACompletionThatSubmitsAtTheEndOfItsClientIsHeard) {
+TEST_F(ClientTest, ACompletionMaySubmitWhileItsClientEnds) {
   std::string outcomes;
   {
     Client client(fake());

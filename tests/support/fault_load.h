@@ -22,14 +22,14 @@
 #include "frames/confinement_bits.h"
 #include "ironmoat/client.h"
 #include "ironmoat/command_response.h"
-#include "support/leaves_nothing.h"
+#include "support/client_outcome.h"
+#include "support/leak_check.h"
 
 /// A client under load, a service that is killed, and what comes of it.
 namespace ironmoat::testing {
 
 using namespace std::chrono_literals;
 using Clock = std::chrono::steady_clock;
-using Pending = ironmoat::Pending<ironmoat::VeskCommandResponse>;
 
 /// `--full` was given: minutes by hand instead of seconds in CI.
 inline bool fullSize = false;
@@ -37,14 +37,7 @@ inline int sized(int usual, int full) {
   return fullSize ? full : frames::kSanitizedBuild ? std::max(usual / 5, 2) : usual;
 }
 
-using FaultsTest = LeavesNothing;
-
-inline Client::Options optionsFor(const char* program, std::chrono::milliseconds deadline = 20s) {
-  Client::Options options;
-  options.program = program;
-  options.deadline = deadline;
-  return options;
-}
+using FaultsTest = LeakCheck;
 
 /// Messages for the real service. One in eight is no property list; the others have the number for
 /// their command and a token, sometimes one of many kilobytes.

@@ -10,12 +10,12 @@
 namespace ironmoat::testing {
 
 /// Each test leaves descriptors, threads and children as they were.
-class LeavesNothing : public ::testing::Test {
+class LeakCheck : public ::testing::Test {
  public:
   static void SetUpTestSuite() {
     std::thread([] {}).join();  // sanitizers start a thread of their own with the first
   }
-  ~LeavesNothing() override {
+  ~LeakCheck() override {
     EXPECT_EQ(entries("/proc/self/fd"), descriptors_);
     EXPECT_EQ(entries("/proc/self/task"), threads_);
     EXPECT_EQ(::waitpid(-1, nullptr, WNOHANG), -1) << "a child was left";
