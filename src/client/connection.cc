@@ -153,7 +153,8 @@ bool Connection::isDue(TimePoint now) const noexcept {
 }
 
 bool Connection::isYielding() const noexcept {
-  return successor_ && process_ && isReadable(successor_->service.socket());
+  return successor_ && channel_.state() == Channel::State::ready &&
+         isReadable(successor_->service.socket());
 }
 
 void Connection::renew() noexcept {
