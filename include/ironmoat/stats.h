@@ -26,7 +26,8 @@ struct Stats {
   std::uint64_t retired = 0;        ///< of those, processes replaced for their age
   std::uint64_t limitedMemory = 0;  ///< of `started`, processes with an address space below 1 GiB
 
-  std::uint64_t inFlight = 0;       ///< requests without an outcome, now
+  std::uint64_t inFlight =
+      0;  ///< requests without an outcome, or whose completion was not called yet
   std::uint64_t bytesInFlight = 0;  ///< bytes of their messages
 };
 

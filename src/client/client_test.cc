@@ -490,6 +490,12 @@ TEST_F(ClientTest, CountsWhatItDoes) {
   EXPECT_EQ(stats.retried, 1U);
   EXPECT_EQ(stats.started - stats.ended, 2U);
   EXPECT_EQ(stats.inFlight, 0U);
+
+  Loop loop(fake());
+  loop.submit(std::string(limits::messageBytes + 1, 'x'));
+  EXPECT_EQ(loop.client().stats().inFlight, 1U) << "its completion is to be called";
+  loop.run(1);
+  EXPECT_EQ(loop.client().stats().inFlight, 0U);
 }
 
 TEST_F(ClientTest, TakesADeadlineForEachRequest) {

@@ -33,9 +33,6 @@ class RecordRequest final : public Request {
     static_cast<void>(std::exchange(completion_, nullptr));
   }
   [[nodiscard]] bool hasCompletion() const noexcept override { return completion_ != nullptr; }
-  void deliver() noexcept override {
-    if (const Completion completion = std::exchange(completion_, nullptr)) completion(take());
-  }
 
  private:
   const Failure* read(const frames::Reply& reply) override {
@@ -56,6 +53,9 @@ class RecordRequest final : public Request {
       set(error);
     }
     return outcome_->error();
+  }
+  void callCompletion() noexcept override {
+    if (const Completion completion = std::exchange(completion_, nullptr)) completion(take());
   }
   void set(Failure failure) noexcept override { outcome_.emplace(std::move(failure)); }
 

@@ -82,8 +82,11 @@ class Request {
   [[nodiscard]] bool isDone() const noexcept { return done_.load(std::memory_order_acquire); }
   /// `deliver` has a completion to call.
   [[nodiscard]] virtual bool hasCompletion() const noexcept = 0;
-  /// Calls the completion, once.
-  virtual void deliver() noexcept = 0;
+  /// Calls the completion, once; until then the request counts as in flight.
+  void deliver() noexcept {
+    inFlight_.reset();
+    callCompletion();
+  }
 
  private:
   friend class Channel;
@@ -91,9 +94,10 @@ class Request {
   /// Takes the outcome out of the reply; returns the failure, or null for a record.
   virtual const Failure* read(const frames::Reply& reply) = 0;
   virtual void set(Failure failure) noexcept = 0;
+  virtual void callCompletion() noexcept = 0;
   void complete() noexcept {
     if (cancelled_) counters_.add(&Stats::cancelled);
-    inFlight_.reset();
+    if (!hasCompletion()) inFlight_.reset();
     done_.store(true, std::memory_order_release);
   }
 

@@ -94,9 +94,9 @@ class ChannelGame {
           asked_(asked),
           index_(index) {}
     [[nodiscard]] bool hasCompletion() const noexcept override { return false; }
-    void deliver() noexcept override {}
 
    private:
+    void callCompletion() noexcept override {}
     const client::Failure* read(const frames::Reply& reply) override {
       const std::string_view name = asked_[index_].name == reply.body.view()[0] ? "record" : "LIE";
       give(std::string(name));
