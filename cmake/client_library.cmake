@@ -67,9 +67,10 @@ install(DIRECTORY ${PROJECT_SOURCE_DIR}/include/ironmoat TYPE INCLUDE COMPONENT 
 include(CMakePackageConfigHelpers)
 set(config_folder ${CMAKE_INSTALL_LIBDIR}/cmake/Ironmoat)
 set(service ${CMAKE_INSTALL_LIBEXECDIR}/VeskIronmoatService)
+set(fake_service ${CMAKE_INSTALL_LIBEXECDIR}/ironmoat-fake-service)
 configure_package_config_file(${CMAKE_CURRENT_LIST_DIR}/IronmoatConfig.cmake.in
   ${PROJECT_BINARY_DIR}/IronmoatConfig.cmake
-  INSTALL_DESTINATION ${config_folder} PATH_VARS service)
+  INSTALL_DESTINATION ${config_folder} PATH_VARS service fake_service)
 write_basic_package_version_file(${PROJECT_BINARY_DIR}/IronmoatConfigVersion.cmake
   COMPATIBILITY SameMinorVersion)
 install(FILES ${PROJECT_BINARY_DIR}/IronmoatConfig.cmake
