@@ -1,5 +1,6 @@
 // A client and a confined service through everything that can happen to the service. By default in
-// seconds; `faults_test --full` takes the sizes and prints the figures of doc/faults.md. (S15, S16)
+// seconds; `faults_test --full` takes the sizes and prints the figures of doc/attacks.md. (S15,
+// S16)
 
 #include <sys/prctl.h>
 #include <sys/syscall.h>
