@@ -1,7 +1,7 @@
 # The units, and the Debian packages (the target `package`, or `cpack`): ironmoat, which is the
 # service and the tool; the library; its -dev. The preset `package` builds for where they install.
 
-foreach(unit ironmoat.socket ironmoat@.service)
+foreach(unit ironmoat@.socket ironmoat@.service)
   configure_file(${PROJECT_SOURCE_DIR}/packaging/systemd/${unit}.in
     ${PROJECT_BINARY_DIR}/${unit} @ONLY)
   # Not in LIBDIR, which may be one architecture's.
