@@ -32,7 +32,7 @@ def message(*arguments, tool=TOOL, **options):
 def provoked(folder):
     yield message("--service", "/nonexistent")
     yield message("--service", "/etc/passwd")
-    yield message(preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_NOFILE, (8, 8)))
+    yield message(preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_NOFILE, (7, 7)))
     for kind in ("other_limits", "fails_to_confine"):
         program = folder / kind
         program.symlink_to(FAKE_START)

@@ -141,7 +141,8 @@ int startService() {
   posix_spawn_file_actions_destroy(&actions);
   ::close(ends[1]);
   if (error == 0) return ends[0];
-  std::fprintf(stderr, "cannot start %s: %s\n", program.c_str(), std::strerror(error));
+  static_cast<void>(
+      std::fprintf(stderr, "cannot start %s: %s\n", program.c_str(), std::strerror(error)));
   return -1;
 }
 

@@ -66,7 +66,7 @@ TEST(RecordLayoutTest, BytesThatBreakTheRulesAreRefused) {
   } rows[] = {
       {"", "the record ends too early"},
       {"\0\0"s + command, "a field that every record has is missing"},
-      {"\x01\x20"s + command, "a field that no record has is present"},
+      {"\x01\x80"s + command, "a field that no record has is present"},
       {"\x01\0"s + command + "x", "bytes follow the record"},
       {"\x01\0"s + command.substr(1), "the record ends too early"},
       {"\x41\0"s + command + "\2"s, "a truth value is neither 0 nor 1"},
