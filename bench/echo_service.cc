@@ -69,7 +69,7 @@ int main() {
   confinement::prepareMemory();
   BlockBuilder body;
   frames::encodeRecord(VeskCorvelPayloadUnpacker().unpack(
-                           bench::messageOf(bench::typicalPayload(0), plist::Form::binary)),
+                           bench::messageOf(bench::typicalPayload(0), plist::Format::binary)),
                        body);
   BlockBuilder out;
   frames::FrameAssembler assembler(frames::kMaxRequestBody, Sharing::oneThread);

@@ -62,7 +62,7 @@ double leastTime(const Data& message) {
   return least;
 }
 
-void report(std::string_view kind, std::string_view name, plist::Form form,
+void report(std::string_view kind, std::string_view name, plist::Format form,
             std::span<const Data> messages, bool timed) {
   // What happens once in a process, and what the processor soon learns.
   for (int i = 0; i < 3; ++i) unpackOnce(messages[0]);
@@ -86,14 +86,14 @@ void report(std::string_view kind, std::string_view name, plist::Form form,
 }
 
 void run(std::size_t smallest, std::size_t largest, bool timed) {
-  constexpr plist::Form kForms[] = {plist::Form::binary, plist::Form::xml};
+  constexpr plist::Format kForms[] = {plist::Format::binary, plist::Format::xml};
   constexpr std::size_t kStream = 256;  // messages: enough for counts
-  const auto one = [timed](std::string_view kind, std::string_view name, plist::Form form,
+  const auto one = [timed](std::string_view kind, std::string_view name, plist::Format form,
                            const Data& message) {
     report(kind, name, form, {&message, 1}, timed);
   };
   for (const Sample& each : samples()) {
-    for (const plist::Form form : kForms) {
+    for (const plist::Format form : kForms) {
       const Data message = messageOf(each.record, form);
       one("sample", each.name, form, message);
       one("wrong", each.name, form, messageOf(WrongAtLast{each.record}, form));
@@ -101,12 +101,12 @@ void run(std::size_t smallest, std::size_t largest, bool timed) {
     }
   }
   for (const Stream& stream : streams(kStream)) {
-    for (const plist::Form form : kForms) {
+    for (const plist::Format form : kForms) {
       report("stream", stream.name, form, messagesOf(stream, form), timed);
     }
   }
   for (const Shape& shape : shapes()) {
-    for (const plist::Form form : kForms) {
+    for (const plist::Format form : kForms) {
       for (std::size_t bytes = smallest; bytes <= largest; bytes *= 4) {
         const auto message = messageOfSize(shape, form, bytes);
         if (message) one("shape", shape.name, form, *message);

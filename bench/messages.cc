@@ -127,9 +127,9 @@ Data inOneThreadBlock(std::string_view bytes) {
   return Data(detail::Slice::copyOf(bytes, Sharing::oneThread));
 }
 
-Data brokenAtLast(const Data& message, plist::Form form) {
+Data brokenAtLast(const Data& message, plist::Format form) {
   std::string bytes(message.view());
-  if (form == plist::Form::xml) {
+  if (form == plist::Format::xml) {
     bytes.at(bytes.rfind('>') - 1) = '-';
   } else {
     constexpr std::size_t kTrailer = 32;  // its byte 6: the size of an offset, the last before it

@@ -39,9 +39,9 @@ std::string asOrdinaryWriters(std::string_view xml);
 
 /// The record as a message, ready to be unpacked.
 template <class R>
-Data messageOf(const R& record, plist::Form form) {
+Data messageOf(const R& record, plist::Format form) {
   const Data message = plist::PropertyListEncoder(form).encode(record);
-  if (form == plist::Form::binary) return inOneThreadBlock(message.view());
+  if (form == plist::Format::binary) return inOneThreadBlock(message.view());
   return inOneThreadBlock(asOrdinaryWriters(message.view()));
 }
 
@@ -60,10 +60,10 @@ struct WrongAtLast {
 
 /// The message with its last object out of bounds or its last end tag misspelt: all else is read by
 /// then.
-Data brokenAtLast(const Data& message, plist::Form form);
+Data brokenAtLast(const Data& message, plist::Format form);
 
-constexpr std::string_view nameOf(plist::Form form) {
-  return form == plist::Form::binary ? "binary" : "xml";
+constexpr std::string_view nameOf(plist::Format form) {
+  return form == plist::Format::binary ? "binary" : "xml";
 }
 
 }  // namespace ironmoat::bench

@@ -47,7 +47,7 @@ Client::Options options(const char* program) {
   return options;
 }
 
-Data typicalMessage() { return Data(messageOf(typicalPayload(0), plist::Form::binary).view()); }
+Data typicalMessage() { return Data(messageOf(typicalPayload(0), plist::Format::binary).view()); }
 
 void submitMany(const Data& message) {
   std::deque<Pending<DrelUserPayload>> inFlight;
@@ -102,7 +102,7 @@ void leave(const State&) {
 }
 
 void inProcess(State& state) {
-  const Data message = messageOf(typicalPayload(0), plist::Form::binary);
+  const Data message = messageOf(typicalPayload(0), plist::Format::binary);
   for (auto _ : state) {
     auto record = VeskCorvelPayloadUnpacker().unpack(message);
     benchmark::DoNotOptimize(&record);
@@ -119,12 +119,12 @@ void large(State& state) {
   VeskCorvelProtocolPayload record = typicalPayload(0);
   const auto size = static_cast<std::size_t>(state.range(0)) << 20;
   record.payload = Data(std::string(size - 4096, 'p'));  // so that the whole is within the limit
-  unpackAgainAndAgain(state, Data(messageOf(record, plist::Form::binary).view()));
+  unpackAgainAndAgain(state, Data(messageOf(record, plist::Format::binary).view()));
 }
 
 void refused(State& state) {
   const VeskCorvelProtocolPayload record = typicalPayload(0);
-  const Data message(messageOf(WrongAtLast{record}, plist::Form::binary).view());
+  const Data message(messageOf(WrongAtLast{record}, plist::Format::binary).view());
   for (auto _ : state) {
     try {
       benchmark::DoNotOptimize(client->unpack<DrelUserPayload>(message).command);

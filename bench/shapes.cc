@@ -7,7 +7,7 @@
 #include "messages.h"
 #include "plist/document_builder.h"
 #include "plist/writer.h"
-#include "support/binary_draft.h"
+#include "support/binary_builder.h"
 #include "values/utf8.h"
 
 namespace ironmoat::bench {
@@ -25,7 +25,7 @@ Payload heavyPayload(std::size_t number) {
   return payload;
 }
 
-Data nested(plist::Form form, std::size_t count) {
+Data nested(plist::Format form, std::size_t count) {
   constexpr std::size_t kDepth = 200;  // payloads; each takes two containers of nestedContainers
   Payload top;
   List<Payload> chains;
@@ -45,7 +45,7 @@ Data nested(plist::Form form, std::size_t count) {
   return messageOf(top, form);
 }
 
-Data wide(plist::Form form, std::size_t count) {
+Data wide(plist::Format form, std::size_t count) {
   Payload top;
   List<Payload> all;
   for (std::size_t i = 0; i < count; ++i) all.push_back(heavyPayload(i));
@@ -53,7 +53,7 @@ Data wide(plist::Form form, std::size_t count) {
   return messageOf(top, form);
 }
 
-Data blob(plist::Form form, std::size_t count) {
+Data blob(plist::Format form, std::size_t count) {
   Payload top;
   top.payload = Data(std::string(count, '\xA7'));
   return messageOf(top, form);
@@ -61,7 +61,7 @@ Data blob(plist::Form form, std::size_t count) {
 
 /// A dictionary of so many integers, which no record can be made to encode.
 template <class Key>
-Data manyEntries(plist::Form form, std::size_t count, Key key) {
+Data manyEntries(plist::Format form, std::size_t count, Key key) {
   plist::Document document;
   plist::DocumentBuilder builder(document, BlockRef(), Sharing::anyThread);
   static_cast<void>(builder.beginDictionary());
@@ -74,7 +74,7 @@ Data manyEntries(plist::Form form, std::size_t count, Key key) {
   builder.end();
   builder.finish();
   const Data bytes =
-      form == plist::Form::binary ? plist::writeBinary(document) : plist::writeXml(document);
+      form == plist::Format::binary ? plist::writeBinary(document) : plist::writeXml(document);
   return inOneThreadBlock(bytes.view());
 }
 
@@ -93,13 +93,13 @@ std::string prose(std::size_t number) {
   return text;
 }
 
-Data utf16(plist::Form form, std::size_t count) {
+Data utf16(plist::Format form, std::size_t count) {
   const Payload top = texts(count, [](std::size_t i) {
     std::string text = std::to_string(i);
     for (int n = 0; n < 12; ++n) text += " сообщение 消息 😀";
     return text;
   });
-  if (form == plist::Form::binary) return messageOf(top, form);
+  if (form == plist::Format::binary) return messageOf(top, form);
   std::string text(messageOf(top, form).view());
   const std::size_t encoding = text.find("UTF-8");
   if (encoding != std::string::npos) text.replace(encoding, 5, "UTF-16");
@@ -112,11 +112,11 @@ Data utf16(plist::Form form, std::size_t count) {
 }
 
 /// Arrays in which everything is shared: each is in two others, and one text is in all.
-std::optional<Data> shared(plist::Form form, std::size_t count) {
-  if (form == plist::Form::xml) return std::nullopt;
+std::optional<Data> shared(plist::Format form, std::size_t count) {
+  if (form == plist::Format::xml) return std::nullopt;
   constexpr std::size_t kGroup = 200;
   constexpr std::size_t kTexts = 40;
-  testing::BinaryDraft draft;
+  testing::BinaryBuilder draft;
   draft.offsetSize = draft.referenceSize = 4;
   constexpr std::uint64_t kFirst = 5;
   const std::uint64_t text = kFirst + count;
@@ -133,7 +133,7 @@ std::optional<Data> shared(plist::Form form, std::size_t count) {
   return inOneThreadBlock(draft.text());
 }
 
-Data tiny(plist::Form form, std::size_t count) {
+Data tiny(plist::Format form, std::size_t count) {
   Payload top;
   List<VeskHoplineAllocationStatus> all(count);
   for (std::size_t i = 0; i < count; ++i) all[i].participantId = static_cast<Int64>(i);
@@ -163,7 +163,7 @@ const std::vector<Shape>& shapes() {
       {"UTF-16", 500, utf16},
       {"entities", 500,
        [](auto form, auto count) -> std::optional<Data> {
-         if (form == plist::Form::binary) return std::nullopt;
+         if (form == plist::Format::binary) return std::nullopt;
          return messageOf(
              texts(count, [](auto i) { return std::string(100, '&').append(std::to_string(i)); }),
              form);
@@ -174,7 +174,7 @@ const std::vector<Shape>& shapes() {
   return all;
 }
 
-std::optional<Data> messageOfSize(const Shape& shape, plist::Form form, std::size_t bytes) {
+std::optional<Data> messageOfSize(const Shape& shape, plist::Format form, std::size_t bytes) {
   std::size_t count = std::max<std::size_t>(bytes / shape.step, 1);
   std::optional<Data> message = shape.make(form, count);
   for (int round = 0; message && round < 4; ++round) {

@@ -17,12 +17,12 @@ struct Shape {
   /// About how many bytes of message one more of the count is; says where to start.
   std::size_t step;
   /// Nothing where the form has no such shape.
-  std::function<std::optional<Data>(plist::Form form, std::size_t count)> make;
+  std::function<std::optional<Data>(plist::Format form, std::size_t count)> make;
 };
 
 const std::vector<Shape>& shapes();
 
 /// A message of the shape of about so many bytes, and at most limits::messageBytes.
-std::optional<Data> messageOfSize(const Shape& shape, plist::Form form, std::size_t bytes);
+std::optional<Data> messageOfSize(const Shape& shape, plist::Format form, std::size_t bytes);
 
 }  // namespace ironmoat::bench

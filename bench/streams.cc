@@ -171,7 +171,7 @@ std::vector<Stream> streams(std::size_t count) {
   };
 }
 
-std::vector<Data> messagesOf(const Stream& stream, plist::Form form) {
+std::vector<Data> messagesOf(const Stream& stream, plist::Format form) {
   Chance chance(4);
   std::vector<std::size_t> places(Keys::count);
   std::iota(places.begin(), places.end(), std::size_t{0});
@@ -179,8 +179,8 @@ std::vector<Data> messagesOf(const Stream& stream, plist::Form form) {
   for (const Payload& record : stream.records) {
     if (stream.anyOrder) places = placesInAnyOrder(chance);
     const Data message = messageOf(Mixed{record, places, stream.unknownKeys}, form);
-    messages.push_back(stream.compact && form == plist::Form::xml ? withoutLines(message)
-                                                                  : message);
+    messages.push_back(stream.compact && form == plist::Format::xml ? withoutLines(message)
+                                                                    : message);
   }
   return messages;
 }

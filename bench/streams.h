@@ -31,6 +31,6 @@ struct Stream {
 /// The same ones for the same `count`, always.
 std::vector<Stream> streams(std::size_t count);
 
-std::vector<Data> messagesOf(const Stream& stream, plist::Form form);
+std::vector<Data> messagesOf(const Stream& stream, plist::Format form);
 
 }  // namespace ironmoat::bench

@@ -37,14 +37,14 @@ void add(std::string_view name, std::string_view what, std::vector<Message> mess
 
 Int unpack(const Data& message) { return VeskCorvelPayloadUnpacker().unpack(message).command; }
 
-void addForm(std::string_view name, const std::vector<Data>& messages, plist::Form form) {
+void addForm(std::string_view name, const std::vector<Data>& messages, plist::Format form) {
   const std::string prefix = std::string(nameOf(form)) + "/";
   std::vector<std::string> texts;
   for (const Data& message : messages) texts.emplace_back(message.view());
   add(name, prefix + "unpack", messages, unpack);
   add(name, prefix + "copy_and_unpack", texts,
       [](const std::string& text) { return unpack(inOneThreadBlock(text)); });
-  if (form != plist::Form::xml) return;
+  if (form != plist::Format::xml) return;
   add(name, "expat", texts, expatEvents);
   add(name, "pugixml", texts, pugixmlDom);
 }
@@ -56,7 +56,7 @@ void addProtobuf(std::string_view name, const std::vector<std::string>& messages
 }
 
 void addSample(const Sample& sample) {
-  for (const plist::Form form : {plist::Form::binary, plist::Form::xml}) {
+  for (const plist::Format form : {plist::Format::binary, plist::Format::xml}) {
     const Data message = messageOf(sample.record, form);
     addForm(sample.name, {message}, form);
     const auto addRefused = [&](const char* what, const Data& bad) {
@@ -73,7 +73,7 @@ void addSample(const Sample& sample) {
 }
 
 void addStream(const Stream& stream) {
-  for (const plist::Form form : {plist::Form::binary, plist::Form::xml}) {
+  for (const plist::Format form : {plist::Format::binary, plist::Format::xml}) {
     addForm(stream.name, messagesOf(stream, form), form);
   }
   std::vector<std::string> messages;

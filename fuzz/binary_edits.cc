@@ -4,7 +4,7 @@
 #include <iterator>
 #include <utility>
 
-#include "support/binary_draft.h"
+#include "support/binary_builder.h"
 #include "wire_keys.h"
 
 namespace ironmoat::fuzz {

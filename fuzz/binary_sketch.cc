@@ -4,7 +4,7 @@
 #include <map>
 
 #include "plist/binary_format.h"
-#include "support/binary_draft.h"
+#include "support/binary_builder.h"
 
 namespace ironmoat::fuzz {
 
@@ -12,7 +12,7 @@ namespace {
 
 using testing::bigEndianBytes;
 
-constexpr std::size_t kMostObjects = 5000;
+constexpr std::size_t kMaxObjects = 5000;
 constexpr std::size_t kHeader = plist::binary::kHeader.size();
 constexpr std::size_t kTrailer = plist::binary::kTrailerSize;
 
@@ -82,7 +82,7 @@ BinarySketch BinarySketch::parse(std::string_view bytes) {
   const std::uint64_t table = std::min<std::uint64_t>(number(trailer.substr(24, 8)), bytes.size());
   const std::string_view area = bytes.substr(0, static_cast<std::size_t>(table));
   const std::uint64_t entries =
-      std::min<std::uint64_t>({count, (bytes.size() - table) / sketch.offsetSize, kMostObjects});
+      std::min<std::uint64_t>({count, (bytes.size() - table) / sketch.offsetSize, kMaxObjects});
   std::map<std::uint64_t, std::size_t> known;
   for (std::uint64_t i = 0; i < entries; ++i) {
     const std::uint64_t at = number(

@@ -12,20 +12,20 @@
 #include "plist/reader.h"
 #include "plist/writer.h"
 #include "require.h"
-#include "support/refusal.h"
+#include "support/rejection.h"
 #include "support/show_document.h"
 
 namespace ironmoat::fuzz {
 
-/// The refusal of a reader, "kind: sentence", or nothing when it accepted the message.
+/// The rejection of a reader, "kind: sentence", or nothing when it accepted the message.
 template <class Read>
-std::string refusalOf(Read read, const Data& message, plist::Document& document) {
-  const std::optional<DecodingError> refusal = read(message, document);
-  if (!refusal) return {};
-  require(refusal->path().empty());
-  require(refusal->offset().value_or(0) <= message.size());
-  require((refusal->kind() == DecodingError::Kind::malformed) == refusal->offset().has_value());
-  return testing::inWords(*refusal);
+std::string rejectionOf(Read read, const Data& message, plist::Document& document) {
+  const std::optional<DecodingError> rejection = read(message, document);
+  if (!rejection) return {};
+  require(rejection->path().empty());
+  require(rejection->offset().value_or(0) <= message.size());
+  require((rejection->kind() == DecodingError::Kind::malformed) == rejection->offset().has_value());
+  return testing::inWords(*rejection);
 }
 
 /// The tree that a document stands for, walked without trust: shared nodes are counted each time,
@@ -98,8 +98,8 @@ template <class Read>
 void checkReading(Read read, const Data& message) {
   plist::Document document;
   plist::Document again;
-  const std::string error = refusalOf(read, message, document);
-  require(refusalOf(read, message, again) == error);
+  const std::string error = rejectionOf(read, message, document);
+  require(rejectionOf(read, message, again) == error);
   if (!error.empty()) return;
   const Walk walked = walk(document);
   if (walked.tooLarge()) return;

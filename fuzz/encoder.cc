@@ -64,7 +64,7 @@ template <class Wire>
 void roundTrip(std::span<const std::uint8_t> bytes, double presence) {
   const Wire record =
       testing::BasicRecordGenerator(InputNumbers(bytes), presence).template make<Wire>(3);
-  for (const plist::Form form : {plist::Form::binary, plist::Form::xml}) {
+  for (const plist::Format form : {plist::Format::binary, plist::Format::xml}) {
     const Data message = plist::PropertyListEncoder(form).encode(record);
     Wire again;
     fuzz::require(!plist::PropertyListDecoder().decode(message, again));

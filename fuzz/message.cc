@@ -1,6 +1,6 @@
 // Any bytes as a message of each kind, all the way: decoded as a second, slow decoder does it, paid
 // for exactly as there; unpacked, carried in a reply, taken out of it; written again in both forms
-// and unpacked to the same reply, or to the same refusal. (S1, S2, S4, S9-S11)
+// and unpacked to the same reply, or to the same rejection. (S1, S2, S4, S9-S11)
 
 #include <cstddef>
 #include <cstdint>
@@ -31,11 +31,11 @@ using fuzz::require;
 constexpr plist::Budget kSmallBudget{
     .recordBytes = 100'000, .deliveredBytes = 20'000, .scannedEntries = 2'000};
 
-Outcome refused(const DecodingError& error) {
+Outcome rejected(const DecodingError& error) {
   return {false, std::string(nameOf(error.kind())) + " " + error.path() + ": " + error.what()};
 }
 
-/// The reply's body, or the refusal in words.
+/// The reply's body, or the rejection in words.
 template <class Unpacker>
 Outcome unpack(const Data& message) {
   try {
@@ -45,19 +45,19 @@ Outcome unpack(const Data& message) {
     return {true, {block->bytes(), block->size()}};
   } catch (const DecodingError& rejection) {
     require(rejection.offset().value_or(0) <= message.size());
-    return refused(rejection);
+    return rejected(rejection);
   }
 }
 
-/// The record in the slow decoder's words, or the refusal; `left` is what the budget still has.
+/// The record in the slow decoder's words, or the rejection; `left` is what the budget still has.
 template <class Wire>
 Outcome decode(const plist::Document& document, plist::Budget& left) {
   plist::Decoding decoding{.document = document, .budget = left};
   Wire record;
   const bool accepted = record.decode(plist::Decoder(decoding));
   left = decoding.budget;
-  require(accepted != decoding.refusal.has_value());
-  if (!accepted) return refused(*decoding.refusal);
+  require(accepted != decoding.rejection.has_value());
+  if (!accepted) return rejected(*decoding.rejection);
   Outcome outcome{true, {}};
   fuzz::describe(outcome.text, record);
   return outcome;
@@ -92,25 +92,25 @@ void unpackAs(const Data& message, const plist::Document& document) {
   const fuzz::Walk walked = fuzz::walk(document);
   if (walked.tooLarge()) return;  // shared values written out take the fun out of fuzzing
 
-  const auto check = [&](auto write, plist::Form form) {
+  const auto check = [&](auto write, plist::Format form) {
     try {
       require(unpack<Unpacker>(write(form)) == first);
     } catch (const std::invalid_argument&) {
-      require(form == plist::Form::xml);  // text that XML cannot hold
+      require(form == plist::Format::xml);  // text that XML cannot hold
     }
   };
-  for (const plist::Form form : {plist::Form::binary, plist::Form::xml}) {
+  for (const plist::Format form : {plist::Format::binary, plist::Format::xml}) {
     if (walked.writable) {
       check(
-          [&](plist::Form as) {
-            return as == plist::Form::xml ? writeXml(document) : writeBinary(document);
+          [&](plist::Format as) {
+            return as == plist::Format::xml ? writeXml(document) : writeBinary(document);
           },
           form);
     }
     if (first.accepted) {
       Wire wire;
       require(!plist::PropertyListDecoder().decode(message, wire));
-      check([&](plist::Form as) { return plist::PropertyListEncoder(as).encode(wire); }, form);
+      check([&](plist::Format as) { return plist::PropertyListEncoder(as).encode(wire); }, form);
     }
   }
 }
@@ -120,7 +120,7 @@ void unpackAs(const Data& message, const plist::Document& document) {
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const Data message = testing::tightMessage({reinterpret_cast<const char*>(data), size});
   plist::Document document;
-  const std::string malformed = fuzz::refusalOf(plist::read, message, document);
+  const std::string malformed = fuzz::rejectionOf(plist::read, message, document);
   if (!malformed.empty()) {
     const Outcome outcome = unpack<VeskCommandResponseUnpacker>(message);
     require(!outcome.accepted && outcome == unpack<VeskCorvelPayloadUnpacker>(message));

@@ -1,6 +1,6 @@
-// Feeds every file named on the command line, or found below a folder named there, to the fuzz
-// target, and some changes of each where the target brings a mutator: how a corpus is replayed by a
-// compiler without libFuzzer.
+// Replays a corpus without libFuzzer: each file named on the command line, or below a folder named
+// there, goes to the fuzz target. So do some changes of it by the target's mutator, if it has one,
+// and after --damaged each beginning of a short file and the file with each bit flipped.
 
 #include <cstdint>
 #include <cstdio>
@@ -9,6 +9,7 @@
 #include <iterator>
 #include <memory>
 #include <span>
+#include <string_view>
 #include <vector>
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size);
@@ -35,10 +36,26 @@ void run(std::span<const std::uint8_t> bytes) {
   LLVMFuzzerTestOneInput(exact.get(), bytes.size());
 }
 
+void runDamaged(Bytes bytes) {
+  for (std::size_t length = 0; length < bytes.size(); ++length) {
+    run(std::span(bytes).first(length));
+  }
+  for (std::size_t bit = 0; bit < 8 * bytes.size(); ++bit) {
+    const auto mask = static_cast<std::uint8_t>(1 << (bit % 8));
+    bytes[bit / 8] ^= mask;
+    run(bytes);
+    bytes[bit / 8] ^= mask;
+  }
+}
+
+bool damaged = false;
+
 void replay(const std::filesystem::path& file) {
   std::ifstream stream(file, std::ios::binary);
   const Bytes bytes((std::istreambuf_iterator<char>(stream)), {});
   run(bytes);
+  constexpr std::size_t kShort = 1024;
+  if (damaged && bytes.size() <= kShort) runDamaged(bytes);
   constexpr std::size_t kRoom = 4096;
   if (LLVMFuzzerCustomMutator == nullptr || bytes.size() > kRoom) return;
   constexpr unsigned kChanges = 30;
@@ -56,6 +73,10 @@ void replay(const std::filesystem::path& file) {
 int main(int argc, char** argv) {
   int files = 0;
   for (int i = 1; i < argc; ++i) {
+    if (std::string_view(argv[i]) == "--damaged") {
+      damaged = true;
+      continue;
+    }
     if (!std::filesystem::is_directory(argv[i])) {
       replay(argv[i]);
       ++files;

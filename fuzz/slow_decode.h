@@ -77,31 +77,31 @@ class SlowDecoder {
       Outcome outcome{true, {}};
       record<R>(document_.root(), "", outcome.text);
       return outcome;
-    } catch (const Refused& refused) {
-      return {false, refused.text};
+    } catch (const Rejected& rejected) {
+      return {false, rejected.text};
     }
   }
   [[nodiscard]] const plist::Budget& left() const { return left_; }
 
  private:
   using Path = const std::string&;
-  struct Refused {
+  struct Rejected {
     std::string text;
   };
-  [[noreturn]] static void refuse(std::string_view kind, Path path, std::string_view sentence) {
-    throw Refused{std::string(kind) + " " + path + ": " + std::string(sentence)};
+  [[noreturn]] static void reject(std::string_view kind, Path path, std::string_view sentence) {
+    throw Rejected{std::string(kind) + " " + path + ": " + std::string(sentence)};
   }
 
   const plist::Node& expect(plist::Kind kind, plist::NodeIndex index, Path path) {
     const plist::Node& node = document_.node(index);
     if (node.kind != kind) {
-      refuse("typeMismatch", path,
+      reject("typeMismatch", path,
              "expected " + std::string(nameOf(kind)) + ", found " + std::string(nameOf(node.kind)));
     }
     return node;
   }
   static void pay(std::size_t& left, std::size_t amount, Path path, std::string_view sentence) {
-    if (amount > left) refuse("limitExceeded", path, sentence);
+    if (amount > left) reject("limitExceeded", path, sentence);
     left -= amount;
   }
 
@@ -109,7 +109,7 @@ class SlowDecoder {
   void record(plist::NodeIndex index, Path path, std::string& out) {
     const plist::Node& node = expect(plist::Kind::dictionary, index, path);
     pay(left_.scannedEntries, node.count, path,
-        "shared dictionaries come to more than the limit of 8388608 entries");
+        "size of shared dictionaries exceeds the limit of 8388608 entries");
     out += '{';
     std::size_t place = 0;
     testing::FieldsOf<R>::List::forEach([&](auto field) {
@@ -127,10 +127,9 @@ class SlowDecoder {
         for (const plist::NodeIndex other : document_.keys(node)) {
           inOtherCase |= lowered(document_.text(document_.node(other))) == lowered(key);
         }
-        refuse("keyNotFound", below,
-               inOtherCase
-                   ? "required key is missing; one that differs from it only in case is there"
-                   : "required key is missing");
+        reject("keyNotFound", below,
+               inOtherCase ? "missing required key; found a key that differs only in case"
+                           : "missing required key");
       } else {
         out += '-';
       }
@@ -145,7 +144,7 @@ class SlowDecoder {
   void value(plist::NodeIndex index, Path path, std::string& out, const List<T>*) {
     const plist::Node& node = expect(plist::Kind::array, index, path);
     pay(left_.recordBytes, node.count * sizeof(T), path,
-        "lists take more memory than the limit of 67108864 bytes");
+        "memory of lists exceeds the limit of 67108864 bytes");
     out.append("[").append(std::to_string(node.count)).append(":");
     for (std::uint32_t i = 0; i < node.count; ++i) {
       value(document_.elements(node)[i], path + "[" + std::to_string(i) + "]", out,
@@ -161,7 +160,7 @@ class SlowDecoder {
       out += expect(Kind::boolean, index, path).payload != 0 ? "yes;" : "no;";
     } else if constexpr (std::is_integral_v<T>) {
       if (document_.node(index).kind == Kind::wideInteger) {
-        refuse("outOfRange", path, "integer does not fit in 64 bits with a sign");
+        reject("outOfRange", path, "not a valid signed 64-bit integer");
       }
       const std::uint64_t bits = expect(Kind::integer, index, path).payload;
       out += std::to_string(static_cast<std::int64_t>(bits)) + ";";
@@ -169,7 +168,7 @@ class SlowDecoder {
       constexpr bool text = std::is_same_v<T, String>;
       const plist::Node& node = expect(text ? Kind::string : Kind::data, index, path);
       pay(left_.deliveredBytes, node.count, path,
-          "text and data come to more than the limit of 67108864 bytes");
+          "size of text and data exceeds the limit of 67108864 bytes");
       describeBytes(out, text ? 't' : 'd', document_.text(node));
     }
   }

@@ -26,9 +26,9 @@ namespace {
 
 template <class R>
 void writeRecord(const std::filesystem::path& name, const R& record) {
-  for (const auto form : {plist::Form::binary, plist::Form::xml}) {
+  for (const auto form : {plist::Format::binary, plist::Format::xml}) {
     const Data message = plist::PropertyListEncoder(form).encode(record);
-    std::ofstream file(name.string() + (form == plist::Form::xml ? ".xml" : ".binary"));
+    std::ofstream file(name.string() + (form == plist::Format::xml ? ".xml" : ".binary"));
     file.exceptions(std::ios::failbit | std::ios::badbit);
     file << message.view() << std::flush;
   }

@@ -1,7 +1,8 @@
-// What becomes of a message when memory runs out at any point: the n-th allocation fails for every
-// n, once or from there on, in unpacking, in serving and in the client. (S6)
+// Every allocation fails in turn, alone or with all later ones, in unpacking, in serving and in the
+// client. (S6)
 //
-// The linker leads this program's malloc and its like here (--wrap); operator new is replaced.
+// This program's malloc, calloc, realloc and free are wrapped by the linker (--wrap), and operator
+// new is replaced.
 
 #include <gtest/gtest.h>
 
@@ -25,8 +26,10 @@
 #include "records/command_response.h"
 #include "records/message_payload.h"
 #include "records/web_tunnel.h"
-#include "support/refusal.h"
+#include "support/rejection.h"
 #include "support/wire_fields.h"
+#include "support/written.h"
+#include "support/xml_message.h"
 #include "unpackers/command_response_unpacker.h"
 #include "unpackers/corvel_payload_unpacker.h"
 #include "unpackers/web_tunnel_response_unpacker.h"
@@ -96,23 +99,26 @@ namespace ironmoat {
 
 namespace {
 
+namespace xml = testing::xml;
+
 const std::string kNoMemory = "no memory";
 
-/// What came of `act`, which returns it; no exception but std::bad_alloc and DecodingError passes.
+/// The outcome that `act` returns, its rejection, or kNoMemory.
 std::string outcomeOf(const std::function<std::string()>& act) {
   try {
     try {
       return act();
-    } catch (const DecodingError& refusal) {
-      return testing::inWords(refusal);  // may run out of memory, too
+    } catch (const DecodingError& rejection) {
+      return testing::inWords(rejection);  // may run out of memory as well
     }
   } catch (const std::bad_alloc&) {
     return kNoMemory;
   }
 }
 
-/// `act` with each of its allocations failing: the outcome is then that memory ran out, at least
-/// once in the given words, and nothing stays allocated. Returns how many allocations there are.
+/// Runs `act` with each of its allocations failing in turn. The outcome must then be kNoMemory or
+/// `ranOut`, which must come at least once, and nothing may stay allocated. Returns the number of
+/// allocations.
 long sweep(const std::function<std::string()>& act, const std::string& ranOut = kNoMemory) {
   const std::string usual = outcomeOf(act);
   long allocations = 0;
@@ -142,13 +148,9 @@ long sweep(const std::function<std::string()>& act, const std::string& ranOut = 
   return allocations;
 }
 
-Data written(const plist::Document& document, plist::Form form) {
-  return form == plist::Form::xml ? writeXml(document) : writeBinary(document);
-}
-Data message(std::string_view xml, plist::Form form) {
-  plist::Document document;
-  EXPECT_FALSE(plist::readXml(Data(xml), document));
-  return written(document, form);
+template <class Record>
+std::string encoded(const Record& record) {
+  return testing::written([&](BlockBuilder& out) { frames::encodeRecord(record, out); });
 }
 
 template <class Unpacker_, class Wire_>
@@ -158,77 +160,69 @@ struct Kind {
   using Output = typename Unpacker::MessageSchemaType;
 };
 
-/// Every field, and what goes wrong early, late and at the first look.
+/// Messages with all fields, few fields, and errors at the beginning and at the end.
 template <class Wire>
 std::vector<Data> messages() {
   std::vector<Data> all = {Data(), Data(std::string_view("bplist00"))};
   const Wire full = testing::RecordGenerator(1, 1).make<Wire>(2);
-  for (const auto form : {plist::Form::binary, plist::Form::xml}) {
-    const Data good = plist::PropertyListEncoder(form).encode(full);
+  const std::string c = xml::number("c", 1);
+  const std::string texts = "<string>&#233;</string><true/>";
+  const std::string bodies[] = {
+      "<true/>", "<dict/>", xml::dictionary(c),
+      xml::dictionary(c + xml::list("mml", {c + xml::entry("dal", xml::array(texts))}) +
+                      xml::entry("h", xml::dictionary(xml::entry("ri", "<array/>"))))};
+  for (const auto format : {plist::Format::binary, plist::Format::xml}) {
+    const Data good = plist::PropertyListEncoder(format).encode(full);
     all.push_back(good);
     all.push_back(Data(good.view().substr(0, good.size() - 9)));
-    for (const std::string_view body :
-         {"<dict><key>c</key><integer>1</integer></dict>", "<dict/>", "<true/>",
-          "<dict><key>c</key><integer>1</integer><key>mml</key><array><dict><key>c</key>"
-          "<integer>2</integer><key>dal</key><array><string>&#233;</string><true/></array></dict>"
-          "</array><key>s</key><string/><key>h</key><dict><key>ri</key><date>2000-01-01T00:00:00Z"
-          "</date></dict></dict>"}) {
-      const std::string text = "<plist>" + std::string(body) + "</plist>";
-      if (text.find("date") == std::string::npos) {
-        all.push_back(message(text, form));
-      } else {
-        all.emplace_back(std::string_view(text));
-      }
+    for (const std::string& body : bodies) {
+      plist::Document document;
+      EXPECT_FALSE(plist::readXml(xml::message(body), document));
+      all.push_back(format == plist::Format::xml ? writeXml(document) : writeBinary(document));
     }
   }
   return all;
 }
 
 template <class K>
-class AllocationTest : public ::testing::Test {};
+class Allocation : public ::testing::Test {};
 using Kinds =
     ::testing::Types<Kind<VeskCommandResponseUnpacker, VeskCommandResponseSchema>,
                      Kind<VeskCommandWebTunnelResponseUnpacker, VeskCommandWebTunnelResponseSchema>,
                      Kind<VeskCorvelPayloadUnpacker, VeskCorvelProtocolPayload>>;
-TYPED_TEST_SUITE(AllocationTest, Kinds);
+TYPED_TEST_SUITE(Allocation, Kinds);
 
-TYPED_TEST(AllocationTest, UnpackingAndServing) {
+TYPED_TEST(Allocation, UnpackingAndServingSurviveEveryFailure) {
   using Output = typename TypeParam::Output;
   IronmoatServer server(IronmoatServer::Confine::no);
   server.registerUnpacker<Output>(typename TypeParam::Unpacker());
   long allocations = 0;
   for (const Data& message : messages<typename TypeParam::Wire>()) {
-    allocations += sweep([&] {
-      BlockBuilder reply;
-      frames::encodeRecord(typename TypeParam::Unpacker().unpack(message), reply);
-      return std::string(reply.bytes(), reply.size());
+    allocations += sweep([&] { return encoded(typename TypeParam::Unpacker().unpack(message)); });
+    const std::string frame = testing::written([&](BlockBuilder& out) {
+      frames::appendRequest(out, 7, Output::schemaName, message.view());
     });
-    BlockBuilder frame;
-    frames::appendRequest(frame, 7, Output::schemaName, message.view());
-    const Data request(std::string_view(frame.bytes(), frame.size()).substr(frames::kLengthBytes));
-    const auto serve = [&] {
-      BlockBuilder reply;
-      server.serve(request, reply);
-      return std::string(reply.bytes(), reply.size());
-    };
-    BlockBuilder ranOut;
-    frames::appendRefusal(
-        ranOut, 7,
-        {DecodingError::Kind::notEnoughMemory, "", "not enough memory to decode this message"});
-    sweep(serve, {ranOut.bytes(), ranOut.size()});
+    const Data request(std::string_view(frame).substr(frames::kLengthBytes));
+    const std::string ranOut = testing::written([&](BlockBuilder& out) {
+      frames::appendRefusal(
+          out, 7,
+          {DecodingError::Kind::notEnoughMemory, "", "not enough memory to decode this message"});
+    });
+    sweep([&] { return testing::written([&](BlockBuilder& out) { server.serve(request, out); }); },
+          ranOut);
   }
   EXPECT_GT(allocations, 40);
 }
 
-TYPED_TEST(AllocationTest, DecodingReplies) {
+TYPED_TEST(Allocation, DecodingRepliesSurvivesEveryFailure) {
   using Output = typename TypeParam::Output;
-  BlockBuilder reply;
-  const std::size_t start = frames::beginReply(reply, 1, frames::Status::record);
-  frames::encodeRecord(testing::RecordGenerator(2, 1).make<Output>(2), reply);
-  frames::endReply(reply, start);
-  frames::appendRefusal(reply, 2, {DecodingError::Kind::malformed, "a.b", "a sentence", 5});
-  frames::appendSentence(reply, 3, frames::Status::failed, "a sentence that no string holds");
-  const std::string_view stream(reply.bytes(), reply.size());
+  const std::string stream = testing::written([](BlockBuilder& reply) {
+    const std::size_t start = frames::beginReply(reply, 1, frames::Status::record);
+    frames::encodeRecord(testing::RecordGenerator(2, 1).make<Output>(2), reply);
+    frames::endReply(reply, start);
+    frames::appendRefusal(reply, 2, {DecodingError::Kind::malformed, "a.b", "a sentence", 5});
+    frames::appendSentence(reply, 3, frames::Status::failed, "a sentence that no string holds");
+  });
   EXPECT_GT(sweep([&] {
               frames::FrameAssembler assembler(frames::kMaxReplyBody, Sharing::anyThread);
               std::string_view left = stream;
@@ -242,9 +236,7 @@ TYPED_TEST(AllocationTest, DecodingReplies) {
                 while (const auto body = assembler.next()) {
                   const frames::Reply one = frames::parseReply(*body);
                   if (one.status == frames::Status::record) {
-                    BlockBuilder again;
-                    frames::encodeRecord(frames::decodeRecord<Output>(one.body), again);
-                    all.append(again.bytes(), again.size());
+                    all += encoded(frames::decodeRecord<Output>(one.body));
                   } else if (one.status == frames::Status::refused) {
                     all += frames::parseRefusal(one.body).path();
                   } else {
@@ -257,8 +249,7 @@ TYPED_TEST(AllocationTest, DecodingReplies) {
             8);
 }
 
-/// The daemon's side with all its threads, from no service to an outcome and back to none.
-TEST(AllocationClientTest, FromNoServiceToAnOutcome) {
+TEST(ClientAllocation, RequestGetsAnOutcomeWhicheverAllocationFails) {
   const struct {
     const char* program;
     const char* message;
@@ -266,7 +257,8 @@ TEST(AllocationClientTest, FromNoServiceToAnOutcome) {
   } rows[] = {
       {TEST_SERVER, "echo 7", "command 7"},
       {TEST_SERVER, "crash", "crashed"},
-      {SERVICE, "junk of more than a few characters", "malformed: no plist element at offset 0"},
+      {SERVICE, "junk of more than a few characters",
+       "malformed: missing plist element at offset 0"},
       {"/nowhere/that/is/longer/than/a/few/characters", "", "unavailable"},
   };
   for (const auto& row : rows) {

@@ -1,4 +1,4 @@
-// The deepest message that is accepted, through every stage, on a stack of one megabyte. (S8)
+// The deepest valid message passes through every stage on a stack of one megabyte. (S8)
 
 #include <gtest/gtest.h>
 #include <pthread.h>
@@ -10,10 +10,14 @@
 #include "ironmoat/limits.h"
 #include "plist/reader.h"
 #include "plist/writer.h"
+#include "support/written.h"
+#include "support/xml_message.h"
 #include "unpackers/corvel_payload_unpacker.h"
 
 namespace ironmoat {
 namespace {
+
+namespace xml = testing::xml;
 
 #if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
 constexpr std::size_t kStack = std::size_t{8} << 20;  // sanitizers widen every frame
@@ -35,32 +39,22 @@ void onSmallStack(std::function<void()> act) {
   pthread_attr_destroy(&attributes);
 }
 
-/// Payloads within payloads, `levels` of them, each an element of the one before.
-std::string nested(std::size_t levels) {
-  std::string start;
-  std::string end;
-  for (std::size_t level = 1; level <= levels; ++level) {
-    start += "<dict><key>c</key><integer>" + std::to_string(level) + "</integer>";
-    if (level < levels) start += level % 2 == 0 ? "<key>mml</key><array>" : "<key>dtl</key><array>";
-    end += level > 1 ? "</array></dict>" : "</dict>";
-  }
-  return "<plist>" + start + end + "</plist>";
+std::string encoded(const DrelUserPayload& record) {
+  return testing::written([&](BlockBuilder& out) { frames::encodeRecord(record, out); });
 }
 
-std::string reply(const DrelUserPayload& record) {
-  BlockBuilder out;
-  frames::encodeRecord(record, out);
-  return {out.bytes(), out.size()};
-}
-
-TEST(NestingTest, TheDeepestPayloadFitsInAMegabyteOfStack) {
+TEST(Nesting, DeepestPayloadFitsInAMegabyteOfStack) {
   onSmallStack([] {
-    const Data xml(nested(limits::nestedContainers / 2));  // a list and a dictionary each
+    std::string payload = xml::number("c", 0);
+    for (std::size_t level = 1; level < limits::nestedContainers / 2; ++level) {
+      payload = xml::number("c", 1) + xml::list(level % 2 == 0 ? "mml" : "dtl", {payload});
+    }
+    const Data message = xml::message(xml::dictionary(payload));
     plist::Document document;
-    ASSERT_FALSE(plist::readXml(xml, document));
-    for (const Data& message : {xml, writeBinary(document)}) {
-      const std::string carried = reply(VeskCorvelPayloadUnpacker().unpack(message));
-      EXPECT_EQ(reply(frames::decodeRecord<DrelUserPayload>(Data(carried))), carried);
+    ASSERT_FALSE(plist::readXml(message, document));
+    for (const Data& each : {message, writeBinary(document)}) {
+      const std::string carried = encoded(VeskCorvelPayloadUnpacker().unpack(each));
+      EXPECT_EQ(encoded(frames::decodeRecord<DrelUserPayload>(Data(carried))), carried);
     }
   });
 }

@@ -4,13 +4,15 @@
 #include <cstring>
 #include <limits>
 #include <optional>
+#include <string>
+#include <string_view>
 #include <utility>
 
 #include "ironmoat/errors.h"
 #include "ironmoat/limits.h"
 #include "plist/binary_format.h"
 #include "plist/reader.h"
-#include "plist/refusal.h"
+#include "plist/rejection.h"
 #include "values/utf8.h"
 
 #if defined(__SSE2__)
@@ -22,8 +24,8 @@ namespace ironmoat::plist {
 using binary::Marker;
 
 /// Three passes, each linear in the message: every object of the table becomes a node; keys are
-/// checked to be text; the graph is measured, and refused when it is cyclic or too deep. What can
-/// refuse the message returns whether it did not; nothing is done with it afterwards.
+/// checked to be text; the graph is measured, and rejected when it is cyclic or too deep. What can
+/// reject the message returns whether it did not; nothing is done with it afterwards.
 class BinaryReader {
  public:
   BinaryReader(const Data& message, Document& document)
@@ -41,9 +43,10 @@ class BinaryReader {
     }
   }
 
-  /// Why the message is refused; none: the document is complete.
+  /// Why the message is rejected; none: the document is complete.
   std::optional<DecodingError> read() {
-    if (!readTrailer() || !readObjects() || !checkKeys() || !measure()) return std::move(refusal_);
+    if (!readTrailer() || !readObjects() || !checkKeys() || !measure())
+      return std::move(rejection_);
     document_.root_ = root_;
     document_.side_ = side_.finish();
     return std::nullopt;
@@ -65,45 +68,45 @@ class BinaryReader {
   static constexpr std::uint16_t kTooDeep = limits::nestedContainers + 1;
   static constexpr std::uint16_t kOpen = std::numeric_limits<std::uint16_t>::max();
 
-  [[gnu::cold, gnu::noinline]] bool refuse(DecodingError refusal) {
-    refusal_ = std::move(refusal);
+  [[gnu::cold, gnu::noinline]] bool reject(DecodingError rejection) {
+    rejection_ = std::move(rejection);
     return false;
   }
-  [[gnu::cold, gnu::noinline]] bool refuse(std::string_view reason, std::uint64_t offset) {
-    return refuse(malformed(reason, offset));
+  [[gnu::cold, gnu::noinline]] bool reject(std::string_view reason, std::uint64_t offset) {
+    return reject(malformed(reason, offset));
   }
 
   [[nodiscard]] bool readTrailer() {
     constexpr std::size_t kSmallest = binary::kHeader.size() + 1 + 1 + binary::kTrailerSize;
-    if (size_ < kSmallest) return refuse("binary property list cut short", size_);
+    if (size_ < kSmallest) return reject("unexpected end of message", size_);
     if (!std::equal(binary::kHeader.begin(), binary::kHeader.end(), bytes_)) {
-      return refuse("unknown version of the binary form", 6);
+      return reject("not a valid version of the binary format", 6);
     }
     const std::size_t trailer = size_ - binary::kTrailerSize;
     offsetSize_ = bytes_[trailer + 6];
     referenceSize_ = bytes_[trailer + 7];
     if (offsetSize_ < 1 || offsetSize_ > binary::kMaxSize) {
-      return refuse("impossible size of offsets", trailer + 6);
+      return reject("not a valid offset size: " + std::to_string(offsetSize_), trailer + 6);
     }
     if (referenceSize_ < 1 || referenceSize_ > binary::kMaxSize) {
-      return refuse("impossible size of references", trailer + 7);
+      return reject("not a valid reference size: " + std::to_string(referenceSize_), trailer + 7);
     }
     const std::uint64_t count = bigEndian(bytes_ + trailer + 8, 8);
     const std::uint64_t root = bigEndian(bytes_ + trailer + 16, 8);
     const std::uint64_t table = bigEndian(bytes_ + trailer + 24, 8);  // the message's last bytes
     if (table <= binary::kHeader.size() || table >= trailer) {
-      return refuse("offset table out of bounds", trailer + 24);
+      return reject("not a valid position of the offset table", trailer + 24);
     }
     // The table fills the room up to the trailer exactly. Dividing keeps the product from wrapping.
     if (count != (trailer - table) / offsetSize_ || (trailer - table) % offsetSize_ != 0) {
-      return refuse("offset table does not fit the object count", trailer + 8);
+      return reject("not a valid object count for the offset table", trailer + 8);
     }
     // Each object takes a byte of a room in which they may not overlap: bounds what is allocated
     // for them by the bytes that are there.
     if (count > table - binary::kHeader.size()) {
-      return refuse("more objects than bytes for them", trailer + 8);
+      return reject("object count exceeds the object area", trailer + 8);
     }
-    if (root >= count) return refuse("top object is not in the table", trailer + 16);
+    if (root >= count) return reject("not a valid top object", trailer + 16);
     objectsEnd_ = static_cast<std::size_t>(table);
     objectCount_ = static_cast<std::size_t>(count);
     root_ = static_cast<NodeIndex>(root);
@@ -125,13 +128,13 @@ class BinaryReader {
     for (std::size_t i = 0; i < count; ++i, entry += offsetSize) {
       const std::uint64_t offset = bigEndian(bytes + entry, offsetSize);
       if (offset - binary::kHeader.size() >= end - binary::kHeader.size()) {  // below it, too
-        return refuse("object offset out of bounds", entry);
+        return reject("not a valid object offset", entry);
       }
       const std::size_t start = static_cast<std::size_t>(offset);
       const std::uint8_t marker = bytes[start];
       const auto kind = static_cast<Marker>(marker >> 4);
       // Most objects are short texts (keys are), data or integers: in line, a seventh off a typical
-      // message. Whatever is not quite so is left to `readObject`, refusals too.
+      // message. Whatever is not quite so is left to `readObject`, rejections too.
       std::size_t body = start + 1;
       std::size_t length = marker & 0x0F;
       std::size_t size = 0;
@@ -159,7 +162,7 @@ class BinaryReader {
         if (!readObject(start, nodes[i], objectEnd)) return false;
         size = objectEnd - start;
       }
-      if (size > room) return refuse("objects overlap", start);
+      if (size > room) return reject("overlapping objects not allowed", start);
       room -= size;
     }
     return true;
@@ -202,13 +205,13 @@ class BinaryReader {
       case Marker::dictionary:
         return readContainer(at, node, end);
     }
-    return refuse("unknown kind of object", at);
+    return reject("not a valid object marker", at);
   }
 
   /// Sets `end` to `start + count`, proven to lie inside the object area.
   [[nodiscard]] bool need(std::size_t start, std::uint64_t count, std::size_t object,
                           std::size_t& end) {
-    if (count > objectsEnd_ - start) return refuse("object runs out of bounds", object);
+    if (count > objectsEnd_ - start) return reject("object exceeds the object area", object);
     end = start + static_cast<std::size_t>(count);
     return true;
   }
@@ -235,7 +238,7 @@ class BinaryReader {
     const std::size_t marker = body;
     if (!need(marker, 1, at, body)) return false;
     if (bytes_[marker] < 0x10 || bytes_[marker] > 0x13) {
-      return refuse("length is not an integer", marker);
+      return reject("not a valid length", marker);
     }
     const std::size_t size = std::size_t{1} << (bytes_[marker] & 0x0F);
     const std::size_t digits = body;
@@ -254,7 +257,7 @@ class BinaryReader {
     if (static_cast<Marker>(bytes_[at] >> 4) == Marker::ascii) {
       node.kind = Kind::string;
       if (!isAscii(textAt(node))) {
-        return refuse("ASCII text is not ASCII", body + asciiPrefix(textAt(node)));
+        return reject("not a valid ASCII character", body + asciiPrefix(textAt(node)));
       }
     }
     return true;
@@ -282,7 +285,7 @@ class BinaryReader {
     std::size_t body = 0;
     std::uint64_t units = 0;
     if (!readLength(at, units, body)) return false;
-    if (units > objectsEnd_ / 2) return refuse("object runs out of bounds", at);
+    if (units > objectsEnd_ / 2) return reject("object exceeds the object area", at);
     if (!need(body, units * 2, at, end)) return false;
     const std::size_t start = side_.size();
     // A unit takes at most 3 bytes of UTF-8; a pair takes 4.
@@ -292,7 +295,7 @@ class BinaryReader {
       char32_t unit = static_cast<char32_t>(bytes_[i] << 8 | bytes_[i + 1]);
       if (unit >= 0xD800 && unit <= 0xDFFF) {
         const bool pair = unit < 0xDC00 && end - i >= 4 && (bytes_[i + 2] & 0xFC) == 0xDC;
-        if (!pair) return refuse("unpaired surrogate", i);
+        if (!pair) return reject("not a valid surrogate pair", i);
         const auto low = static_cast<char32_t>(bytes_[i + 2] << 8 | bytes_[i + 3]);
         unit = 0x10000 + ((unit - 0xD800) << 10) + (low - 0xDC00);
         i += 2;
@@ -312,7 +315,7 @@ class BinaryReader {
     std::uint64_t count = 0;
     if (!readLength(at, count, body)) return false;
     // Each element takes a byte at least, so that neither product can wrap.
-    if (count > objectsEnd_) return refuse("object runs out of bounds", at);
+    if (count > objectsEnd_) return reject("object exceeds the object area", at);
     const std::size_t references = static_cast<std::size_t>(count) * (dictionary ? 2 : 1);
     if (!need(body, references * referenceSize_, at, end)) return false;
     node.kind = dictionary ? Kind::dictionary : marker == Marker::set ? Kind::set : Kind::array;
@@ -331,7 +334,7 @@ class BinaryReader {
       lowest = std::min(lowest, reference);
       highest = std::max(highest, reference);
     }
-    if (highest >= objectCount_) return refuseStray(from, count);
+    if (highest >= objectCount_) return rejectStray(from, count);
     if (lowest > current_) return true;
     // Scalars may be shared from anywhere: they close no cycle and their height is known.
     for (std::size_t i = 0; i < count; ++i) {
@@ -340,11 +343,11 @@ class BinaryReader {
     return true;
   }
 
-  bool refuseStray(const unsigned char* from, std::size_t count) {
+  bool rejectStray(const unsigned char* from, std::size_t count) {
     std::size_t i = 0;
     while (i + 1 < count && bigEndian(from + i * referenceSize_, referenceSize_) < objectCount_)
       ++i;
-    return refuse("reference is not in the table",
+    return reject("not a valid reference",
                   static_cast<std::size_t>(from - bytes_) + i * referenceSize_);
   }
 
@@ -353,7 +356,9 @@ class BinaryReader {
       if (nodes_[i].kind != Kind::dictionary) continue;
       for (const NodeIndex key : document_.keys(nodes_[i])) {
         if (nodes_[key].kind != Kind::string) {
-          return refuse("dictionary key is not text", offsetOf(i));
+          return reject("not a valid dictionary key: expected string, found " +
+                            std::string(nameOf(nodes_[key].kind)),
+                        offsetOf(i));
         }
       }
     }
@@ -381,7 +386,7 @@ class BinaryReader {
         height = std::max(height, nodes_[child].height);
       node.height = std::min<std::uint16_t>(height + 1, kTooDeep);
     }
-    if (nodes_[root_].height == kTooDeep) return refuse(tooDeep());
+    if (nodes_[root_].height == kTooDeep) return reject(tooDeep());
     return true;
   }
 
@@ -414,10 +419,10 @@ class BinaryReader {
       const NodeIndex child = children[step.nextChild++];
       const Node& node = nodes_[child];
       if (!isContainer(node)) continue;
-      if (node.height == kOpen) return refuse("container inside itself", offsetOf(child));
+      if (node.height == kOpen) return reject("reference cycle not allowed", offsetOf(child));
       // The child's own container counts even where its height is not yet known.
       if (way.size() + std::max<std::size_t>(node.height, 1) > limits::nestedContainers) {
-        return refuse(tooDeep());
+        return reject(tooDeep());
       }
       if (node.height == 0) {
         enter(child);
@@ -447,7 +452,7 @@ class BinaryReader {
   NodeIndex root_ = 0;
   NodeIndex current_ = 0;
   bool parentsFirst_ = true;  // no reference to a container that stands earlier
-  std::optional<DecodingError> refusal_;
+  std::optional<DecodingError> rejection_;
 };
 
 std::optional<DecodingError> readBinary(const Data& message, Document& document) {

@@ -1,5 +1,6 @@
 #include <cstdint>
 #include <stdexcept>
+#include <string>
 #include <string_view>
 #include <unordered_map>
 #include <vector>
@@ -99,7 +100,7 @@ class BinaryWriter {
         writeHead(node.kind == Kind::array ? Marker::array : Marker::dictionary, node.count);
         return forChildren(node, [&](NodeIndex child) { put(objects_[child], referenceSize); });
       default:
-        throw std::invalid_argument("no record holds a value of this kind");
+        throw std::invalid_argument("value kind not allowed: " + std::string(nameOf(node.kind)));
     }
   }
 

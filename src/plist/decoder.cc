@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "plist/place.h"
+#include "plist/position.h"
 
 namespace ironmoat::plist {
 
@@ -35,38 +35,38 @@ std::string Decoder::path() const {
 
 std::optional<std::uint64_t> Decoder::offset() const {
   if (decoding_.message == nullptr) return std::nullopt;
-  return placeOf(node_, *decoding_.message);
+  return positionOf(node_, *decoding_.message);
 }
 
-void Decoder::refuse(DecodingError::Kind kind, const std::string& sentence) const {
-  decoding_.refusal.emplace(kind, path(), sentence, offset());
+void Decoder::reject(DecodingError::Kind kind, const std::string& description) const {
+  decoding_.rejection.emplace(kind, path(), description, offset());
 }
 
-void Decoder::refuseMismatch(Kind expected) const {
-  std::string sentence;
-  sentence.reserve(40);  // one allocation, not two
-  sentence.append("expected ").append(nameOf(expected));
-  sentence.append(", found ").append(nameOf(node().kind));
-  refuse(DecodingError::Kind::typeMismatch, sentence);
+void Decoder::rejectMismatch(Kind expected) const {
+  std::string description;
+  description.reserve(40);  // one allocation, not two
+  description.append("expected ").append(nameOf(expected));
+  description.append(", found ").append(nameOf(node().kind));
+  reject(DecodingError::Kind::typeMismatch, description);
 }
 
-void Decoder::refuseOutOfRange() const {
-  refuse(DecodingError::Kind::outOfRange, "integer does not fit in 64 bits with a sign");
+void Decoder::rejectOutOfRange() const {
+  reject(DecodingError::Kind::outOfRange, "not a valid signed 64-bit integer");
 }
 
-void Decoder::refuseMissing(const std::string_view& key) const {
-  std::string sentence("required key is missing");
+void Decoder::rejectMissing(const std::string_view& key) const {
+  std::string description("missing required key");
   const auto keys = document_.keys(node());
   if (std::any_of(keys.begin(), keys.end(), [&](NodeIndex other) {
         return equalsIgnoringCase(document_.text(document_.node(other)), key);
       })) {
-    sentence += "; one that differs from it only in case is there";
+    description += "; found a key that differs only in case";
   }
-  Decoder(*this, key, node_).refuse(DecodingError::Kind::keyNotFound, sentence);
+  Decoder(*this, key, node_).reject(DecodingError::Kind::keyNotFound, description);
 }
 
-void Decoder::refuseLimit(const char* what, std::size_t limit, const char* unit) const {
-  refuse(DecodingError::Kind::limitExceeded, what + std::to_string(limit) + unit);
+void Decoder::rejectLimit(const char* what, std::size_t limit, const char* unit) const {
+  reject(DecodingError::Kind::limitExceeded, what + std::to_string(limit) + unit);
 }
 
 }  // namespace ironmoat::plist

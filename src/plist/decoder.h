@@ -27,19 +27,19 @@ struct Budget {
 /// What the decoders of one message share.
 struct Decoding {
   const Document& document;
-  const Data* message = nullptr;  ///< in whose bytes a refusal names a place; none: in no bytes
+  const Data* message = nullptr;  ///< in whose bytes a rejection names a place; none: in no bytes
   Budget budget = {};
-  std::optional<DecodingError> refusal = {};  ///< once a decoder has refused the message
+  std::optional<DecodingError> rejection = {};  ///< once a decoder has rejected the message
 };
 
 template <class Keys>
 class KeyedDecodingContainer;
 
 /// A decoder positioned on one value of a document. Lives on the stack, below its parent's; knows
-/// the way from the top, so that a refusal can name it.
+/// the way from the top, so that a rejection can name it.
 ///
-/// Whatever decodes returns whether it did. If it did not, the message is refused, the reason is in
-/// `Decoding::refusal`, and what was decoded so far is useless.
+/// Whatever decodes returns whether it did. If it did not, the message is rejected, the reason is
+/// in `Decoding::rejection`, and what was decoded so far is useless.
 class Decoder {
  public:
   explicit Decoder(Decoding& decoding) noexcept
@@ -72,40 +72,39 @@ class Decoder {
   /// The current node is of this kind.
   [[nodiscard]] bool expect(Kind kind) const {
     if (node().kind == kind) return true;
-    refuseMismatch(kind);
+    rejectMismatch(kind);
     return false;
   }
   [[nodiscard]] bool chargeRecords(std::size_t count, std::size_t size) const {
     return charge(decoding_.budget.recordBytes, count * size,
-                  "lists take more memory than the limit of ", limits::recordBytes, " bytes");
+                  "memory of lists exceeds the limit of ", limits::recordBytes, " bytes");
   }
   [[nodiscard]] bool chargeDelivered(std::size_t bytes) const {
     return charge(decoding_.budget.deliveredBytes, bytes,
-                  "text and data come to more than the limit of ", limits::deliveredBytes,
-                  " bytes");
+                  "size of text and data exceeds the limit of ", limits::deliveredBytes, " bytes");
   }
   [[nodiscard]] bool chargeScanned(std::size_t entries) const {
     return charge(decoding_.budget.scannedEntries, entries,
-                  "shared dictionaries come to more than the limit of ", limits::scannedEntries,
+                  "size of shared dictionaries exceeds the limit of ", limits::scannedEntries,
                   " entries");
   }
 
-  [[gnu::cold]] void refuseMismatch(Kind expected) const;
-  [[gnu::cold]] void refuseOutOfRange() const;
-  [[gnu::cold]] void refuseMissing(const std::string_view& key) const;
+  [[gnu::cold]] void rejectMismatch(Kind expected) const;
+  [[gnu::cold]] void rejectOutOfRange() const;
+  [[gnu::cold]] void rejectMissing(const std::string_view& key) const;
 
  private:
   bool charge(std::size_t& left, std::size_t amount, const char* what, std::size_t limit,
               const char* unit) const {
     if (amount > left) {
-      refuseLimit(what, limit, unit);
+      rejectLimit(what, limit, unit);
       return false;
     }
     left -= amount;
     return true;
   }
-  [[gnu::cold]] void refuseLimit(const char* what, std::size_t limit, const char* unit) const;
-  void refuse(DecodingError::Kind kind, const std::string& sentence) const;
+  [[gnu::cold]] void rejectLimit(const char* what, std::size_t limit, const char* unit) const;
+  void reject(DecodingError::Kind kind, const std::string& description) const;
   [[nodiscard]] std::string path() const;
   [[nodiscard]] std::optional<std::uint64_t> offset() const;
 
@@ -131,7 +130,7 @@ template <Scalar T>
            decoder.chargeDelivered(decoder.node().count);
   } else {
     if (decoder.node().kind != Kind::wideInteger) return decoder.expect(Kind::integer);
-    decoder.refuseOutOfRange();
+    decoder.rejectOutOfRange();
     return false;
   }
 }
@@ -199,7 +198,7 @@ class KeyedDecodingContainer {
     if (contains(key)) {
       return decodeInto(Decoder(decoder_, key.stringValue(), values_[key.index()]), value);
     }
-    decoder_.refuseMissing(key.stringValue());
+    decoder_.rejectMissing(key.stringValue());
     return false;
   }
   /// The entry under `key`, if there is one; `value` must be absent so far. In line, so that a

@@ -2,7 +2,7 @@
 
 #include "ironmoat/values.h"
 #include "plist/document_builder.h"
-#include "plist/refusal.h"
+#include "plist/rejection.h"
 #include "plist/writer.h"
 
 namespace ironmoat::plist {
@@ -68,12 +68,12 @@ class KeyedEncodingContainer {
   Encoder& encoder_;
 };
 
-enum class Form { binary, xml };
+enum class Format { binary, xml };
 
 /// A record to bytes, by `R::encode(Encoder&)`.
 class PropertyListEncoder {
  public:
-  explicit PropertyListEncoder(Form form) noexcept : form_(form) {}
+  explicit PropertyListEncoder(Format format) noexcept : format_(format) {}
 
   /// Throws DecodingError `limitExceeded` for a record nested too deep to be read again,
   /// std::invalid_argument for text that XML cannot hold, and whatever R's encoding throws.
@@ -84,11 +84,11 @@ class PropertyListEncoder {
     Encoder encoder(builder);
     encodeValue(encoder, record);
     builder.finish();
-    return form_ == Form::binary ? writeBinary(document) : writeXml(document);
+    return format_ == Format::binary ? writeBinary(document) : writeXml(document);
   }
 
  private:
-  Form form_;
+  Format format_;
 };
 
 }  // namespace ironmoat::plist

@@ -14,17 +14,17 @@ namespace ironmoat::plist {
 /// Bytes of either form to a record. Holds nothing between calls.
 class PropertyListDecoder {
  public:
-  /// Into `record`, freshly made, by its `decode`. Returns why the message is refused; the record
+  /// Into `record`, freshly made, by its `decode`. Returns why the message is rejected; the record
   /// is then useless. None: the record keeps a reference to the message's block, and depends on
   /// nothing else.
   template <class R>
   [[nodiscard]] std::optional<DecodingError> decode(const Data& message, R& record) const {
     Document document;
-    std::optional<DecodingError> refusal = read(message, document);
-    if (refusal) return refusal;
+    std::optional<DecodingError> rejection = read(message, document);
+    if (rejection) return rejection;
     Decoding decoding{.document = document, .message = &message};
-    if (!record.decode(Decoder(decoding))) refusal = std::move(decoding.refusal);
-    return refusal;
+    if (!record.decode(Decoder(decoding))) rejection = std::move(decoding.rejection);
+    return rejection;
   }
 };
 

@@ -12,7 +12,7 @@ namespace ironmoat::plist {
 /// with "bplist", XML otherwise. The document holds the message's block and copies nothing that the
 /// message has literally.
 ///
-/// Returns why the message is refused, `malformed` with an offset into it or `limitExceeded`; the
+/// Returns why the message is rejected, `malformed` with an offset into it or `limitExceeded`; the
 /// document is then useless. None: it was read. Time is linear in the size of the message.
 [[nodiscard]] std::optional<DecodingError> read(const Data& message, Document& document);
 

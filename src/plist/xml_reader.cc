@@ -6,7 +6,7 @@
 #include "plist/base64.h"
 #include "plist/document_builder.h"
 #include "plist/reader.h"
-#include "plist/refusal.h"
+#include "plist/rejection.h"
 #include "plist/xml_scalars.h"
 #include "plist/xml_scanner.h"
 #include "plist/xml_text.h"
@@ -23,7 +23,7 @@ class XmlReader {
         builder_(document, source.block(), source.sharing()),
         scratch_(source.sharing()) {}
 
-  // Like all here, false when the message was refused (see XmlSource). Not inlined, so that the
+  // Like all here, false when the message was rejected (see XmlSource). Not inlined, so that the
   // compiler still makes one piece of what runs for each element: a tenth of the instructions.
   [[nodiscard, gnu::noinline]] bool read() {
     if (!in_.skipProlog() || !beginRoot()) return false;
@@ -31,7 +31,7 @@ class XmlReader {
       if (!takeNext()) return false;
     }
     if (!in_.skipMisc()) return false;
-    if (!in_.atEnd()) return in_.refuse("something after the plist");
+    if (!in_.atEnd()) return in_.reject("unexpected content after the plist");
     builder_.finish();
     return true;
   }
@@ -86,14 +86,14 @@ bool XmlReader::beginRoot() {
     in_.advance(kUsual.size());
     return true;
   }
-  if (!in_.take("<plist")) return in_.refuse("no plist element");
+  if (!in_.take("<plist")) return in_.reject("missing plist element");
   if (in_.skipSpace() && in_.take("version")) {
     std::string_view version;
     if (!in_.takeAttributeValue(version)) return false;
     in_.skipSpace();
   }
-  if (in_.looksAt("/>")) return in_.refuse("plist without a value");
-  return in_.take(">") || in_.refuse("bad plist tag");
+  if (in_.looksAt("/>")) return in_.reject("missing value in the plist");
+  return in_.take(">") || in_.reject("not a valid plist tag");
 }
 
 bool XmlReader::takeNext() {
@@ -103,15 +103,16 @@ bool XmlReader::takeNext() {
   if (element != Element::unknown) return takeElement(element, start);
   if (in_.looksAt("</")) return endTagOfContainer();
   if (in_.looksAtMarkup()) return in_.skipMarkup();
-  return in_.refuse(in_.peek() == '<' ? "unknown element" : "text outside a text element");
+  return in_.reject(in_.peek() == '<' ? "not a valid element"
+                                      : "unexpected text outside a text element");
 }
 
 bool XmlReader::endTagOfContainer() {
   switch (place_) {
     case Place::onlyValue:
-      return in_.refuse("plist without a value");
+      return in_.reject("missing value in the plist");
     case Place::value:
-      return in_.refuse("key without a value");
+      return in_.reject("missing value after a key");
     case Place::endOfRoot:
       if (!endTag("</plist>")) return false;
       place_ = Place::after;
@@ -142,13 +143,13 @@ bool XmlReader::takeElement(Element element, const char* start) {
   bool empty = false;
   if (!endOfStartTag(empty)) return false;
   if (element == Element::key) {
-    if (place_ == Place::value) return in_.refuse("key without a value", start);
-    if (place_ != Place::key) return in_.refuse("key outside a dictionary", start);
+    if (place_ == Place::value) return in_.reject("missing value after a key", start);
+    if (place_ != Place::key) return in_.reject("unexpected key outside a dictionary", start);
     place_ = Place::value;
     return string(empty, "</key>");
   }
-  if (place_ == Place::key) return in_.refuse("value without a key", start);
-  if (place_ == Place::endOfRoot) return in_.refuse("more than one value", start);
+  if (place_ == Place::key) return in_.reject("missing key before a value", start);
+  if (place_ == Place::endOfRoot) return in_.reject("unexpected second value in the plist", start);
   return value(element, empty);
 }
 
@@ -186,7 +187,7 @@ bool XmlReader::value(Element element, bool empty) {
 bool XmlReader::container(Element element, bool empty) {
   const bool dictionary = element == Element::dictionary;
   const bool begun = dictionary ? builder_.beginDictionary() : builder_.beginArray();
-  if (!begun) return source_.refuse(tooDeep());
+  if (!begun) return source_.reject(tooDeep());
   place_ = dictionary ? Place::key : Place::element;
   if (empty) endContainer();
   return true;
@@ -198,14 +199,14 @@ bool XmlReader::scalar(Element element, bool empty) {
   if (!scalarText(empty, text)) return false;
   switch (element) {
     case Element::integer:
-      if (!addInteger(text, builder_)) return in_.refuse("no integer", content);
+      if (!addInteger(text, builder_)) return in_.reject("not a valid integer", content);
       return empty || endTag("</integer>");
     case Element::real:
-      if (!isReal(text)) return in_.refuse("no real", content);
+      if (!isReal(text)) return in_.reject("not a valid real", content);
       builder_.opaque(Kind::real);
       return empty || endTag("</real>");
     default:
-      if (!isDate(text)) return in_.refuse("no date", content);
+      if (!isDate(text)) return in_.reject("not a valid date", content);
       builder_.opaque(Kind::date);
       return empty || endTag("</date>");
   }
@@ -244,7 +245,7 @@ bool XmlReader::endOfStartTag(bool& empty) {
   in_.skipSpace();
   empty = in_.take("/>");
   if (empty || in_.take(">")) return true;
-  return in_.refuse(in_.at() == after ? "unknown element" : "attribute");
+  return in_.reject(in_.at() == after ? "not a valid element" : "attribute not allowed");
 }
 
 template <std::size_t Size>
@@ -254,10 +255,10 @@ bool XmlReader::endTag(const char (&tag)[Size]) {
 
 /// `start` is the tag without its '>'.
 bool XmlReader::spacedEndTag(std::string_view start) {
-  if (!in_.rest().starts_with(start)) return in_.refuse("wrong end tag");
+  if (!in_.rest().starts_with(start)) return in_.reject("missing end tag");
   in_.advance(start.size());
   in_.skipSpace();
-  return in_.take(">") || in_.refuse("wrong end tag");
+  return in_.take(">") || in_.reject("missing end tag");
 }
 
 template <std::size_t Size>
@@ -298,13 +299,13 @@ bool XmlReader::data(bool empty) {
     const std::optional<std::size_t> wrong = decodeBase64(plain, side);
     const bool atEndTag = rest.substr(plain.size()).starts_with("</");
     if (atEndTag && !(wrong && rest[*wrong] == '&')) {
-      if (wrong) return in_.refuse("no base64", rest.data() + *wrong);
+      if (wrong) return in_.reject("not a valid base64 text", rest.data() + *wrong);
       in_.advance(plain.size());
     } else {  // references or markup in it
       side.truncate(start);
       std::string_view text;
       if (!scalarText(false, text)) return false;
-      if (decodeBase64(text, side)) return in_.refuse("no base64", rest.data());
+      if (decodeBase64(text, side)) return in_.reject("not a valid base64 text", rest.data());
     }
     if (!endTag("</data>")) return false;
   }
@@ -317,7 +318,7 @@ bool XmlReader::data(bool empty) {
 std::optional<DecodingError> readXml(const Data& message, Document& document) {
   XmlSource source(message);
   if (source.open() && XmlReader(source, document).read()) return std::nullopt;
-  return source.takeRefusal();
+  return source.takeRejection();
 }
 
 }  // namespace ironmoat::plist

@@ -22,7 +22,7 @@ bool isXmlInAnyCase(std::string_view name) noexcept {
 bool XmlScanner::takeUntil(std::string_view mark, std::string_view& text) {
   const std::string_view left = rest();
   const std::size_t length = left.find(mark);
-  if (length == std::string_view::npos) return refuse("unexpected end", end_);
+  if (length == std::string_view::npos) return reject("unexpected end of message", end_);
   at_ += length + mark.size();
   text = left.substr(0, length);
   return true;
@@ -31,25 +31,26 @@ bool XmlScanner::takeUntil(std::string_view mark, std::string_view& text) {
 bool XmlScanner::takeQuoted(std::string_view& value) {
   if (take("\"")) return takeUntil("\"", value);
   if (take("'")) return takeUntil("'", value);
-  return refuse("no quoted value");
+  return reject("missing quoted value");
 }
 
 bool XmlScanner::takeAttributeValue(std::string_view& value) {
   skipSpace();
-  if (!take("=")) return refuse("attribute without a value");
+  if (!take("=")) return reject("missing attribute value");
   skipSpace();
   if (!takeQuoted(value)) return false;
   const std::size_t wrong = value.find_first_of("<&");
-  return wrong == std::string_view::npos || refuse("markup in a value", value.data() + wrong);
+  return wrong == std::string_view::npos ||
+         reject("markup in an attribute value not allowed", value.data() + wrong);
 }
 
 bool XmlScanner::takeName(std::string_view& name) {
   name = rest().substr(0, xmlNameLength(rest()));
   at_ += name.size();
-  return !name.empty() || refuse("no name");
+  return !name.empty() || reject("missing name");
 }
 
-bool XmlScanner::requireSpace() { return skipSpace() || refuse("no white space"); }
+bool XmlScanner::requireSpace() { return skipSpace() || reject("missing white space"); }
 
 bool XmlScanner::skipProlog() {
   if (!declaration() || !skipMisc()) return false;
@@ -68,10 +69,10 @@ bool XmlScanner::declaration() {
   if (!looksAt("<?xml") || (rest().size() > 5 && !isXmlSpace(at_[5]))) return true;
   advance(5);
   if (!requireSpace()) return false;
-  if (!take("version")) return refuse("no version");
+  if (!take("version")) return reject("missing version");
   std::string_view value;
   if (!takeAttributeValue(value)) return false;
-  if (!isOneDotDigits(value)) return refuse("unknown version", value.data());
+  if (!isOneDotDigits(value)) return reject("not a valid XML version", value.data());
   bool spaced = skipSpace();
   if (spaced && take("encoding")) {
     if (!takeAttributeValue(value) || !source_.checkEncoding(value, value.data())) return false;
@@ -79,10 +80,11 @@ bool XmlScanner::declaration() {
   }
   if (spaced && take("standalone")) {
     if (!takeAttributeValue(value)) return false;
-    if (value != "yes" && value != "no") return refuse("neither yes nor no", value.data());
+    if (value != "yes" && value != "no")
+      return reject("not a valid standalone value", value.data());
     skipSpace();
   }
-  return take("?>") || refuse("bad declaration");
+  return take("?>") || reject("not a valid XML declaration");
 }
 
 bool XmlScanner::doctype() {
@@ -97,8 +99,8 @@ bool XmlScanner::doctype() {
     if (!takeQuoted(where)) return false;
     skipSpace();
   }
-  if (peek() == '[') return refuse("internal subset");
-  return take(">") || refuse("bad document type");
+  if (peek() == '[') return reject("internal subset not allowed");
+  return take(">") || reject("not a valid document type");
 }
 
 bool XmlScanner::publicIdentifier() {
@@ -108,7 +110,7 @@ bool XmlScanner::publicIdentifier() {
   if (!takeQuoted(identifier)) return false;
   const std::size_t wrong = identifier.find_first_not_of(kCharacters);
   return wrong == std::string_view::npos ||
-         refuse("no public identifier", identifier.data() + wrong);
+         reject("not a valid character in a public identifier", identifier.data() + wrong);
 }
 
 bool XmlScanner::skipMisc() {
@@ -123,11 +125,11 @@ bool XmlScanner::skipMarkup() {
   std::string_view text;
   if (take("<!--")) {
     if (!takeUntil("--", text)) return false;
-    return take(">") || refuse("two hyphens in a comment");
+    return take(">") || reject("two hyphens in a comment not allowed");
   }
   advance(2);
   if (!takeName(text)) return false;
-  if (isXmlInAnyCase(text)) return refuse("misplaced declaration", start);
+  if (isXmlInAnyCase(text)) return reject("unexpected XML declaration", start);
   return take("?>") || (requireSpace() && takeUntil("?>", text));
 }
 

@@ -62,7 +62,7 @@ class XmlScanner {
   /// Moves on to what may end a run of plain text (see findTextStop), or to the end.
   void skipPlainText() noexcept { at_ = findTextStop(at_, end_); }
 
-  // From here on all may refuse, and are false when they have (see XmlSource).
+  // From here on all may reject, and are false when they have (see XmlSource).
 
   /// The text up to `mark`, and moves past both.
   [[nodiscard]] bool takeUntil(std::string_view mark, std::string_view& text);
@@ -79,10 +79,10 @@ class XmlScanner {
   /// Requires looksAtMarkup().
   [[nodiscard]] bool skipMarkup();
 
-  /// Refuses the message as `malformed` for the place here, or for its "unexpected end" there.
-  [[nodiscard]] bool refuse(const char* reason) { return refuse(reason, at_); }
-  [[nodiscard]] bool refuse(const char* reason, const char* at) {
-    return source_.refuse(at == end_ ? "unexpected end" : reason, at);
+  /// Rejects the message as `malformed` for the place here, or for its "unexpected end" there.
+  [[nodiscard]] bool reject(const char* reason) { return reject(reason, at_); }
+  [[nodiscard]] bool reject(const char* reason, const char* at) {
+    return source_.reject(at == end_ ? "unexpected end of message" : reason, at);
   }
 
  private:

@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "plist/refusal.h"
+#include "plist/rejection.h"
 #include "plist/xml_chars.h"
 #include "values/block_builder.h"
 #include "values/utf8.h"
@@ -42,7 +42,7 @@ bool XmlSource::open(Characters characters) {
   }
   if (characters == Characters::known) return true;
   const std::size_t valid = xmlTextPrefix(text_);
-  return valid == text_.size() || refuse("no character of xml", text_.data() + valid);
+  return valid == text_.size() || reject("not a valid XML character", text_.data() + valid);
 }
 
 std::uint32_t XmlSource::utf16Unit(std::size_t index) const noexcept {
@@ -55,7 +55,8 @@ std::uint32_t XmlSource::utf16Unit(std::size_t index) const noexcept {
 bool XmlSource::transcodeUtf16(bool bigEndian) {
   bigEndian_ = bigEndian;
   const std::size_t units = (message_.size() - kUtf16MarkSize) / 2;
-  if (message_.size() % 2 != 0) return refuse(malformed("half a character", message_.size() - 1));
+  if (message_.size() % 2 != 0)
+    return reject(malformed("missing second byte of a UTF-16 character", message_.size() - 1));
   BlockBuilder utf8(sharing());
   for (std::size_t at = 0; at < units;) {
     // In pieces, so that room for the worst case is never made for the whole message.
@@ -74,7 +75,7 @@ bool XmlSource::transcodeUtf16(bool bigEndian) {
       if (isHighSurrogate(c) && at < units && isLowSurrogate(utf16Unit(at))) {
         c = 0x10000 + ((c & 0x3FF) << 10) + (utf16Unit(at++) & 0x3FF);
       } else if (isHighSurrogate(c) || isLowSurrogate(c)) {
-        return refuse(malformed("half a surrogate pair", kUtf16MarkSize + 2 * first));
+        return reject(malformed("not a valid surrogate pair", kUtf16MarkSize + 2 * first));
       }
       out += writeUtf8(c, out);
     }
@@ -88,11 +89,15 @@ bool XmlSource::transcodeUtf16(bool bigEndian) {
 bool XmlSource::checkEncoding(std::string_view name, const char* at) {
   const bool utf16 = equalsIgnoringCase(name, "UTF-16");
   const bool ascii = equalsIgnoringCase(name, "US-ASCII");
-  if (!utf16 && !ascii && !equalsIgnoringCase(name, "UTF-8")) return refuse("unknown encoding", at);
-  if (utf16 != utf16_) return refuse("not in the encoding that it declares", at);
+  if (!utf16 && !ascii && !equalsIgnoringCase(name, "UTF-8"))
+    return reject("not a valid encoding name", at);
+  if (utf16 != utf16_) {
+    return reject(utf16_ ? "encoding not allowed: the message is in UTF-16"
+                         : "encoding not allowed: the message is not in UTF-16",
+                  at);
+  }
   const std::size_t plain = ascii ? asciiPrefix(message_.view()) : message_.size();
-  return plain == message_.size() ||
-         refuse(malformed("not in the encoding that it declares", plain));
+  return plain == message_.size() || reject(malformed("not a valid US-ASCII character", plain));
 }
 
 std::uint64_t XmlSource::offsetInMessage(const char* at) const noexcept {
@@ -108,12 +113,12 @@ std::uint64_t XmlSource::offsetInMessage(const char* at) const noexcept {
   return kUtf16MarkSize + 2 * unit;
 }
 
-bool XmlSource::refuse(const char* reason, const char* at) {
-  return refuse(malformed(reason, offsetInMessage(at)));
+bool XmlSource::reject(const char* reason, const char* at) {
+  return reject(malformed(reason, offsetInMessage(at)));
 }
 
-bool XmlSource::refuse(DecodingError error) {
-  refusal_.emplace(std::move(error));
+bool XmlSource::reject(DecodingError error) {
+  rejection_.emplace(std::move(error));
   return false;
 }
 

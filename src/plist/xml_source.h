@@ -14,7 +14,7 @@ namespace ironmoat::plist {
 /// A message as XML text: known to be UTF-8 and to hold only XML characters. A message in UTF-16 is
 /// transcoded into a block of its own; any other is its own text.
 ///
-/// Nothing is thrown for a bad message. Where the reader refuses it, it says `return refuse(...)`,
+/// Nothing is thrown for a bad message. Where the reader rejects it, it says `return reject(...)`,
 /// which keeps the one error here and is false; every function on the way back returns false at
 /// once, so that nothing goes on with what was not proven.
 class XmlSource {
@@ -24,7 +24,7 @@ class XmlSource {
   /// Keeps a reference to `message`, and has no text until it is opened.
   explicit XmlSource(const Data& message) noexcept : message_(message) {}
 
-  /// Refuses bytes that are no such text; `known` ones have been such a source before, which is not
+  /// Rejects bytes that are no such text; `known` ones have been such a source before, which is not
   /// checked again.
   [[nodiscard]] bool open(Characters characters = Characters::unknown);
 
@@ -41,16 +41,16 @@ class XmlSource {
     return block_ ? block_->sharing() : Sharing::anyThread;
   }
 
-  /// Refuses the message when it is not in the encoding that its declaration names; `at` is where.
+  /// Rejects the message when it is not in the encoding that its declaration names; `at` is where.
   [[nodiscard]] bool checkEncoding(std::string_view name, const char* at);
 
   /// The place `at` of the text, as an offset into the message.
   [[nodiscard]] std::uint64_t offsetInMessage(const char* at) const noexcept;
-  /// Refuses the message as `malformed` for that place.
-  [[nodiscard, gnu::cold, gnu::noinline]] bool refuse(const char* reason, const char* at);
-  [[nodiscard, gnu::cold, gnu::noinline]] bool refuse(DecodingError error);
-  /// Requires that the message was refused.
-  [[nodiscard]] DecodingError takeRefusal() { return std::move(refusal_).value(); }
+  /// Rejects the message as `malformed` for that place.
+  [[nodiscard, gnu::cold, gnu::noinline]] bool reject(const char* reason, const char* at);
+  [[nodiscard, gnu::cold, gnu::noinline]] bool reject(DecodingError error);
+  /// Requires that the message was rejected.
+  [[nodiscard]] DecodingError takeRejection() { return std::move(rejection_).value(); }
 
  private:
   [[nodiscard]] bool transcodeUtf16(bool bigEndian);
@@ -61,7 +61,7 @@ class XmlSource {
   std::string_view text_;
   bool utf16_ = false;
   bool bigEndian_ = false;
-  std::optional<DecodingError> refusal_;
+  std::optional<DecodingError> rejection_;
 };
 
 }  // namespace ironmoat::plist

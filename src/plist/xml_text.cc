@@ -35,7 +35,7 @@ void appendFoldingLineEnds(std::string_view text, BlockBuilder& out) {
     if (number <= 0x10FFFF) number = number * base + digit;  // past it, it stays past it
   }
   character = number;
-  return any || in.refuse("bad reference");
+  return any || in.reject("not a valid character reference");
 }
 
 [[nodiscard]] bool takeReference(XmlScanner& in, BlockBuilder& out) {
@@ -49,11 +49,11 @@ void appendFoldingLineEnds(std::string_view text, BlockBuilder& out) {
   if (in.take("&amp;")) return standsFor('&');
   if (in.take("&quot;")) return standsFor('"');
   if (in.take("&apos;")) return standsFor('\'');
-  if (!in.take("&#")) return in.refuse("unknown entity");
+  if (!in.take("&#")) return in.reject("not a valid entity");
   char32_t character = 0;
   if (!takeCharacterNumber(in, character)) return false;
-  if (!in.take(";")) return in.refuse("bad reference");
-  if (!isXmlCharacter(character)) return in.refuse("no character of xml", start);
+  if (!in.take(";")) return in.reject("not a valid character reference");
+  if (!isXmlCharacter(character)) return in.reject("not a valid XML character", start);
   char utf8[4];
   out.append({utf8, writeUtf8(character, utf8)});
   return true;
@@ -63,7 +63,7 @@ void appendFoldingLineEnds(std::string_view text, BlockBuilder& out) {
 
 bool skipCharacterData(XmlScanner& in) {
   for (in.skipPlainText(); in.peek() == ']'; in.skipPlainText()) {
-    if (in.looksAt("]]>")) return in.refuse("end of cdata outside of any");
+    if (in.looksAt("]]>")) return in.reject("unexpected end of CDATA");
     in.advance(1);
   }
   return true;
@@ -85,7 +85,7 @@ bool transformText(XmlScanner& in, const char* start, BlockBuilder& out) {
     } else if (in.looksAt("</")) {
       return true;
     } else if (!in.looksAtMarkup()) {
-      return in.refuse("element inside a text element");
+      return in.reject("unexpected element inside a text element");
     } else if (!in.skipMarkup()) {
       return false;
     }

@@ -8,7 +8,7 @@
 
 namespace ironmoat::plist {
 
-// All are false when they have refused the message (see XmlSource).
+// All are false when they have rejected the message (see XmlSource).
 
 /// Moves on to a '<', '&' or CR, or to the end.
 [[nodiscard]] bool skipCharacterData(XmlScanner& in);

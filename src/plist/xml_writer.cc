@@ -1,6 +1,7 @@
 #include <charconv>
 #include <cstdint>
 #include <stdexcept>
+#include <string>
 #include <string_view>
 
 #include "plist/base64.h"
@@ -89,7 +90,7 @@ class XmlWriter {
       case Kind::null:
         break;
     }
-    throw std::invalid_argument("a value of a kind that is not written");
+    throw std::invalid_argument("value kind not allowed: " + std::string(nameOf(node.kind)));
   }
 
   void container(NodeIndex index, std::string_view tag) {
@@ -109,7 +110,7 @@ class XmlWriter {
   void text(std::string_view startTag, const Node& node, std::string_view endTag) {
     const std::string_view text = document_.text(node);
     if (xmlTextPrefix(text) != text.size()) {
-      throw std::invalid_argument("text with a character that XML excludes");
+      throw std::invalid_argument("not a valid XML character in a text");
     }
     indent();
     out_.append(startTag);

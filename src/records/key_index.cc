@@ -11,7 +11,7 @@ KeyIndex::KeyIndex(std::span<const std::string_view> keys) : keys_(keys) {
   for (int i = 0; i < kTries; ++i, multiplier += 2 * kStep) {
     if (tryMultiplier(multiplier)) return;
   }
-  throw std::logic_error("no multiplier keeps the keys apart");
+  throw std::logic_error("missing multiplier that gives each key a slot");
 }
 
 bool KeyIndex::tryMultiplier(std::uint64_t multiplier) noexcept {

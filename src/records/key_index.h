@@ -11,7 +11,7 @@ namespace ironmoat::records {
 
 /// No place: what the lookups answer for text that is no key.
 inline constexpr std::size_t kNoKey = 0xFF;
-inline constexpr std::size_t kMostKeys = 0xFF;  // places are bytes, one of which is kNoKey
+inline constexpr std::size_t kMaxKeys = 0xFF;  // places are bytes, one of which is kNoKey
 
 /// From key text to its place in a table, for short tables: the first key that equals it.
 class KeyScan {
@@ -86,7 +86,7 @@ class KeyIndex {
 
   std::span<const std::string_view> keys_;
   std::uint64_t multiplier_ = 0;
-  std::array<std::uint64_t, kMostKeys> folds_{};  // of the keys
+  std::array<std::uint64_t, kMaxKeys> folds_{};  // of the keys
   std::array<std::uint8_t, std::size_t{1} << kSlotBits> slots_;
 };
 

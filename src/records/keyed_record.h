@@ -37,7 +37,7 @@
 /// type or with another row's key does not compile.
 ///
 /// `decode` fills a record that is freshly made, its fields in table order, and returns whether it
-/// did; the first field that is refused ends it (plist/decoder.h says how).
+/// did; the first field that is rejected ends it (plist/decoder.h says how).
 namespace ironmoat::plist {
 class Decoder;
 class Encoder;
@@ -176,7 +176,7 @@ class CodingKeys {
 
  private:
   explicit constexpr CodingKeys(std::size_t index) : index_(static_cast<std::uint8_t>(index)) {
-    static_assert(count <= kMostKeys);
+    static_assert(count <= kMaxKeys);
   }
   static constexpr const std::array<std::string_view, count>& names() {
     return std::remove_const_t<decltype(Table<R>::rows)>::template Fields<R>::names;

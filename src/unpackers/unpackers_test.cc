@@ -1,5 +1,5 @@
-// The three conversions, with stand-ins for the output records' initialisers that write down each
-// call and refuse on demand.
+// The three conversions, with initialisers of the output records that record each call and reject
+// on demand.
 
 #include <gtest/gtest.h>
 
@@ -13,7 +13,9 @@
 #include "frames/frame.h"
 #include "frames/record_codec.h"
 #include "host/server.h"
-#include "support/refusal.h"
+#include "support/rejection.h"
+#include "support/written.h"
+#include "support/xml_message.h"
 #include "unpackers/command_response_unpacker.h"
 #include "unpackers/corvel_payload_unpacker.h"
 #include "unpackers/web_tunnel_response_unpacker.h"
@@ -22,30 +24,30 @@
 namespace ironmoat {
 namespace {
 
-struct Refusal : std::runtime_error {
+namespace xml = testing::xml;
+using xml::entry;
+using xml::list;
+using xml::number;
+using xml::text;
+
+struct Rejection : std::runtime_error {
   using runtime_error::runtime_error;
 };
 
 std::vector<std::string> calls;
-std::string refused;           // the call that the host refuses
-std::function<void()> refuse;  // how
+std::string rejected;          // the call that throws
+std::function<void()> reject;  // throws
 
-/// A call as "type argument", where the argument is the first one.
+/// Records a call as "type argument", with the first argument.
 void note(const std::string& type, const std::string& argument) {
   calls.push_back(type + " " + argument);
-  if (calls.back() == refused) refuse();
+  if (calls.back() == rejected) reject();
 }
 template <class T>
 std::string show(const T& value) {
   if constexpr (std::integral<T>) return std::to_string(value);
   if constexpr (requires { value.view(); }) return std::string(value.view());
   if constexpr (requires { value.has_value(); }) return value ? show(*value) : "-";
-}
-
-std::string joined() {
-  std::string all;
-  for (const std::string& call : calls) all += call + "; ";
-  return all;
 }
 
 }  // namespace
@@ -78,99 +80,82 @@ void admit(const DrelUserPayloadArguments& arguments) { note("payload", show(arg
 
 namespace {
 
-Data message(const std::string& entries) {
-  return Data(std::string_view("<plist><dict>" + entries + "</dict></plist>"));
-}
-std::string list(const std::string& key, const std::vector<std::string>& elements) {
-  std::string all = "<key>" + key + "</key><array>";
-  for (const std::string& entries : elements) all.append("<dict>" + entries + "</dict>");
-  return all + "</array>";
-}
-std::string text(const std::string& key, const std::string& value) {
-  return "<key>" + key + "</key><string>" + value + "</string>";
-}
-std::string number(const std::string& key, int value) {
-  return "<key>" + key + "</key><integer>" + std::to_string(value) + "</integer>";
-}
+Data message(const std::string& entries) { return xml::message(xml::dictionary(entries)); }
 std::string payload(int command, const std::string& entries = "") {
   return number("c", command) + entries;
 }
 
-/// Payload 1 with everything nested in it, down to payloads in payloads, last things first.
-/// Wherever the host refuses, what is left unconverted holds text, and would leak if it were
-/// forgotten.
+/// Payload 1 with a record of every type nested in it, in the reverse order of conversion. Each
+/// holds text, which leaks if a rejection leaves it behind.
 Data tree() {
-  const std::string inner = payload(21, "<key>h</key><dict>" + text("aS", "inner") + "</dict>");
+  const std::string inner = payload(21, entry("h", xml::dictionary(text("aS", "inner"))));
   return message(
-      list("qpla", {text("qpln", "pa")}) + list("qsatv", {"<key>qrip</key><data>aXA=</data>"}) +
+      list("qpla", {text("qpln", "pa")}) + list("qsatv", {entry("qrip", "<data>aXA=</data>")}) +
       list("qal", {number("qri", 1), number("qri", 2), ""}) + list("qplr", {text("qpln", "pr")}) +
-      "<key>Dc</key><dict>" + number("c", 3) + "</dict><key>h</key><dict/>" +
+      entry("Dc", xml::dictionary(number("c", 3))) + entry("h", "<dict/>") +
       list("mml", {payload(31, text("ua", "a") + list("dtl", {inner})), payload(32)}) +
       list("dtl", {payload(11), payload(12, text("ua", "a"))}) + payload(1, text("ua", "a")));
 }
 
-class UnpackersTest : public ::testing::Test {
+class Unpackers : public ::testing::Test {
  protected:
   void SetUp() override {
     calls.clear();
-    refused.clear();
-    refuse = [] { throw Refusal(refused); };
+    rejected.clear();
+    reject = [] { throw Rejection(rejected); };
   }
 };
 
-TEST_F(UnpackersTest, ChildrenComeBeforeParentsInTheOrderOfThePayload) {
-  (void)VeskCorvelPayloadUnpacker().unpack(tree());
-  EXPECT_EQ(joined(),
-            "payload 11; payload 12; headers inner; payload 21; payload 31; payload 32; headers -; "
-            "context 3; request pr; status 1; status 2; status -; token ip; allocation pa; "
-            "payload 1; ");
-}
+using Calls = std::vector<std::string>;
 
-TEST_F(UnpackersTest, NothingIsCalledAfterARefusal) {
+TEST_F(Unpackers, InitialiseChildrenBeforeParentsUntilOneRejects) {
   const Data message = tree();
   (void)VeskCorvelPayloadUnpacker().unpack(message);
-  const std::vector<std::string> all = calls;
+  const Calls all = calls;
+  EXPECT_EQ(all, Calls({"payload 11", "payload 12", "headers inner", "payload 21", "payload 31",
+                        "payload 32", "headers -", "context 3", "request pr", "status 1",
+                        "status 2", "status -", "token ip", "allocation pa", "payload 1"}));
   for (std::size_t i = 0; i < all.size(); ++i) {
     calls.clear();
-    refused = all[i];
-    EXPECT_THROW((void)VeskCorvelPayloadUnpacker().unpack(message), Refusal);
-    EXPECT_EQ(calls, std::vector<std::string>(all.begin(), all.begin() + static_cast<int>(i) + 1));
+    rejected = all[i];
+    EXPECT_THROW((void)VeskCorvelPayloadUnpacker().unpack(message), Rejection);
+    EXPECT_EQ(calls, Calls(all.begin(), all.begin() + static_cast<int>(i) + 1));
   }
 }
 
-TEST_F(UnpackersTest, ATunnelsHeadersComeFirstAndACommandIsOneCall) {
-  const Data tunnel = message(payload(4, "<key>h</key><dict/>"));
+TEST_F(Unpackers, InitialiseTheHeadersOfAResponseFirst) {
+  const Data tunnel = message(payload(4, entry("h", "<dict/>")));
   const Data response = message(payload(9));
   (void)VeskCommandWebTunnelResponseUnpacker().unpack(tunnel);
   (void)VeskCommandResponseUnpacker().unpack(response);
-  EXPECT_EQ(joined(), "headers -; tunnel 4; response 9; ");
-  refused = "headers -";
-  EXPECT_THROW((void)VeskCommandWebTunnelResponseUnpacker().unpack(tunnel), Refusal);
-  EXPECT_EQ(calls.back(), refused);
-  refused = "response 9";
-  EXPECT_THROW((void)VeskCommandResponseUnpacker().unpack(response), Refusal);
+  EXPECT_EQ(calls, Calls({"headers -", "tunnel 4", "response 9"}));
+  rejected = "headers -";
+  EXPECT_THROW((void)VeskCommandWebTunnelResponseUnpacker().unpack(tunnel), Rejection);
+  EXPECT_EQ(calls.back(), rejected);
+  rejected = "response 9";
+  EXPECT_THROW((void)VeskCommandResponseUnpacker().unpack(response), Rejection);
 }
 
-/// A client runs the initialisers a second time, on the record that comes back.
-TEST_F(UnpackersTest, ServeRepliesRejectedByHostWhateverTheInitialiserThrows) {
+TEST_F(Unpackers, ReplyRejectedByHostWhateverTheInitialiserThrows) {
   IronmoatServer server(IronmoatServer::Confine::no);
   server.registerUnpacker<VeskCommandResponse>(VeskCommandResponseUnpacker());
   const auto served = [&] {
-    BlockBuilder request;
     const Data bytes = message(payload(9));
-    frames::appendRequest(request, 5, VeskCommandResponse::schemaName, bytes.view());
-    BlockBuilder reply;
-    server.serve(Data(std::string_view(request.bytes(), request.size()).substr(4)), reply);
-    return frames::parseReply(Data(std::string_view(reply.bytes(), reply.size()).substr(4)));
+    const std::string request = testing::written([&](BlockBuilder& out) {
+      frames::appendRequest(out, 5, VeskCommandResponse::schemaName, bytes.view());
+    });
+    const std::string reply = testing::written(
+        [&](BlockBuilder& out) { server.serve(Data(request.substr(frames::kLengthBytes)), out); });
+    return frames::parseReply(Data(reply.substr(frames::kLengthBytes)));
   };
   const frames::Reply accepted = served();
   EXPECT_EQ(accepted.status, frames::Status::record);
-  refused = "response 9";
+  rejected = "response 9";
   const struct {
-    std::function<void()> refuse;
+    std::function<void()> reject;
     std::string description;
   } rows[] = {
-      {refuse, refused},
+      {reject, rejected},
       {[] { throw std::bad_alloc(); }, std::bad_alloc().what()},
       {[] { throw DecodingError(DecodingError::Kind::malformed, "path", "not a record", 7); },
        "not a record"},
@@ -179,7 +164,7 @@ TEST_F(UnpackersTest, ServeRepliesRejectedByHostWhateverTheInitialiserThrows) {
       {[] { throw 5; }, "the host rejected the record"},
   };
   for (const auto& row : rows) {
-    refuse = row.refuse;
+    reject = row.reject;
     const frames::Reply reply = served();
     EXPECT_EQ(reply.id, 5U);
     ASSERT_EQ(reply.status, frames::Status::refused) << row.description;
@@ -187,20 +172,21 @@ TEST_F(UnpackersTest, ServeRepliesRejectedByHostWhateverTheInitialiserThrows) {
     EXPECT_EQ(testing::inWords(rejection), "rejectedByHost: " + row.description);
     EXPECT_FALSE(rejection.offset().has_value());
   }
+  // A client runs the initialisers a second time, on the record of the reply.
   const auto decode = [&] { (void)frames::decodeRecord<VeskCommandResponse>(accepted.body); };
   EXPECT_THROW(withHostRejections(decode), DecodingError);
-  refused.clear();
+  rejected.clear();
   const auto fail = [] { throw frames::RecordError("not of the host's"); };
   EXPECT_THROW(withHostRejections(fail), frames::RecordError);
 }
 
-TEST_F(UnpackersTest, ADecodingErrorComesBeforeAnyCall) {
-  const Data wrong = message(payload(1, "<key>h</key><dict/>" + list("mml", {""})));
+TEST_F(Unpackers, CallNoInitialiserForAnInvalidMessage) {
+  const Data wrong = message(payload(1, entry("h", "<dict/>") + list("mml", {""})));
   try {
     (void)VeskCorvelPayloadUnpacker().unpack(wrong);
     ADD_FAILURE() << "accepted";
   } catch (const DecodingError& rejection) {
-    EXPECT_EQ(testing::inWords(rejection), "keyNotFound mml[0].c: required key is missing");
+    EXPECT_EQ(testing::inWords(rejection), "keyNotFound mml[0].c: missing required key");
   }
   EXPECT_TRUE(calls.empty());
 }

@@ -19,7 +19,8 @@ BlockBuilder::~BlockBuilder() {
 }
 
 void BlockBuilder::growBy(std::size_t count) {
-  if (count > kMaxSize - size_) throw std::length_error("a block holds at most 4 GiB - 1 bytes");
+  if (count > kMaxSize - size_)
+    throw std::length_error("block size exceeds the limit of 4294967295 bytes");
   const std::size_t wanted =
       std::min(std::max({size_ + count, capacity_ * 2, kFirstCapacity}), kMaxSize);
   // Nobody else can hold a reference before finish(), so moving the block is safe.

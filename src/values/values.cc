@@ -21,7 +21,7 @@ Slice Slice::copyOf(std::string_view bytes, Sharing sharing) {
 }  // namespace detail
 
 String::String(std::string_view text) : slice_(detail::Slice::copyOf(text)) {
-  if (!isValidUtf8(text)) throw std::invalid_argument("text is not valid UTF-8");
+  if (!isValidUtf8(text)) throw std::invalid_argument("not a valid UTF-8 text");
 }
 
 }  // namespace ironmoat

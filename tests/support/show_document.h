@@ -3,11 +3,13 @@
 #include <string>
 
 #include "plist/document.h"
+#include "plist/reader.h"
+#include "support/rejection.h"
 
 namespace ironmoat::plist {
 
-/// Appends one value as `{"key": "text", "other": [1, true, data "bytes"]}`, unambiguously: what
-/// two documents look alike in is equal. For tests and fuzz targets.
+/// Appends one value as `{"key": "text", "other": [1, true, data "bytes"]}`. Two documents with the
+/// same text are equal. For tests and fuzz targets.
 inline void show(const Document& document, NodeIndex index, std::string& out) {
   const Node& node = document.node(index);
   const auto showList = [&](char open, char close, auto&& showItem) {
@@ -51,12 +53,8 @@ inline void show(const Document& document, NodeIndex index, std::string& out) {
     case Kind::wideInteger:
       out += "wide ";
       [[fallthrough]];
-    case Kind::real:
-    case Kind::date:
-    case Kind::uid:
-    case Kind::null:
+    default:
       out += nameOf(node.kind);
-      return;
   }
 }
 
@@ -64,6 +62,13 @@ inline std::string show(const Document& document) {
   std::string out;
   show(document, document.root(), out);
   return out;
+}
+
+/// The tree that a message holds, or its rejection as "kind: description".
+inline std::string readOutcome(const Data& message) {
+  Document document;
+  const auto rejection = read(message, document);
+  return rejection ? testing::inWords(*rejection) : show(document);
 }
 
 }  // namespace ironmoat::plist

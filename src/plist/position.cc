@@ -1,4 +1,4 @@
-#include "plist/place.h"
+#include "plist/position.h"
 
 #include <algorithm>
 #include <cstddef>
@@ -21,7 +21,7 @@ std::uint64_t bigEndian(std::span<const std::uint8_t> bytes) noexcept {
 
 /// A node has the place in the document that its object has in the table. All sizes and offsets
 /// were proven when the message was read.
-std::uint64_t placeInBinary(NodeIndex node, std::span<const std::uint8_t> message) {
+std::uint64_t positionInBinary(NodeIndex node, std::span<const std::uint8_t> message) {
   const auto trailer = message.last(binary::kTrailerSize);
   const std::size_t offsetSize = trailer[6];
   const std::uint64_t table = bigEndian(trailer.last(8));
@@ -30,8 +30,8 @@ std::uint64_t placeInBinary(NodeIndex node, std::span<const std::uint8_t> messag
 
 /// Every element but the root's own is one node, in the order of the start tags; what else has a
 /// '<' is markup that is skipped: no attribute has.
-std::uint64_t placeInXml(NodeIndex node, const Data& message) {
-  XmlSource source(message);  // refuses nothing: it was read before
+std::uint64_t positionInXml(NodeIndex node, const Data& message) {
+  XmlSource source(message);  // rejects nothing: it was read before
   if (!source.open(XmlSource::Characters::known)) return 0;
   XmlScanner in(source);
   if (!in.skipProlog()) return 0;
@@ -52,9 +52,9 @@ std::uint64_t placeInXml(NodeIndex node, const Data& message) {
 
 }  // namespace
 
-std::uint64_t placeOf(NodeIndex node, const Data& message) {
-  if (message.view().starts_with("bplist")) return placeInBinary(node, message.bytes());
-  return placeInXml(node, message);
+std::uint64_t positionOf(NodeIndex node, const Data& message) {
+  if (message.view().starts_with("bplist")) return positionInBinary(node, message.bytes());
+  return positionInXml(node, message);
 }
 
 }  // namespace ironmoat::plist

@@ -20,7 +20,7 @@ inline std::string bigEndianBytes(std::uint64_t value, std::size_t size) {
 }
 
 /// A binary property list put together object by object, so that each part of it can lie.
-struct BinaryDraft {
+struct BinaryBuilder {
   std::vector<std::string> objects;
   std::size_t offsetSize = 2;
   std::size_t referenceSize = 1;
@@ -29,17 +29,17 @@ struct BinaryDraft {
   std::optional<std::uint64_t> tableOffset;
   std::vector<std::uint64_t> offsets;  ///< instead of the true ones, when there are any
 
-  BinaryDraft& add(std::string object) {
+  BinaryBuilder& add(std::string object) {
     objects.push_back(std::move(object));
     return *this;
   }
-  BinaryDraft& ascii(std::string_view text) { return add(head(0x50, text.size()).append(text)); }
-  BinaryDraft& integer(std::uint8_t value) { return add({'\x10', static_cast<char>(value)}); }
-  BinaryDraft& array(const std::vector<std::uint64_t>& elements) {
+  BinaryBuilder& ascii(std::string_view text) { return add(head(0x50, text.size()).append(text)); }
+  BinaryBuilder& integer(std::uint8_t value) { return add({'\x10', static_cast<char>(value)}); }
+  BinaryBuilder& array(const std::vector<std::uint64_t>& elements) {
     return add(head(0xA0, elements.size()) + references(elements));
   }
-  BinaryDraft& dictionary(const std::vector<std::uint64_t>& keys,
-                          const std::vector<std::uint64_t>& values) {
+  BinaryBuilder& dictionary(const std::vector<std::uint64_t>& keys,
+                            const std::vector<std::uint64_t>& values) {
     return add(head(0xD0, keys.size()) + references(keys) + references(values));
   }
 

@@ -8,10 +8,10 @@
 
 namespace ironmoat::plist {
 
-/// `reason`, then " at offset N": how every refusal of bytes reads.
+/// A `malformed` whose description is `reason` and " at offset N".
 DecodingError malformed(std::string_view reason, std::uint64_t offset);
 
-/// Containers nested past limits::nestedContainers.
+/// For containers nested deeper than limits::nestedContainers.
 DecodingError tooDeep();
 
 }  // namespace ironmoat::plist
