@@ -85,6 +85,7 @@ TEST(BinaryReader, RejectsMalformedObjectsWithReasonAndOffset) {
       {"\x4F\x0F"s + "12345678", badLength},
       {"\x4F\x14"s + kZero + kZero, badLength},
       {"\x6F\x23" + std::string(32, 'x'), badLength},
+      {"\xAF\x23" + std::string(32, 'x'), badLength},
       {"\x6F\x13" + kTopBit, tooLong},
       {"\xAF\x13" + kMax, tooLong},
       {"\xDF\x13" + kTopBit, tooLong},

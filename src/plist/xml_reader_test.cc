@@ -236,6 +236,18 @@ TEST(XmlReader, RejectsMalformedMessagesWithReasonAndOffset) {
   }
 }
 
+// S8.
+TEST(XmlReader, RejectsNestingDeeperThanTheLimit) {
+  for (const std::size_t depth : {std::size_t{512}, std::size_t{513}}) {
+    std::string arrays = "<array/>";
+    for (std::size_t i = 1; i < depth; ++i) arrays = "<array>" + arrays + "</array>";
+    EXPECT_EQ(outcome(inPlist(arrays)), depth == 512
+                                            ? std::string(512, '[') + std::string(512, ']')
+                                            : "limitExceeded: nesting exceeds the limit of 512 "
+                                              "containers");
+  }
+}
+
 TEST(XmlReader, RejectsBytesThatAreNotInTheirEncoding) {
   const auto declaring = [](const std::string& name) {
     return "<?xml version='1.0' encoding='" + name + "'?><plist><string>\xC3\xA9</string></plist>";
@@ -294,6 +306,25 @@ TEST(XmlText, FindsStopsAndInvalidCharactersAtEveryPosition) {
       }
     }
   }
+}
+
+TEST(XmlText, NamesHaveTheCharactersThatXmlAllows) {
+  std::uint64_t first = 0;
+  std::uint64_t further = 0;
+  std::uint64_t sum = 0;
+  for (char32_t c = 1; c < 0x110000; ++c) {
+    if (c == 0xD800) c = 0xE000;
+    char bytes[] = "a\0\0\0\0";
+    const std::size_t length = writeUtf8(c, bytes + 1);
+    if (xmlNameLength({bytes + 1, length}) == length) ++first;
+    if (xmlNameLength({bytes, 1 + length}) == 1 + length) {
+      ++further;
+      sum += c;
+    }
+  }
+  EXPECT_EQ(first, 971506U);
+  EXPECT_EQ(further, 971506U + 127U);
+  EXPECT_EQ(sum, 482650548487U + 109542U);
 }
 
 TEST(XmlReader, LiteralTextIsAViewOfTheMessage) {

@@ -68,7 +68,7 @@ bool XmlScanner::declaration() {
   }
   if (!looksAt("<?xml") || (rest().size() > 5 && !isXmlSpace(at_[5]))) return true;
   advance(5);
-  if (!requireSpace()) return false;
+  skipSpace();
   if (!take("version")) return reject("missing version");
   std::string_view value;
   if (!takeAttributeValue(value)) return false;

@@ -12,7 +12,7 @@
 namespace ironmoat {
 namespace {
 
-TEST(ValuesTest, SlicesOutliveWhoMadeThemAndCanBeDetached) {
+TEST(Values, KeepTheirBlockUntilDetached) {
   String kept;
   for (const Sharing sharing : {Sharing::anyThread, Sharing::oneThread}) {
     {
@@ -26,7 +26,7 @@ TEST(ValuesTest, SlicesOutliveWhoMadeThemAndCanBeDetached) {
   EXPECT_EQ(own.view(), "message");
 }
 
-TEST(ValuesTest, ZeroBytesAreBytesLikeAnyOther) {
+TEST(Values, HoldZeroBytes) {
   const std::string_view expected("a\0b", 3);
   EXPECT_EQ(Data("a\0b").view(), expected);
   EXPECT_EQ(String("a\0b").view(), expected);
@@ -35,28 +35,37 @@ TEST(ValuesTest, ZeroBytesAreBytesLikeAnyOther) {
   EXPECT_EQ(Data(std::vector<unsigned char>{'a', 0, 'b'}).view(), expected);
 }
 
-TEST(ValuesTest, TextIsAlwaysWellFormedUtf8) {
+TEST(Utf8, ValidPrefixEndsBeforeTheFirstMalformedSequence) {
   const struct {
     std::string_view text;
     std::size_t valid;
   } rows[] = {
       {"plain and long enough for the wide path", 39},
       {"\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80z", 10},
-      {"ab\xC0\x80", 2},        // over long
-      {"\xE0\x9F\xBF", 0},      // over long
-      {"\xF0\x8F\xBF\xBF", 0},  // over long
-      {"x\xED\xA0\x80", 1},     // surrogate
-      {"\xED\x9F\xBF\xEE\x80\x80", 6},
-      {"\xF4\x90\x80\x80", 0},  // past U+10FFFF
-      {"\xF4\x8F\xBF\xBF", 4},
-      {"\xE2\x82", 0},  // truncated
-      {"\x80", 0},
+      {"ab\xC0\x80", 2},
+      {"x\xED\xA0\x80", 1},
+      {"\xE2\x82", 0},
       {"\xC3(", 0},
+      {"\xE2\x82(", 0},
+      {"\xE2\x82\xC0", 0},
+      {"\xF0\x9F\x98(", 0},
   };
   for (const auto& row : rows) {
     EXPECT_EQ(validUtf8Prefix(row.text), row.valid) << testing::PrintToString(row.text);
   }
   EXPECT_THROW(String("\xff"), std::invalid_argument);
+  // No overlong form, no surrogate and nothing past U+10FFFF begins with any two bytes.
+  std::size_t sequences = 0;
+  for (unsigned lead = 0x80; lead < 0x100; ++lead) {
+    for (unsigned second = 0; second < 0x100; ++second) {
+      const char text[] = {static_cast<char>(lead), static_cast<char>(second), '\x80', '\xBF'};
+      sequences += validUtf8Prefix({text, 4}) >= 2 ? 1 : 0;
+    }
+  }
+  EXPECT_EQ(sequences, 30 * 64 + (32 + 12 * 64 + 32 + 2 * 64) + (48 + 3 * 64 + 16));
+}
+
+TEST(Utf8, FindsTheFirstForeignByteOfAsciiAtEveryPosition) {
   for (std::size_t length = 1; length <= 40; ++length) {
     std::string text(length, 'x');
     EXPECT_TRUE(isAscii(text));
@@ -66,6 +75,19 @@ TEST(ValuesTest, TextIsAlwaysWellFormedUtf8) {
       EXPECT_EQ(validUtf8Prefix(text), at);
       text[at] = 'x';
     }
+  }
+}
+
+TEST(Utf8, WrittenCharactersAreValidAndComeBackAsUtf16) {
+  for (char32_t c = 0; c < 0x110000; ++c) {
+    if (c == 0xD800) c = 0xE000;
+    char bytes[4];
+    const std::string_view text(bytes, writeUtf8(c, bytes));
+    ASSERT_TRUE(isValidUtf8(text)) << static_cast<std::uint32_t>(c);
+    const std::u16string units = utf16FromUtf8(text);
+    const char32_t back =
+        units.size() == 1 ? units[0] : 0x10000 + ((units[0] & 0x3FFU) << 10) + (units[1] & 0x3FFU);
+    ASSERT_EQ(back, c);
   }
 }
 
