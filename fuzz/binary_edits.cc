@@ -16,32 +16,32 @@ std::uint64_t BinaryEditor::edge() {
       0,           1,          14,         15,         0x7F,       0x80,         0xFF,
       0x100,       0x7FFF,     0xFFFF,     0x10000,    0x7FFFFFFF, 0x80000000,   0xFFFFFFFF,
       0x100000000, 1ULL << 62, 1ULL << 63, ~0ULL >> 1, ~0ULL,      ~0ULL / 2 - 1};
-  if (oneIn(3)) return sketch_.objects.size() + below(3) - 1;
+  if (oneIn(3)) return graph_.objects.size() + below(3) - 1;
   return kEdges[below(std::size(kEdges))] + below(2);
 }
 
-Sketched* BinaryEditor::someContainer() {
+GraphObject* BinaryEditor::someContainer() {
   for (int tries = 0; tries < 8; ++tries) {
-    Sketched& object = sketch_.objects[someObject()];
+    GraphObject& object = graph_.objects[someObject()];
     if (object.isContainer() && !object.sameAs) return &object;
   }
   return nullptr;
 }
 std::uint64_t* BinaryEditor::someReference() {
-  Sketched* container = someContainer();
+  GraphObject* container = someContainer();
   if (container == nullptr || container->references.empty()) return nullptr;
   return &container->references[below(container->references.size())];
 }
 
-std::uint64_t BinaryEditor::add(Sketched object) {
-  sketch_.objects.push_back(std::move(object));
-  const std::size_t count = sketch_.objects.size();
-  if (sketch_.referenceSize == 1 && count > 0x100) sketch_.referenceSize = 2;
+std::uint64_t BinaryEditor::add(GraphObject object) {
+  graph_.objects.push_back(std::move(object));
+  const std::size_t count = graph_.objects.size();
+  if (graph_.referenceSize == 1 && count > 0x100) graph_.referenceSize = 2;
   return count - 1;
 }
 std::uint64_t BinaryEditor::addText(std::string_view text) {
-  for (std::size_t i = 0; i < sketch_.objects.size(); ++i) {
-    if (sketch_.objects[i].kind() == 5 && sketch_.objects[i].body == text) return i;
+  for (std::size_t i = 0; i < graph_.objects.size(); ++i) {
+    if (graph_.objects[i].kind() == 5 && graph_.objects[i].body == text) return i;
   }
   return add({0x50, std::string(text), {}, {}, 0, {}});
 }
@@ -97,12 +97,12 @@ std::uint64_t BinaryEditor::addContainer(std::uint64_t element, std::size_t time
               {}});
 }
 std::uint64_t BinaryEditor::addDictionary() {
-  Sketched dictionary{0xD0, {}, {}, {}, 0, {}};
+  GraphObject dictionary{0xD0, {}, {}, {}, 0, {}};
   if (!oneIn(5)) dictionary.references = {addText("c"), addInteger()};
   return add(std::move(dictionary));
 }
 
-void BinaryEditor::addEntry(Sketched& dictionary, std::uint64_t key, std::uint64_t value) {
+void BinaryEditor::addEntry(GraphObject& dictionary, std::uint64_t key, std::uint64_t value) {
   auto& references = dictionary.references;
   const std::size_t half = references.size() / 2;
   const std::size_t place = below(half + 1);
@@ -112,13 +112,13 @@ void BinaryEditor::addEntry(Sketched& dictionary, std::uint64_t key, std::uint64
 
 /// A known key with, mostly, a value of the kind that its field holds.
 void BinaryEditor::editEntries() {
-  std::size_t which = sketch_.objects.size();
-  for (int tries = 0; tries < 8 && which == sketch_.objects.size(); ++tries) {
+  std::size_t which = graph_.objects.size();
+  for (int tries = 0; tries < 8 && which == graph_.objects.size(); ++tries) {
     const std::size_t object = someObject();
-    if (sketch_.objects[object].kind() == 0xD && !sketch_.objects[object].sameAs) which = object;
+    if (graph_.objects[object].kind() == 0xD && !graph_.objects[object].sameAs) which = object;
   }
-  if (which == sketch_.objects.size()) {
-    sketch_.root = addDictionary();
+  if (which == graph_.objects.size()) {
+    graph_.root = addDictionary();
     return;
   }
   const WireKey& key = wireKeys()[below(wireKeys().size())];
@@ -150,11 +150,11 @@ void BinaryEditor::editEntries() {
         value = addContainer(addDictionary(), below(4));
     }
   }
-  addEntry(sketch_.objects[which], name, value);
+  addEntry(graph_.objects[which], name, value);
 }
 
 void BinaryEditor::editReferences() {
-  Sketched* container = someContainer();
+  GraphObject* container = someContainer();
   if (container == nullptr) return editEntries();
   auto& references = container->references;
   const std::size_t place = below(references.size() + 1);
@@ -176,7 +176,7 @@ void BinaryEditor::editReferences() {
 
 void BinaryEditor::editObject() {
   const std::size_t which = someObject();
-  Sketched& object = sketch_.objects[which];
+  GraphObject& object = graph_.objects[which];
   switch (below(6)) {
     case 0:
       object.marker = static_cast<std::uint8_t>(random_());
@@ -194,8 +194,8 @@ void BinaryEditor::editObject() {
     }
     case 4: {
       const std::uint64_t other = oneIn(4) ? addDictionary() : addScalar();
-      sketch_.objects[which] = sketch_.objects[other];
-      sketch_.objects.pop_back();
+      graph_.objects[which] = graph_.objects[other];
+      graph_.objects.pop_back();
       break;
     }
     default:
@@ -204,44 +204,44 @@ void BinaryEditor::editObject() {
 }
 
 void BinaryEditor::editOrder() {
-  if (sketch_.objects.size() < 2) return;
+  if (graph_.objects.size() < 2) return;
   const std::uint64_t a = someObject();
   const std::uint64_t b = someObject();
-  std::swap(sketch_.objects[a], sketch_.objects[b]);
+  std::swap(graph_.objects[a], graph_.objects[b]);
   if (oneIn(8)) return;  // what was meant for one now meets the other
   const auto follow = [&](std::uint64_t& reference) {
     reference = reference == a ? b : reference == b ? a : reference;
   };
-  follow(sketch_.root);
-  for (Sketched& object : sketch_.objects) std::ranges::for_each(object.references, follow);
+  follow(graph_.root);
+  for (GraphObject& object : graph_.objects) std::ranges::for_each(object.references, follow);
 }
 
 void BinaryEditor::editSizes() {
-  (oneIn(2) ? sketch_.offsetSize : sketch_.referenceSize) = 1 + below(8);
+  (oneIn(2) ? graph_.offsetSize : graph_.referenceSize) = 1 + below(8);
 }
 
 void BinaryEditor::editTrailer() {
   switch (below(7)) {
     case 0:
-      sketch_.count = edge();
+      graph_.count = edge();
       break;
     case 1:
-      sketch_.root = oneIn(2) ? someObject() : edge();
+      graph_.root = oneIn(2) ? someObject() : edge();
       break;
     case 2:
-      sketch_.table = edge();
+      graph_.table = edge();
       break;
     case 3:
-      sketch_.saidOffsetSize = static_cast<std::uint8_t>(below(10));
+      graph_.saidOffsetSize = static_cast<std::uint8_t>(below(10));
       break;
     case 4:
-      sketch_.saidReferenceSize = static_cast<std::uint8_t>(below(10));
+      graph_.saidReferenceSize = static_cast<std::uint8_t>(below(10));
       break;
     case 5:
-      sketch_.offset = {someObject(), edge()};
+      graph_.offset = {someObject(), edge()};
       break;
     default:
-      sketch_.objects[someObject()].sameAs = someObject();
+      graph_.objects[someObject()].sameAs = someObject();
   }
 }
 
@@ -251,14 +251,14 @@ void BinaryEditor::share() {
   if (reference == nullptr) return editEntries();
   const std::uint64_t old = *reference;
   if (oneIn(6)) {
-    *reference = sketch_.root;
+    *reference = graph_.root;
     return;
   }
   std::uint64_t next = oneIn(2) ? old : someObject();
   const bool payloads = oneIn(2);
   const std::size_t levels = oneIn(8) ? 1 + below(600) : 1 + below(4);
   const std::size_t width = levels > 20 ? 1 : 1 + below(3);
-  const std::uint64_t here = sketch_.objects.size() + 3 + levels * (payloads ? 2 : 1);
+  const std::uint64_t here = graph_.objects.size() + 3 + levels * (payloads ? 2 : 1);
   *reference = here - 1;
   const std::uint64_t key = add({0x50, "c", {}, {}, 0, {}});
   const std::uint64_t command = add({0x10, "\1", {}, {}, 0, {}});
@@ -297,11 +297,11 @@ void BinaryEditor::edit() {
   }
 }
 
-void BinaryEditor::adopt(const BinarySketch& other) {
-  const std::uint64_t shift = sketch_.objects.size();
+void BinaryEditor::adopt(const BinaryGraph& other) {
+  const std::uint64_t shift = graph_.objects.size();
   std::uint64_t* reference = someReference();
   if (reference != nullptr) *reference = other.root + shift;
-  for (Sketched object : other.objects) {
+  for (GraphObject object : other.objects) {
     for (std::uint64_t& child : object.references) child += shift;
     if (object.sameAs) *object.sameAs += shift;
     add(std::move(object));

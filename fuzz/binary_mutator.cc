@@ -1,5 +1,5 @@
-// How libFuzzer changes messages of the binary form: half the time as a graph of objects, the other
-// half as bytes, which reaches what no writer produces.
+// The mutator of binary messages for libFuzzer. Half of the changes are to the graph of objects,
+// and half to plain bytes, which reaches messages that no writer produces.
 
 #include <algorithm>
 #include <cstdint>
@@ -19,7 +19,7 @@ extern "C" std::size_t LLVMFuzzerCustomCrossOver(const std::uint8_t* a, std::siz
 namespace {
 
 using ironmoat::fuzz::BinaryEditor;
-using ironmoat::fuzz::BinarySketch;
+using ironmoat::fuzz::BinaryGraph;
 
 std::string_view textOf(const std::uint8_t* data, std::size_t size) {
   return {reinterpret_cast<const char*>(data), size};
@@ -36,9 +36,9 @@ void mutateBytes(std::string& bytes) {
   bytes.resize(LLVMFuzzerMutate(reinterpret_cast<std::uint8_t*>(bytes.data()), size, bytes.size()));
 }
 
-/// Writes the sketch, unless it is too large.
-std::size_t write(const BinarySketch& sketch, std::uint8_t* out, std::size_t maxSize) {
-  const std::string bytes = sketch.write();
+/// Writes the graph, unless it is too large.
+std::size_t write(const BinaryGraph& graph, std::uint8_t* out, std::size_t maxSize) {
+  const std::string bytes = graph.write();
   if (bytes.size() > maxSize) return 0;
   std::copy(bytes.begin(), bytes.end(), out);
   return bytes.size();
@@ -49,10 +49,10 @@ std::size_t write(const BinarySketch& sketch, std::uint8_t* out, std::size_t max
 extern "C" std::size_t LLVMFuzzerCustomMutator(std::uint8_t* data, std::size_t size,
                                                std::size_t maxSize, unsigned seed) {
   if (seed % 2 == 0 && isBinary(textOf(data, size))) {
-    BinarySketch sketch = BinarySketch::parse(textOf(data, size));
-    BinaryEditor editor(sketch, seed, mutateBytes);
+    BinaryGraph graph = BinaryGraph::parse(textOf(data, size));
+    BinaryEditor editor(graph, seed, mutateBytes);
     for (unsigned edits = 1 + seed / 2 % 4; edits > 0; --edits) editor.edit();
-    if (const std::size_t written = write(sketch, data, maxSize); written != 0) return written;
+    if (const std::size_t written = write(graph, data, maxSize); written != 0) return written;
   }
   return LLVMFuzzerMutate(data, size, maxSize);
 }
@@ -62,7 +62,7 @@ extern "C" std::size_t LLVMFuzzerCustomCrossOver(const std::uint8_t* a, std::siz
                                                  std::uint8_t* out, std::size_t maxSize,
                                                  unsigned seed) {
   if (!isBinary(textOf(a, aSize)) || !isBinary(textOf(b, bSize))) return 0;
-  BinarySketch sketch = BinarySketch::parse(textOf(a, aSize));
-  BinaryEditor(sketch, seed, mutateBytes).adopt(BinarySketch::parse(textOf(b, bSize)));
-  return write(sketch, out, maxSize);
+  BinaryGraph graph = BinaryGraph::parse(textOf(a, aSize));
+  BinaryEditor(graph, seed, mutateBytes).adopt(BinaryGraph::parse(textOf(b, bSize)));
+  return write(graph, out, maxSize);
 }

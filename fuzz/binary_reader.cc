@@ -1,5 +1,6 @@
-// Any bytes as the binary form: the same bytes always give the same tree or the same error, what is
-// read is within its bounds, and comes back equal from both forms. (S1, S2, S8-S10)
+// Reads any bytes as the binary format. The same bytes must give the same tree or rejection every
+// time, indices must be in bounds, and the tree must come back equal from both formats. (S1, S2,
+// S8-S10)
 
 #include <cstddef>
 #include <cstdint>

@@ -17,7 +17,7 @@
 
 namespace ironmoat::fuzz {
 
-/// The rejection of a reader, "kind: sentence", or nothing when it accepted the message.
+/// The rejection of a reader, "kind: description", or nothing when it accepted the message.
 template <class Read>
 std::string rejectionOf(Read read, const Data& message, plist::Document& document) {
   const std::optional<DecodingError> rejection = read(message, document);
@@ -93,7 +93,8 @@ inline Walk walk(const plist::Document& document) {
   return walk;
 }
 
-/// Reading the same bytes gives the same, and what was read comes back equal from either form.
+/// Requires that the same bytes give the same outcome, and that the tree comes back equal from
+/// either format.
 template <class Read>
 void checkReading(Read read, const Data& message) {
   plist::Document document;

@@ -1,5 +1,5 @@
-// Records of every kind, made of the input's bytes: encoded in either form and decoded, each comes
-// back as it was. The first byte chooses the kind, the second how many fields are present. (S10)
+// Encodes records made of the input in both formats and decodes them: each must come back equal.
+// The first byte chooses the type, the second how many fields are present. (S10)
 
 #include "plist/encoder.h"
 

@@ -1,6 +1,6 @@
-// Any bytes as a message of each kind, all the way: decoded as a second, slow decoder does it, paid
-// for exactly as there; unpacked, carried in a reply, taken out of it; written again in both forms
-// and unpacked to the same reply, or to the same rejection. (S1, S2, S4, S9-S11)
+// Decodes any bytes as each type of message, with the outcome and the costs of a second, slow
+// decoder. The record must survive a reply. Written in both formats, record and tree must give the
+// same outcome again. (S1, S2, S4, S9-S11)
 
 #include <cstddef>
 #include <cstdint>

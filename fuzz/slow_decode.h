@@ -17,7 +17,7 @@ namespace ironmoat {
 
 namespace fuzz {
 
-/// A record as text, or why there is none: "kind path: sentence".
+/// A record as text, or why there is none: "kind path: description".
 struct Outcome {
   bool accepted = false;
   std::string text;
@@ -88,8 +88,8 @@ class SlowDecoder {
   struct Rejected {
     std::string text;
   };
-  [[noreturn]] static void reject(std::string_view kind, Path path, std::string_view sentence) {
-    throw Rejected{std::string(kind) + " " + path + ": " + std::string(sentence)};
+  [[noreturn]] static void reject(std::string_view kind, Path path, std::string_view description) {
+    throw Rejected{std::string(kind) + " " + path + ": " + std::string(description)};
   }
 
   const plist::Node& expect(plist::Kind kind, plist::NodeIndex index, Path path) {
@@ -100,8 +100,8 @@ class SlowDecoder {
     }
     return node;
   }
-  static void pay(std::size_t& left, std::size_t amount, Path path, std::string_view sentence) {
-    if (amount > left) reject("limitExceeded", path, sentence);
+  static void pay(std::size_t& left, std::size_t amount, Path path, std::string_view description) {
+    if (amount > left) reject("limitExceeded", path, description);
     left -= amount;
   }
 

@@ -1,4 +1,4 @@
-// Prints the words of both forms for libFuzzer: `write_dictionary binary` or `xml`. Wire keys come
+// Prints the words of a format for libFuzzer: `write_dictionary binary` or `xml`. Wire keys come
 // from the records' tables.
 
 #include <cstdio>

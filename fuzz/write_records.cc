@@ -1,8 +1,8 @@
-// Writes generated records of the three kinds of message in both forms, for other readers:
+// Writes generated records of the three types of message in both formats, for other readers:
 //
 //     write_records FOLDER
 //
-// A file is KIND-NUMBER.FORM. Two large payloads make a binary form's offsets and references wide.
+// A file is KIND-NUMBER.FORMAT. Two large payloads make offsets and references wide.
 
 #include <cstdint>
 #include <cstdlib>

@@ -19,7 +19,7 @@ namespace {
 constexpr char kAlphabet[] = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
 constexpr std::uint32_t kForeign = 0x80000000U;  // apart from the 24 bits that values take
 
-// For each of a group's four places, what a character contributes to its 24 bits.
+// The contribution of each character to the 24 bits of a group, for each of four positions.
 constexpr auto kBits = [] {
   std::array<std::array<std::uint32_t, 256>, 4> bits{};
   for (std::size_t place = 0; place < 4; ++place) {
@@ -36,7 +36,7 @@ std::uint32_t groupBits(const char* four) noexcept {
   return kBits[0][at(0)] | kBits[1][at(1)] | kBits[2][at(2)] | kBits[3][at(3)];
 }
 
-/// Writes six bytes, and two more that the next ones replace.
+/// Writes six bytes, and two more that will be overwritten.
 void putTwoGroups(std::uint32_t first, std::uint32_t second, char* out) noexcept {
   std::uint64_t bytes = (std::uint64_t{first} << 40) | (std::uint64_t{second} << 16);
   if constexpr (std::endian::native == std::endian::little) bytes = __builtin_bswap64(bytes);
@@ -54,12 +54,13 @@ const char* skipSpace(const char* at, const char* end) noexcept {
 }
 
 #ifdef IRONMOAT_HAS_SHUFFLES
-/// 16 characters to 12 bytes at a time, as long as all 16 are of the alphabet: three times as fast
-/// as the tables. `low` and `high`, by a character's nibbles, have no bit in common just for the
-/// alphabet; `toValue`, by the upper nibble (one less for '/'), is what turns it into its value.
+/// Decodes 16 characters into 12 bytes at a time while all 16 are in the alphabet. `low` and
+/// `high`, indexed by a character's nibbles, have no common bit exactly for the alphabet.
+/// `toValue`, indexed by the upper nibble (minus one for '/'), is the difference from a character
+/// to its value.
 ///
-/// A step writes 16 bytes where 12 count. They have room: it takes none unless 24 characters are
-/// left, for which `out` still has 18 bytes and the 2 more that `decode` asks for.
+/// A step writes 16 bytes, of which 12 count. It requires 24 more characters, for which `out` has
+/// 18 bytes left and the 2 more that `decode` requires.
 __attribute__((target("ssse3"))) void decodeSixteens(const char*& at, const char* end,
                                                      char*& out) noexcept {
   const __m128i low = _mm_setr_epi8(0x15, 0x11, 0x11, 0x11, 0x11, 0x11, 0x11, 0x11, 0x11, 0x11,
@@ -88,11 +89,11 @@ __attribute__((target("ssse3"))) void decodeSixteens(const char*& at, const char
 void decodeSixteens(const char*&, const char*, char*&) noexcept {}
 #endif
 
-/// Writes to `out`, which has room for 3 bytes per 4 characters begun and 2 more, and leaves it
-/// past what was written. Returns null, or where the text is wrong.
+/// Decodes to `out`, which must have 3 bytes for each 4 characters or part of them, and 2 more;
+/// moves `out` past the result. Returns null, or the position of the first invalid character.
 const char* decode(const char* at, const char* end, char*& out, Base64Way way) noexcept {
   for (;;) {
-    at = skipSpace(at, end);  // between two lines, mostly
+    at = skipSpace(at, end);  // usually between two lines
     if (way == Base64Way::shuffles) decodeSixteens(at, end, out);
     for (; end - at >= 8; at += 8, out += 6) {
       const std::uint32_t first = groupBits(at);
@@ -100,7 +101,7 @@ const char* decode(const char* at, const char* end, char*& out, Base64Way way) n
       if (((first | second) & kForeign) != 0) break;
       putTwoGroups(first, second, out);
     }
-    // The last four of a line: what follows is no foreign character, but the next line.
+    // The last four of a line, before white space.
     if (end - at >= 4) {
       const std::uint32_t group = groupBits(at);
       if ((group & kForeign) == 0) {
@@ -109,7 +110,7 @@ const char* decode(const char* at, const char* end, char*& out, Base64Way way) n
         continue;
       }
     }
-    // Something else is near, or the end: one group, character by character.
+    // One group character by character: near white space, padding, a foreign character or the end.
     std::uint32_t group = 0;
     unsigned place = 0;
     for (; place < 4; ++place, ++at) {
@@ -124,7 +125,7 @@ const char* decode(const char* at, const char* end, char*& out, Base64Way way) n
       continue;
     }
     if (place == 0) return at == end ? nullptr : at;
-    const unsigned count = place - 1;  // bytes that the last group holds
+    const unsigned count = place - 1;  // bytes in the last group
     if (count == 0 || (group & (0xFFFFFFU >> (8 * count))) != 0) return at;
     for (; place < 4; ++place, ++at) {
       at = skipSpace(at, end);

@@ -4,7 +4,7 @@
 #include <cstdint>
 #include <string_view>
 
-/// The binary form: header, objects, a table of their offsets, a trailer. All integers are
+/// The binary format: header, objects, a table of their offsets, a trailer. All integers are
 /// big-endian.
 ///
 ///     file    = "bplist00" object+ offset{objectCount} trailer
@@ -24,8 +24,8 @@
 ///             | 0xDc length reference* reference*         dictionary: keys, then values
 ///     length  = nothing, when c < 15: the length is c     | integer object, when c = 15
 ///
-/// Aside: nothing keeps objects from overlapping, references from forming cycles, or an integer
-/// from claiming a length that is not there; the reader does.
+/// The format itself permits overlapping objects, cycles of references and lengths that exceed the
+/// message. The reader rejects them.
 namespace ironmoat::plist::binary {
 
 inline constexpr std::string_view kHeader = "bplist00";

@@ -23,9 +23,10 @@ namespace ironmoat::plist {
 
 using binary::Marker;
 
-/// Three passes, each linear in the message: every object of the table becomes a node; keys are
-/// checked to be text; the graph is measured, and rejected when it is cyclic or too deep. What can
-/// reject the message returns whether it did not; nothing is done with it afterwards.
+/// Reads a message in three passes, each linear in its size: make a node of each object in the
+/// offset table, check that keys are text, and measure the graph, which must be acyclic and within
+/// the nesting limit. Functions return false when they reject the message; callers must then return
+/// false at once.
 class BinaryReader {
  public:
   BinaryReader(const Data& message, Document& document)
@@ -43,7 +44,7 @@ class BinaryReader {
     }
   }
 
-  /// Why the message is rejected; none: the document is complete.
+  /// Returns the rejection if there is one; otherwise the document is complete.
   std::optional<DecodingError> read() {
     if (!readTrailer() || !readObjects() || !checkKeys() || !measure())
       return std::move(rejection_);
@@ -53,8 +54,8 @@ class BinaryReader {
   }
 
  private:
-  /// `size` bytes (1 to 8) as an unsigned number, by one load of 8: from any place below the
-  /// trailer that stays inside the message, since the trailer's 32 bytes follow.
+  /// `size` bytes (1 to 8) as an unsigned number. Loads 8 bytes at once, which stay inside the
+  /// message for any position before the trailer of 32 bytes.
   static std::uint64_t bigEndian(const unsigned char* bytes, std::size_t size) {
     static_assert(binary::kTrailerSize >= 8);
     static_assert(std::endian::native == std::endian::little);
@@ -63,7 +64,7 @@ class BinaryReader {
     return __builtin_bswap64(word) >> (64 - 8 * size);
   }
 
-  /// A length that follows in one byte.
+  /// The marker of a length in one byte.
   static constexpr std::uint8_t kByteFollows = 0x10;
   static constexpr std::uint16_t kTooDeep = limits::nestedContainers + 1;
   static constexpr std::uint16_t kOpen = std::numeric_limits<std::uint16_t>::max();
@@ -93,16 +94,17 @@ class BinaryReader {
     }
     const std::uint64_t count = bigEndian(bytes_ + trailer + 8, 8);
     const std::uint64_t root = bigEndian(bytes_ + trailer + 16, 8);
-    const std::uint64_t table = bigEndian(bytes_ + trailer + 24, 8);  // the message's last bytes
+    const std::uint64_t table =
+        bigEndian(bytes_ + trailer + 24, 8);  // the last bytes of the message
     if (table <= binary::kHeader.size() || table >= trailer) {
       return reject("not a valid position of the offset table", trailer + 24);
     }
-    // The table fills the room up to the trailer exactly. Dividing keeps the product from wrapping.
+    // The table must end exactly at the trailer. Division cannot overflow, as a product could.
     if (count != (trailer - table) / offsetSize_ || (trailer - table) % offsetSize_ != 0) {
       return reject("not a valid object count for the offset table", trailer + 8);
     }
-    // Each object takes a byte of a room in which they may not overlap: bounds what is allocated
-    // for them by the bytes that are there.
+    // Each object takes at least one byte, and objects must not overlap. So the size of the message
+    // bounds the memory that is allocated for nodes.
     if (count > table - binary::kHeader.size()) {
       return reject("object count exceeds the object area", trailer + 8);
     }
@@ -115,26 +117,27 @@ class BinaryReader {
 
   [[nodiscard]] bool readObjects() {
     Node* const nodes = nodes_.extend(objectCount_);
-    // Copies, which the compiler need not load again for each object.
+    // Local copies, which the compiler need not reload for each object.
     const unsigned char* const bytes = bytes_;
     const std::size_t end = objectsEnd_;
     const std::size_t count = objectCount_;
     const std::size_t offsetSize = offsetSize_;
     const std::size_t base = base_;
-    // Objects may overlap, but not so much that their sum exceeds the room they share: that bounds
-    // the work by the size of the message.
-    std::size_t room = end - binary::kHeader.size();
+    // The sizes of all objects must not exceed the object area together, which bounds the work by
+    // the size of the message.
+    std::size_t left = end - binary::kHeader.size();
     std::size_t entry = end;
     for (std::size_t i = 0; i < count; ++i, entry += offsetSize) {
       const std::uint64_t offset = bigEndian(bytes + entry, offsetSize);
-      if (offset - binary::kHeader.size() >= end - binary::kHeader.size()) {  // below it, too
+      if (offset - binary::kHeader.size() >=
+          end - binary::kHeader.size()) {  // wraps below the area
         return reject("not a valid object offset", entry);
       }
       const std::size_t start = static_cast<std::size_t>(offset);
       const std::uint8_t marker = bytes[start];
       const auto kind = static_cast<Marker>(marker >> 4);
-      // Most objects are short texts (keys are), data or integers: in line, a seventh off a typical
-      // message. Whatever is not quite so is left to `readObject`, rejections too.
+      // Most objects are short texts, data or integers, which are read inline. All others, and all
+      // rejections, are left to `readObject`.
       std::size_t body = start + 1;
       std::size_t length = marker & 0x0F;
       std::size_t size = 0;
@@ -142,7 +145,7 @@ class BinaryReader {
         bool fits = true;
         if (length == binary::kLengthFollows) {
           fits = bytes[body] == kByteFollows;
-          length = bytes[body + 1];  // inside the message: the trailer is longer than that
+          length = bytes[body + 1];  // inside the message, because of the trailer
           body += 2;
         }
         fits = fits && body + length <= end;
@@ -162,13 +165,13 @@ class BinaryReader {
         if (!readObject(start, nodes[i], objectEnd)) return false;
         size = objectEnd - start;
       }
-      if (size > room) return reject("overlapping objects not allowed", start);
-      room -= size;
+      if (size > left) return reject("overlapping objects not allowed", start);
+      left -= size;
     }
     return true;
   }
 
-  /// Reads the object at `at`, which is inside the object area, and finds where it ends.
+  /// Reads the object at `at`, which must be inside the object area, and sets its end.
   [[nodiscard]] bool readObject(std::size_t at, Node& node, std::size_t& end) {
     const std::uint8_t marker = bytes_[at];
     const std::uint8_t low = marker & 0x0F;
@@ -208,7 +211,7 @@ class BinaryReader {
     return reject("not a valid object marker", at);
   }
 
-  /// Sets `end` to `start + count`, proven to lie inside the object area.
+  /// Sets `end` to `start + count`; rejects an end outside the object area.
   [[nodiscard]] bool need(std::size_t start, std::uint64_t count, std::size_t object,
                           std::size_t& end) {
     if (count > objectsEnd_ - start) return reject("object exceeds the object area", object);
@@ -221,7 +224,7 @@ class BinaryReader {
     const unsigned char* bytes = bytes_ + at + 1;
     node.kind = Kind::integer;
     if (size <= 8) {
-      node.payload = bigEndian(bytes, size);  // 8 bytes: two's complement already
+      node.payload = bigEndian(bytes, size);  // of 8 bytes: already in two's complement
       return true;
     }
     node.payload = bigEndian(bytes + 8, 8);
@@ -230,7 +233,7 @@ class BinaryReader {
     return true;
   }
 
-  /// The length of the object at `at`, and where what it counts begins.
+  /// Reads the length of the object at `at`, and the position of its content.
   [[nodiscard]] bool readLength(std::size_t at, std::uint64_t& length, std::size_t& body) {
     body = at + 1;
     length = bytes_[at] & 0x0F;
@@ -243,7 +246,7 @@ class BinaryReader {
     const std::size_t size = std::size_t{1} << (bytes_[marker] & 0x0F);
     const std::size_t digits = body;
     if (!need(digits, size, at, body)) return false;
-    length = bigEndian(bytes_ + digits, size);  // a negative one is huge, and does not fit
+    length = bigEndian(bytes_ + digits, size);  // a negative one exceeds any message
     return true;
   }
 
@@ -267,9 +270,9 @@ class BinaryReader {
     return {reinterpret_cast<const char*>(bytes_) + (node.payload - base_), node.count};
   }
 
-  /// Texts of fewer than 16 bytes are tested in one go. Reading 16 bytes from any place in the
-  /// object area, its end included, stays inside the message: the offset table and the trailer
-  /// behind it take 33 bytes at least.
+  /// Tests a text of fewer than 16 bytes at once. Reading 16 bytes from any position up to the end
+  /// of the object area stays inside the message, because the offset table and the trailer behind
+  /// it have at least 33 bytes.
   [[nodiscard]] static bool isAsciiInside(const unsigned char* text, std::size_t length) {
     static_assert(binary::kTrailerSize >= 16);
 #if defined(__SSE2__)
@@ -314,7 +317,7 @@ class BinaryReader {
     std::size_t body = 0;
     std::uint64_t count = 0;
     if (!readLength(at, count, body)) return false;
-    // Each element takes a byte at least, so that neither product can wrap.
+    // Each element takes at least one byte, so neither product can overflow.
     if (count > objectsEnd_) return reject("object exceeds the object area", at);
     const std::size_t references = static_cast<std::size_t>(count) * (dictionary ? 2 : 1);
     if (!need(body, references * referenceSize_, at, end)) return false;
@@ -336,7 +339,7 @@ class BinaryReader {
     }
     if (highest >= objectCount_) return rejectStray(from, count);
     if (lowest > current_) return true;
-    // Scalars may be shared from anywhere: they close no cycle and their height is known.
+    // References to earlier scalars do not matter: they close no cycle, and their height is 0.
     for (std::size_t i = 0; i < count; ++i) {
       if (children[i] <= current_ && isContainer(nodes_[children[i]])) parentsFirst_ = false;
     }
@@ -376,8 +379,9 @@ class BinaryReader {
     return node.kind < Kind::string;
   }
 
-  /// What most writers produce: parents stand before their children, hence no cycle, and from the
-  /// last object to the first every height is known before it is asked for.
+  /// For messages with all parents before their children, as most writers emit them. There is no
+  /// cycle, and each height is known before it is needed when objects are visited from the last to
+  /// the first.
   [[nodiscard]] bool measureBackwards() {
     for (std::size_t i = containers_.size(); i-- > 0;) {
       Node& node = nodes_[containers_[i]];
@@ -390,8 +394,8 @@ class BinaryReader {
     return true;
   }
 
-  /// Any graph: depth first from the root, each container entered once, however often it is shared.
-  /// A height of 0 is a container not yet seen, kOpen one that is being walked.
+  /// For any graph: depth first from the root. Each container is entered once, however often it is
+  /// shared. Its height is 0 before, and kOpen during the visit.
   [[nodiscard]] bool measureFromRoot() {
     struct Step {
       NodeIndex node;
@@ -420,7 +424,7 @@ class BinaryReader {
       const Node& node = nodes_[child];
       if (!isContainer(node)) continue;
       if (node.height == kOpen) return reject("reference cycle not allowed", offsetOf(child));
-      // The child's own container counts even where its height is not yet known.
+      // A child whose height is not known yet has a height of at least 1.
       if (way.size() + std::max<std::size_t>(node.height, 1) > limits::nestedContainers) {
         return reject(tooDeep());
       }
@@ -438,20 +442,20 @@ class BinaryReader {
 
   const unsigned char* const bytes_;
   const std::size_t size_;
-  const std::size_t base_;  // of the message in its block
+  const std::size_t base_;  // offset of the message in its block
   Document& document_;
   Document::Nodes& nodes_;
   Document::Children& children_;
-  ScratchArray<NodeIndex, 128> containers_;  // in the order of the table
+  ScratchArray<NodeIndex, 128> containers_;  // in the order of the offset table
   BlockBuilder side_;
 
   std::size_t offsetSize_ = 0;
   std::size_t referenceSize_ = 0;
   std::size_t objectCount_ = 0;
-  std::size_t objectsEnd_ = 0;  // also where the offset table begins
+  std::size_t objectsEnd_ = 0;  // also the beginning of the offset table
   NodeIndex root_ = 0;
   NodeIndex current_ = 0;
-  bool parentsFirst_ = true;  // no reference to a container that stands earlier
+  bool parentsFirst_ = true;  // no reference to an earlier container
   std::optional<DecodingError> rejection_;
 };
 

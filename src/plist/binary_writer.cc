@@ -16,7 +16,7 @@ namespace {
 
 using binary::Marker;
 
-/// The bytes that `value` needs, as the form allows: 1, 2, 4 or 8.
+/// The size of `value` in the format: 1, 2, 4 or 8 bytes.
 std::size_t bytesFor(std::uint64_t value) {
   if (value <= 0xFF) return 1;
   if (value <= 0xFFFF) return 2;
@@ -51,8 +51,8 @@ class BinaryWriter {
   }
 
  private:
-  /// Gives every node below `root` an object number, parents before children, equal texts one
-  /// number between them.
+  /// Numbers the nodes below `root` as objects, parents before children. Equal texts share a
+  /// number.
   void number(NodeIndex root) {
     static constexpr std::uint32_t kNone = UINT32_MAX;
     const auto visit = [&](NodeIndex index) {
@@ -105,7 +105,7 @@ class BinaryWriter {
   }
 
   void writeInteger(std::uint64_t bits) {
-    const std::size_t size = bytesFor(bits);  // a negative one has its top bit set: 8 bytes, signed
+    const std::size_t size = bytesFor(bits);  // 8 for a negative one, whose top bit is set
     std::uint8_t marker = static_cast<std::uint8_t>(Marker::integer) << 4;
     for (std::size_t n = size; n > 1; n /= 2) ++marker;
     put(marker, 1);

@@ -17,29 +17,29 @@
 
 namespace ironmoat::plist {
 
-/// What a message may still cost, see ironmoat/limits.h.
+/// The remaining cost that a message may incur (ironmoat/limits.h).
 struct Budget {
   std::size_t recordBytes = limits::recordBytes;
   std::size_t deliveredBytes = limits::deliveredBytes;
   std::size_t scannedEntries = limits::scannedEntries;
 };
 
-/// What the decoders of one message share.
+/// The state that all decoders of one message share.
 struct Decoding {
   const Document& document;
-  const Data* message = nullptr;  ///< in whose bytes a rejection names a place; none: in no bytes
+  const Data* message = nullptr;  ///< for the offset of a rejection; null: without an offset
   Budget budget = {};
-  std::optional<DecodingError> rejection = {};  ///< once a decoder has rejected the message
+  std::optional<DecodingError> rejection = {};  ///< set by the decoder that rejects the message
 };
 
 template <class Keys>
 class KeyedDecodingContainer;
 
-/// A decoder positioned on one value of a document. Lives on the stack, below its parent's; knows
-/// the way from the top, so that a rejection can name it.
+/// A decoder positioned on one value of a document. Must not outlive its parent, which it links to
+/// so that a rejection can give the path.
 ///
-/// Whatever decodes returns whether it did. If it did not, the message is rejected, the reason is
-/// in `Decoding::rejection`, and what was decoded so far is useless.
+/// Decoding functions return false when they reject the message. The reason is then in
+/// `Decoding::rejection`, and the fields decoded so far must not be used.
 class Decoder {
  public:
   explicit Decoder(Decoding& decoding) noexcept
@@ -60,7 +60,7 @@ class Decoder {
   Decoder(const Decoder&) = delete;
   Decoder& operator=(const Decoder&) = delete;
 
-  /// The current value as a dictionary. False, with a rejection, when it is not one.
+  /// The current value as a dictionary. Rejects any other kind; the container is then false.
   template <class Keys>
   [[nodiscard]] KeyedDecodingContainer<Keys> container() const {
     return KeyedDecodingContainer<Keys>(*this);
@@ -69,7 +69,7 @@ class Decoder {
   [[nodiscard]] const Document& document() const noexcept { return document_; }
   [[nodiscard]] const Node& node() const noexcept { return document_.node(node_); }
 
-  /// The current node is of this kind.
+  /// Requires the current node to be of `kind`; otherwise rejects the message as a type mismatch.
   [[nodiscard]] bool expect(Kind kind) const {
     if (node().kind == kind) return true;
     rejectMismatch(kind);
@@ -120,7 +120,7 @@ template <class T>
 concept Scalar = std::same_as<T, Int> || std::same_as<T, Int64> || std::same_as<T, Bool> ||
     std::same_as<T, String> || std::same_as<T, Data>;
 
-/// The current value is one for a field of type T, and is paid for.
+/// Requires a value that a field of type T can hold, and charges its bytes to the budget.
 template <Scalar T>
 [[nodiscard]] bool admitsScalar(const Decoder& decoder) {
   if constexpr (std::same_as<T, Bool>) {
@@ -134,8 +134,8 @@ template <Scalar T>
     return false;
   }
 }
-/// The value; requires that it was admitted. In line, or each text and data would go through memory
-/// (a tenth of any message).
+/// The value. Requires a preceding admitsScalar(). Always inlined, so that text and data are
+/// returned in registers.
 template <Scalar T>
 [[gnu::always_inline]] inline T scalar(const Decoder& decoder) {
   const Node& node = decoder.node();
@@ -148,7 +148,7 @@ template <Scalar T>
   }
 }
 
-/// The current value into a field that is there already.
+/// Decodes the current value into an existing field.
 template <Scalar T>
 [[nodiscard]] bool decodeInto(const Decoder& decoder, T& value) {
   if (!admitsScalar<T>(decoder)) return false;
@@ -172,8 +172,8 @@ template <class T>
 }
 
 /// A dictionary, seen through an enumeration of keys: `Keys::count`, `Keys::at(index)`,
-/// `index()`, `stringValue()`, and `Keys::finder()`, which maps text to a case. Of several entries
-/// under one key the last one counts; entries under other keys are passed over.
+/// `index()`, `stringValue()`, and `Keys::finder()`, which maps text to a case. The last of several
+/// entries under one key counts. Entries under unknown keys are ignored.
 template <class Keys>
 class KeyedDecodingContainer {
  public:
@@ -185,14 +185,14 @@ class KeyedDecodingContainer {
     if (open_) findEntries();
   }
 
-  /// Whether there is a dictionary. Everything below requires it.
+  /// Whether the value is a dictionary. All other members require it.
   explicit operator bool() const noexcept { return open_; }
 
   [[nodiscard]] bool contains(Keys key) const noexcept {
     return ((seen_[key.index() / 64] >> (key.index() % 64)) & 1) != 0;
   }
 
-  /// The entry under `key`, which is required.
+  /// Decodes the entry under `key`; rejects the message if there is none.
   template <class T>
   [[nodiscard]] bool decode(T& value, Keys key) const {
     if (contains(key)) {
@@ -201,15 +201,15 @@ class KeyedDecodingContainer {
     decoder_.rejectMissing(key.stringValue());
     return false;
   }
-  /// The entry under `key`, if there is one; `value` must be absent so far. In line, so that a
-  /// caller that knows of the entry need not have it tested.
+  /// Decodes the entry under `key` if there is one. `value` must be absent. Always inlined, so that
+  /// a caller which knows of the entry saves the test.
   template <class T>
   [[nodiscard, gnu::always_inline]] bool decodeIfPresent(Optional<T>& value, Keys key) const {
     return !contains(key) || decodeEntry(value, key);
   }
 
-  /// Calls `visit(key)` in the order of the cases, for each that has an entry and each in
-  /// `required`, as long as it returns true; returns whether it always did.
+  /// Calls `visit(key)` in the order of the cases for each key that has an entry or is in
+  /// `required`. Stops, and returns false, when a call returns false.
   template <class Visitor>
   [[nodiscard]] bool forEach(const KeySet& required, Visitor&& visit) const {
     for (std::size_t word = 0; word < seen_.size(); ++word) {
@@ -244,8 +244,8 @@ class KeyedDecodingContainer {
     const auto values = document.values(dictionary);
     const auto& find = Keys::finder();
     for (std::size_t i = 0; i < keys.size(); ++i) {
-      // Keys of a large dictionary may lie anywhere: without this, two cache misses in a row for
-      // each (4 times the time of the worst message).
+      // Keys of a large dictionary may lie anywhere in memory. Prefetching avoids two dependent
+      // cache misses for each key.
       if (keys.size() - i > 2 * kAhead) {
         __builtin_prefetch(&document.node(keys[i + 2 * kAhead]));
         __builtin_prefetch(document.text(document.node(keys[i + kAhead])).data());

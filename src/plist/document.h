@@ -27,31 +27,30 @@ enum class Kind : std::uint8_t {
   null,
 };
 
-/// For people: "dictionary", "data", "integer", ...
+/// The name in descriptions: "dictionary", "data", "integer", ...
 std::string_view nameOf(Kind kind) noexcept;
 
-/// A node's place in its document.
+/// The index of a node in its document.
 using NodeIndex = std::uint32_t;
 
 /// One value, in 16 bytes.
 struct Node {
   Kind kind;
-  bool transformed;       ///< string, data: the bytes stand in the side block, not in the source
+  bool transformed;       ///< string, data: the bytes are in the side block, not the source
   std::uint16_t height;   ///< containers on the longest way down, this one included; scalars 0
   std::uint32_t count;    ///< dictionary: entries; array, set: elements; string, data: bytes
   std::uint64_t payload;  ///< containers: first child; string, data: offset; scalars: the value
 };
 static_assert(sizeof(Node) == 16);
 
-/// A whole property list, flat: nodes, and for each container a span of child indices (of a
-/// dictionary first all keys, then all values). Text and data are ranges of two blocks: the source,
-/// where the message has them literally, and a side block for what had to be transformed (UTF-16,
+/// A whole property list as an array of nodes. Each container has a span of child indices; that of
+/// a dictionary has all keys, then all values. Text and data are ranges of two blocks: the source
+/// block (the message) for literal bytes, and the side block for transformed ones (UTF-16,
 /// entities, base64).
 ///
-/// Whoever fills a document establishes, and every reader of it relies on: indices and ranges are
-/// in bounds; keys are strings; strings are valid UTF-8; there is no cycle below the root and no
-/// way down through more than limits::nestedContainers containers. A node may be the child of
-/// several containers.
+/// Invariants, established by BinaryReader and DocumentBuilder: indices and ranges are in bounds;
+/// keys are strings; strings are valid UTF-8; there is no cycle below the root, and no path through
+/// more than limits::nestedContainers containers. A node may have several parents.
 class Document {
  public:
   Document() noexcept = default;
@@ -87,7 +86,7 @@ class Document {
   friend class BinaryReader;
   friend class DocumentBuilder;
 
-  // Room for an ordinary message of some 40 fields without an allocation.
+  // Inline capacity for a message of about 40 fields, which then needs no allocation.
   using Nodes = ScratchArray<Node, 96>;
   using Children = ScratchArray<NodeIndex, 160>;
 

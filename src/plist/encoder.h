@@ -10,12 +10,12 @@ namespace ironmoat::plist {
 template <class Keys>
 class KeyedEncodingContainer;
 
-/// Where a record's encoding writes its value: one container, opened once.
+/// The destination of one record's encoding, which opens one container in it.
 class Encoder {
  public:
   explicit Encoder(DocumentBuilder& builder) noexcept : builder_(builder) {}
 
-  /// Opens a dictionary as the current value; whoever asked for the value closes it.
+  /// Opens a dictionary as the current value. encodeValue() closes it.
   template <class Keys>
   [[nodiscard]] KeyedEncodingContainer<Keys> container() {
     if (!builder_.beginDictionary()) throw tooDeep();
@@ -70,13 +70,14 @@ class KeyedEncodingContainer {
 
 enum class Format { binary, xml };
 
-/// A record to bytes, by `R::encode(Encoder&)`.
+/// Encodes a record as a property list by `R::encode(Encoder&)`.
 class PropertyListEncoder {
  public:
   explicit PropertyListEncoder(Format format) noexcept : format_(format) {}
 
-  /// Throws DecodingError `limitExceeded` for a record nested too deep to be read again,
-  /// std::invalid_argument for text that XML cannot hold, and whatever R's encoding throws.
+  /// Throws DecodingError `limitExceeded` for a record nested deeper than
+  /// limits::nestedContainers, std::invalid_argument for text that XML cannot hold, and the
+  /// exceptions of R's encoding.
   template <class R>
   [[nodiscard]] Data encode(const R& record) const {
     Document document;

@@ -19,8 +19,8 @@ std::uint64_t bigEndian(std::span<const std::uint8_t> bytes) noexcept {
   return value;
 }
 
-/// A node has the place in the document that its object has in the table. All sizes and offsets
-/// were proven when the message was read.
+/// The index of a node is that of its object in the offset table. All sizes and offsets were
+/// checked when the message was read.
 std::uint64_t positionInBinary(NodeIndex node, std::span<const std::uint8_t> message) {
   const auto trailer = message.last(binary::kTrailerSize);
   const std::size_t offsetSize = trailer[6];
@@ -28,10 +28,10 @@ std::uint64_t positionInBinary(NodeIndex node, std::span<const std::uint8_t> mes
   return bigEndian(message.subspan(table + node * offsetSize, offsetSize));
 }
 
-/// Every element but the root's own is one node, in the order of the start tags; what else has a
-/// '<' is markup that is skipped: no attribute has.
+/// Each element below the root element is one node, in the order of the start tags. Any other '<'
+/// begins markup that is skipped; attributes have none.
 std::uint64_t positionInXml(NodeIndex node, const Data& message) {
-  XmlSource source(message);  // rejects nothing: it was read before
+  XmlSource source(message);  // accepts the message, as the reader has
   if (!source.open(XmlSource::Characters::known)) return 0;
   XmlScanner in(source);
   if (!in.skipProlog()) return 0;

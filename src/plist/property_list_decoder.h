@@ -11,12 +11,12 @@
 
 namespace ironmoat::plist {
 
-/// Bytes of either form to a record. Holds nothing between calls.
+/// Decodes a property list of either format into a record. Stateless.
 class PropertyListDecoder {
  public:
-  /// Into `record`, freshly made, by its `decode`. Returns why the message is rejected; the record
-  /// is then useless. None: the record keeps a reference to the message's block, and depends on
-  /// nothing else.
+  /// Fills `record`, which must be newly made, by its `decode`. Returns the rejection if there is
+  /// one; the record must then not be used. A decoded record holds a reference to the message's
+  /// block.
   template <class R>
   [[nodiscard]] std::optional<DecodingError> decode(const Data& message, R& record) const {
     Document document;

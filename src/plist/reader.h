@@ -8,15 +8,15 @@
 
 namespace ironmoat::plist {
 
-/// Reads a whole property list into `document`, which must be empty: binary when the bytes begin
-/// with "bplist", XML otherwise. The document holds the message's block and copies nothing that the
-/// message has literally.
+/// Reads a whole property list into `document`, which must be empty. The format is binary if the
+/// bytes begin with "bplist", otherwise XML. The document holds a reference to the message's block,
+/// and copies only bytes that are transformed. Takes time linear in the size of the message.
 ///
-/// Returns why the message is rejected, `malformed` with an offset into it or `limitExceeded`; the
-/// document is then useless. None: it was read. Time is linear in the size of the message.
+/// Returns the rejection if there is one: `malformed` with an offset, or `limitExceeded`. The
+/// document must then not be used.
 [[nodiscard]] std::optional<DecodingError> read(const Data& message, Document& document);
 
-/// One form each, for tests. Requires at most limits::messageBytes.
+/// Read one format each. Require at most limits::messageBytes. For tests.
 [[nodiscard]] std::optional<DecodingError> readBinary(const Data& message, Document& document);
 [[nodiscard]] std::optional<DecodingError> readXml(const Data& message, Document& document);
 

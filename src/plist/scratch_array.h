@@ -9,8 +9,8 @@
 
 namespace ironmoat::plist {
 
-/// A growable array of plain values with room for the first `InlineCount` in the object itself, so
-/// that an ordinary message is read without an allocation. Not copied, not moved.
+/// A growable array of trivial values. The first `InlineCount` are stored in the object itself, so
+/// that most messages are read without an allocation. Neither copyable nor movable.
 template <class T, std::size_t InlineCount>
 class ScratchArray {
   static_assert(std::is_trivially_copyable_v<T> && std::is_trivially_destructible_v<T>);
@@ -36,8 +36,8 @@ class ScratchArray {
     if (size_ == capacity_) growTo(size_ + 1);
     items_[size_++] = value;
   }
-  /// Appends `count` items for the caller to write, in one piece. The count must have been proven
-  /// against the message.
+  /// Appends `count` contiguous items, which the caller must write. The count must be bounded by
+  /// the size of the message.
   T* extend(std::size_t count) {
     if (count > capacity_ - size_) growTo(size_ + count);
     T* place = items_ + size_;

@@ -5,12 +5,12 @@
 
 namespace ironmoat::plist {
 
-/// The document as a property list that `read` and any other reader take back equal. Only kinds
-/// that a record can hold are written: dictionary, array, string, data, integer, boolean; any other
-/// throws std::invalid_argument.
+/// Write the document as a property list from which `read` makes an equal document. Throw
+/// std::invalid_argument for kinds that no record holds: only dictionary, array, string, data,
+/// integer and boolean are written.
 ///
-/// XML cannot hold every text: characters that it excludes (U+0000, most other control characters,
-/// U+FFFE, U+FFFF) throw std::invalid_argument from `writeXml`. No DOCTYPE is written.
+/// writeXml also throws std::invalid_argument for text with characters that XML excludes (U+0000,
+/// other control characters but tab, LF and CR, U+FFFE, U+FFFF). It writes no DOCTYPE.
 Data writeBinary(const Document& document);
 Data writeXml(const Document& document);
 

@@ -8,7 +8,7 @@ namespace ironmoat::plist {
 
 namespace {
 
-/// Past ASCII but no character of XML: U+FFFE and U+FFFF. Surrogates are no UTF-8 to begin with.
+/// Whether valid UTF-8 past ASCII is not an XML character: U+FFFE or U+FFFF.
 bool isNoncharacter(const char* sequence, std::size_t length) noexcept {
   return length == 3 && std::memcmp(sequence, "\xEF\xBF", 2) == 0 &&
          static_cast<unsigned char>(sequence[2]) >= 0xBE;
@@ -20,7 +20,7 @@ const char* skipPlainAscii(const char* at, const char* end) noexcept {
   for (; end - at >= 16; at += 16) {
     const __m128i bytes = _mm_loadu_si128(reinterpret_cast<const __m128i*>(at));
     const auto are = [&](char c) { return _mm_cmpeq_epi8(bytes, _mm_set1_epi8(c)); };
-    // Signed: bytes of 0x80 and more are below the space, too.
+    // The comparison is signed: bytes from 0x80 are less than a space.
     const __m128i low = _mm_cmplt_epi8(bytes, _mm_set1_epi8(' '));
     const __m128i space = _mm_or_si128(_mm_or_si128(are('\t'), are('\n')), are('\r'));
     const auto mask = static_cast<unsigned>(_mm_movemask_epi8(_mm_andnot_si128(space, low)));
@@ -31,8 +31,7 @@ const char* skipPlainAscii(const char* at, const char* end) noexcept {
     return (static_cast<unsigned char>(c) >= ' ' && static_cast<unsigned char>(c) < 0x80) ||
            isXmlSpace(c);
   };
-  // What is left, or everything where there is no wider way: by words, and those with white space
-  // in them by bytes.
+  // The rest, or all of it without SSE2: by words, and words with white space by bytes.
   for (; end - at >= 8; at += 8) {
     std::uint64_t bytes;
     std::memcpy(&bytes, at, sizeof bytes);
@@ -65,7 +64,7 @@ bool contains(const Range (&ranges)[Count], char32_t c) noexcept {
                      [c](const Range& range) { return range.first <= c && c <= range.last; });
 }
 
-/// The character that `sequence`, a well-formed one, stands for.
+/// The code point of a well-formed sequence.
 char32_t decodeSequence(std::string_view sequence) noexcept {
   const auto lead = static_cast<unsigned char>(sequence[0]);
   if (sequence.size() == 1) return lead;

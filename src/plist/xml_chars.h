@@ -17,16 +17,17 @@ constexpr bool isXmlSpace(char c) noexcept {
   return c == ' ' || c == '\n' || c == '\t' || c == '\r';
 }
 
-/// Whether XML 1.0 has the character at all, written out or as a reference.
+/// Whether XML 1.0 allows the character, literally or as a reference.
 constexpr bool isXmlCharacter(char32_t c) noexcept {
   if (c < 0x20) return c == '\t' || c == '\n' || c == '\r';
   return c < 0xD800 || (c >= 0xE000 && c <= 0x10FFFF && c != 0xFFFE && c != 0xFFFF);
 }
 
-/// Length in bytes of the longest prefix that is well-formed UTF-8 of nothing but XML characters.
+/// Length in bytes of the longest prefix that is well-formed UTF-8 and has only XML characters.
 std::size_t xmlTextPrefix(std::string_view text) noexcept;
 
-/// Length in bytes of the XML name at the start of `text`, which is valid UTF-8; 0 when none is.
+/// Length in bytes of the XML name at the start of `text`, which must be valid UTF-8; 0 if there is
+/// none.
 std::size_t xmlNameLength(std::string_view text) noexcept;
 
 /// The first '<', '&', ']' or CR, or `end`.
@@ -41,7 +42,7 @@ inline const char* findTextStop(const char* at, const char* end) noexcept {
     if (mask != 0) return at + std::countr_zero(mask);
   }
 #endif
-  // What is left, or everything where there is no wider way: words without a stop, then bytes.
+  // The rest, or all of it without SSE2: words without a stop, then bytes.
   for (; end - at >= 8; at += 8) {
     std::uint64_t bytes;
     std::memcpy(&bytes, at, sizeof bytes);

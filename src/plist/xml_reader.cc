@@ -23,11 +23,11 @@ class XmlReader {
         builder_(document, source.block(), source.sharing()),
         scratch_(source.sharing()) {}
 
-  // Like all here, false when the message was rejected (see XmlSource). Not inlined, so that the
-  // compiler still makes one piece of what runs for each element: a tenth of the instructions.
+  // Like all functions here, returns false when it rejects the message (see XmlSource). Not
+  // inlined, so that the compiler inlines the functions for an element into it instead.
   [[nodiscard, gnu::noinline]] bool read() {
     if (!in_.skipProlog() || !beginRoot()) return false;
-    while (place_ != Place::after) {
+    while (expected_ != Expected::after) {
       if (!takeNext()) return false;
     }
     if (!in_.skipMisc()) return false;
@@ -37,8 +37,8 @@ class XmlReader {
   }
 
  private:
-  /// What may come next.
-  enum class Place { onlyValue, endOfRoot, element, key, value, after };
+  /// What is expected next.
+  enum class Expected { onlyValue, endOfRoot, element, key, value, after };
 
   enum class Element {
     unknown,
@@ -76,8 +76,8 @@ class XmlReader {
   XmlSource& source_;
   XmlScanner in_;
   DocumentBuilder builder_;
-  BlockBuilder scratch_;  // text of a scalar or of data that is not literal
-  Place place_ = Place::onlyValue;
+  BlockBuilder scratch_;  // text of scalars and data that is not literal
+  Expected expected_ = Expected::onlyValue;
 };
 
 bool XmlReader::beginRoot() {
@@ -108,22 +108,22 @@ bool XmlReader::takeNext() {
 }
 
 bool XmlReader::endTagOfContainer() {
-  switch (place_) {
-    case Place::onlyValue:
+  switch (expected_) {
+    case Expected::onlyValue:
       return in_.reject("missing value in the plist");
-    case Place::value:
+    case Expected::value:
       return in_.reject("missing value after a key");
-    case Place::endOfRoot:
+    case Expected::endOfRoot:
       if (!endTag("</plist>")) return false;
-      place_ = Place::after;
+      expected_ = Expected::after;
       return true;
-    case Place::element:
+    case Expected::element:
       if (!endTag("</array>")) return false;
       break;
-    case Place::key:
+    case Expected::key:
       if (!endTag("</dict>")) return false;
       break;
-    case Place::after:
+    case Expected::after:
       break;
   }
   endContainer();
@@ -133,9 +133,9 @@ bool XmlReader::endTagOfContainer() {
 void XmlReader::endContainer() {
   builder_.end();
   if (builder_.depth() == 0) {
-    place_ = Place::endOfRoot;
+    expected_ = Expected::endOfRoot;
   } else {
-    place_ = builder_.inDictionary() ? Place::key : Place::element;
+    expected_ = builder_.inDictionary() ? Expected::key : Expected::element;
   }
 }
 
@@ -143,21 +143,22 @@ bool XmlReader::takeElement(Element element, const char* start) {
   bool empty = false;
   if (!endOfStartTag(empty)) return false;
   if (element == Element::key) {
-    if (place_ == Place::value) return in_.reject("missing value after a key", start);
-    if (place_ != Place::key) return in_.reject("unexpected key outside a dictionary", start);
-    place_ = Place::value;
+    if (expected_ == Expected::value) return in_.reject("missing value after a key", start);
+    if (expected_ != Expected::key) return in_.reject("unexpected key outside a dictionary", start);
+    expected_ = Expected::value;
     return string(empty, "</key>");
   }
-  if (place_ == Place::key) return in_.reject("missing key before a value", start);
-  if (place_ == Place::endOfRoot) return in_.reject("unexpected second value in the plist", start);
+  if (expected_ == Expected::key) return in_.reject("missing key before a value", start);
+  if (expected_ == Expected::endOfRoot)
+    return in_.reject("unexpected second value in the plist", start);
   return value(element, empty);
 }
 
 bool XmlReader::value(Element element, bool empty) {
-  if (place_ == Place::value) {
-    place_ = Place::key;
-  } else if (place_ == Place::onlyValue) {
-    place_ = Place::endOfRoot;
+  if (expected_ == Expected::value) {
+    expected_ = Expected::key;
+  } else if (expected_ == Expected::onlyValue) {
+    expected_ = Expected::endOfRoot;
   }
   switch (element) {
     case Element::dictionary:
@@ -179,7 +180,7 @@ bool XmlReader::value(Element element, bool empty) {
       return empty || endTag("</false>");
     case Element::key:
     case Element::unknown:
-      break;  // no values
+      break;  // not values
   }
   return true;
 }
@@ -188,7 +189,7 @@ bool XmlReader::container(Element element, bool empty) {
   const bool dictionary = element == Element::dictionary;
   const bool begun = dictionary ? builder_.beginDictionary() : builder_.beginArray();
   if (!begun) return source_.reject(tooDeep());
-  place_ = dictionary ? Place::key : Place::element;
+  expected_ = dictionary ? Expected::key : Expected::element;
   if (empty) endContainer();
   return true;
 }
@@ -212,7 +213,7 @@ bool XmlReader::scalar(Element element, bool empty) {
   }
 }
 
-/// Moves past '<' and an element's name, if it is one.
+/// Takes '<' and the name of an element; takes nothing if the name is unknown.
 XmlReader::Element XmlReader::takeElementName() noexcept {
   switch (in_.peek(1)) {
     case 'a':
@@ -238,7 +239,7 @@ XmlReader::Element XmlReader::takeElementName() noexcept {
   }
 }
 
-/// After an element's name; `empty` when the element ends here, too.
+/// Takes the rest of a start tag. `empty`: whether it is an empty-element tag.
 bool XmlReader::endOfStartTag(bool& empty) {
   if (in_.take(">")) return true;
   const char* const after = in_.at();
@@ -253,7 +254,7 @@ bool XmlReader::endTag(const char (&tag)[Size]) {
   return in_.take(tag) || spacedEndTag({tag, Size - 2});
 }
 
-/// `start` is the tag without its '>'.
+/// Takes an end tag with white space before its '>'. `start` is the tag without the '>'.
 bool XmlReader::spacedEndTag(std::string_view start) {
   if (!in_.rest().starts_with(start)) return in_.reject("missing end tag");
   in_.advance(start.size());
@@ -279,7 +280,7 @@ bool XmlReader::string(bool empty, const char (&tag)[Size]) {
   return endTag(tag);
 }
 
-/// The text of an element that ends with its start tag, or up to its end tag. Valid until the next.
+/// Takes the text of a scalar element. Valid until the next call.
 bool XmlReader::scalarText(bool empty, std::string_view& text) {
   std::optional<std::string_view> literal = std::string_view();
   scratch_.truncate(0);
@@ -294,7 +295,7 @@ bool XmlReader::data(bool empty) {
   if (!empty) {
     const std::string_view rest = in_.rest();
     const std::string_view plain = rest.substr(0, rest.find('<'));
-    // A third more than it takes: what comes after a large value does not move it (a tenth).
+    // More than the value needs, so that values after a large one do not move it.
     side.reserve(plain.size());
     const std::optional<std::size_t> wrong = decodeBase64(plain, side);
     const bool atEndTag = rest.substr(plain.size()).starts_with("</");

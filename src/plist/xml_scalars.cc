@@ -18,14 +18,14 @@ std::string_view trimmed(std::string_view text) noexcept {
   return text;
 }
 
-/// Takes a sign off; whether it was a minus.
+/// Removes a sign; returns whether it was a minus.
 bool takeSign(std::string_view& text) noexcept {
   const bool negative = text.starts_with('-');
   if (negative || text.starts_with('+')) text.remove_prefix(1);
   return negative;
 }
 
-/// Takes the digits off; whether there were any.
+/// Removes leading digits; returns whether there were any.
 bool takeDigits(std::string_view& text) noexcept {
   const auto end = std::find_if_not(text.begin(), text.end(), isDigit);
   const auto count = static_cast<std::size_t>(end - text.begin());
@@ -33,7 +33,7 @@ bool takeDigits(std::string_view& text) noexcept {
   return count != 0;
 }
 
-/// `word` is in lower case letters.
+/// `word` must be in lower case.
 bool isWord(std::string_view text, std::string_view word) noexcept {
   return std::equal(text.begin(), text.end(), word.begin(), word.end(),
                     [](char c, char lower) { return (c | 0x20) == lower; });

@@ -59,8 +59,7 @@ bool XmlScanner::skipProlog() {
 }
 
 bool XmlScanner::declaration() {
-  // As nearly every writer puts it, in one step: with the usual root tag, a third off reading the
-  // smallest message.
+  // The declaration that nearly every writer emits is skipped in one step.
   constexpr std::string_view kUsual = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>";
   if (!source_.isUtf16() && rest().starts_with(kUsual)) {
     advance(kUsual.size());

@@ -9,7 +9,7 @@
 
 namespace ironmoat::plist {
 
-/// Compares a few bytes, whose number the compiler knows, by words that may overlap.
+/// Compares `Count` bytes by at most two words, which may overlap.
 template <std::size_t Count>
 bool sameBytes(const char* a, const char* b) noexcept {
   static_assert(Count >= 1 && Count <= 16);
@@ -19,8 +19,8 @@ bool sameBytes(const char* a, const char* b) noexcept {
          (kLast == 0 || std::memcmp(a + kLast, b + kLast, kWord) == 0);
 }
 
-/// Moves over a source's text. Nothing moves past the end, and nothing is read there; what moves,
-/// moves on for good, so that all of a reader's work is linear.
+/// A cursor over a source's text. Never moves past the end, reads there, or moves back, so that
+/// reading takes linear time.
 class XmlScanner {
  public:
   explicit XmlScanner(XmlSource& source) noexcept
@@ -30,7 +30,7 @@ class XmlScanner {
 
   [[nodiscard]] const char* at() const noexcept { return at_; }
   [[nodiscard]] bool atEnd() const noexcept { return at_ == end_; }
-  /// The character here or a few further on, NUL past the end: no text holds one.
+  /// The character `ahead` of the cursor, or NUL past the end. No text contains NUL.
   [[nodiscard]] char peek(std::ptrdiff_t ahead = 0) const noexcept {
     return end_ - at_ > ahead ? at_[ahead] : '\0';
   }
@@ -48,38 +48,39 @@ class XmlScanner {
     at_ += Size - 1;
     return true;
   }
-  /// A comment or processing instruction begins here.
+  /// Whether a comment or processing instruction begins here.
   [[nodiscard]] bool looksAtMarkup() const noexcept { return looksAt("<?") || looksAt("<!--"); }
-  /// Requires that many characters to be left.
+  /// Requires at least `count` characters before the end.
   void advance(std::size_t count) noexcept { at_ += count; }
 
-  /// Whether there was any.
+  /// Returns whether there was any.
   bool skipSpace() noexcept {
     const char* before = at_;
     while (at_ != end_ && isXmlSpace(*at_)) ++at_;
     return at_ != before;
   }
-  /// Moves on to what may end a run of plain text (see findTextStop), or to the end.
+  /// Moves to the next text stop (see findTextStop) or to the end.
   void skipPlainText() noexcept { at_ = findTextStop(at_, end_); }
 
-  // From here on all may reject, and are false when they have (see XmlSource).
+  // The functions below return false when they reject the message (see XmlSource).
 
-  /// The text up to `mark`, and moves past both.
+  /// Takes the text up to `mark` and moves past the mark.
   [[nodiscard]] bool takeUntil(std::string_view mark, std::string_view& text);
-  /// The value of an attribute or literal in quotes of either kind.
+  /// Takes a value in single or double quotes.
   [[nodiscard]] bool takeQuoted(std::string_view& value);
-  /// The value in ` = "..."`.
+  /// Takes the equals sign and the quoted value of an attribute.
   [[nodiscard]] bool takeAttributeValue(std::string_view& value);
   [[nodiscard]] bool takeName(std::string_view& name);
 
-  /// All that may stand before the root: declaration, DOCTYPE, white space and markup.
+  /// Skips everything allowed before the root: declaration, DOCTYPE, white space and markup.
   [[nodiscard]] bool skipProlog();
-  /// White space, comments and processing instructions.
+  /// Skips white space, comments and processing instructions.
   [[nodiscard]] bool skipMisc();
   /// Requires looksAtMarkup().
   [[nodiscard]] bool skipMarkup();
 
-  /// Rejects the message as `malformed` for the place here, or for its "unexpected end" there.
+  /// Rejects the message as `malformed` at the cursor or at `at`. At the end of the text the reason
+  /// is an unexpected end instead.
   [[nodiscard]] bool reject(const char* reason) { return reject(reason, at_); }
   [[nodiscard]] bool reject(const char* reason, const char* at) {
     return source_.reject(at == end_ ? "unexpected end of message" : reason, at);

@@ -22,7 +22,7 @@ BlockRef shared(Block* block) noexcept {
 bool isHighSurrogate(std::uint32_t unit) noexcept { return (unit & 0xFC00) == 0xD800; }
 bool isLowSurrogate(std::uint32_t unit) noexcept { return (unit & 0xFC00) == 0xDC00; }
 
-/// `word` is in upper case.
+/// `word` must be in upper case.
 bool equalsIgnoringCase(std::string_view text, std::string_view word) noexcept {
   return std::equal(text.begin(), text.end(), word.begin(), word.end(), [](char c, char upper) {
     return (c >= 'a' && c <= 'z' ? static_cast<char>(c - ('a' - 'A')) : c) == upper;
@@ -59,7 +59,7 @@ bool XmlSource::transcodeUtf16(bool bigEndian) {
     return reject(malformed("missing second byte of a UTF-16 character", message_.size() - 1));
   BlockBuilder utf8(sharing());
   for (std::size_t at = 0; at < units;) {
-    // In pieces, so that room for the worst case is never made for the whole message.
+    // In pieces, so that memory for the worst case is never reserved for the whole message.
     const std::size_t pieceEnd = std::min(units, at + 1024);
     const std::size_t before = utf8.size();
     char* const start = utf8.extend(3 * (pieceEnd - at) + 1);  // a pair may reach one unit past
@@ -106,7 +106,7 @@ std::uint64_t XmlSource::offsetInMessage(const char* at) const noexcept {
   std::size_t unit = 0;
   for (std::size_t passed = 0; passed < wanted; ++unit) {
     const std::uint32_t c = utf16Unit(unit);
-    // Each half of a pair stands for two of its four bytes.
+    // Each surrogate accounts for two of the four bytes of its character.
     const bool half = isHighSurrogate(c) || isLowSurrogate(c);
     passed += c < 0x80 ? 1 : c < 0x800 || half ? 2 : 3;
   }

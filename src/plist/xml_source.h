@@ -11,28 +11,27 @@
 
 namespace ironmoat::plist {
 
-/// A message as XML text: known to be UTF-8 and to hold only XML characters. A message in UTF-16 is
-/// transcoded into a block of its own; any other is its own text.
+/// A message as XML text, checked to be valid UTF-8 and to have only XML characters. A message in
+/// UTF-16 is transcoded into a separate block; otherwise the text is a view of the message.
 ///
-/// Nothing is thrown for a bad message. Where the reader rejects it, it says `return reject(...)`,
-/// which keeps the one error here and is false; every function on the way back returns false at
-/// once, so that nothing goes on with what was not proven.
+/// Invalid messages cause no exceptions. A function that rejects the message calls `reject`, which
+/// stores the error here, and returns false; each of its callers must then return false at once.
 class XmlSource {
  public:
   enum class Characters { unknown, known };
 
-  /// Keeps a reference to `message`, and has no text until it is opened.
+  /// `message` must outlive the source. There is no text before `open`.
   explicit XmlSource(const Data& message) noexcept : message_(message) {}
 
-  /// Rejects bytes that are no such text; `known` ones have been such a source before, which is not
-  /// checked again.
+  /// Rejects bytes that are not valid XML text. `known` bytes were accepted before; their
+  /// characters are not checked again.
   [[nodiscard]] bool open(Characters characters = Characters::unknown);
 
-  /// The message is UTF-16; its text here is UTF-8 all the same.
+  /// Whether the message is in UTF-16; `text` is UTF-8 in any case.
   [[nodiscard]] bool isUtf16() const noexcept { return utf16_; }
-  /// Without the byte-order mark.
+  /// The text without a byte-order mark.
   [[nodiscard]] std::string_view text() const noexcept { return text_; }
-  /// Where the text lies; none when the message is empty.
+  /// The block that holds the text; null if the message is empty.
   [[nodiscard]] const BlockRef& block() const noexcept { return block_; }
   [[nodiscard]] std::uint32_t offsetInBlock(const char* at) const noexcept {
     return static_cast<std::uint32_t>(at - block_->bytes());
@@ -41,15 +40,15 @@ class XmlSource {
     return block_ ? block_->sharing() : Sharing::anyThread;
   }
 
-  /// Rejects the message when it is not in the encoding that its declaration names; `at` is where.
+  /// Rejects the message if it is not in the encoding `name`, which its declaration has at `at`.
   [[nodiscard]] bool checkEncoding(std::string_view name, const char* at);
 
-  /// The place `at` of the text, as an offset into the message.
+  /// The offset in the message of `at`, a position in the text.
   [[nodiscard]] std::uint64_t offsetInMessage(const char* at) const noexcept;
-  /// Rejects the message as `malformed` for that place.
+  /// Rejects the message as `malformed` at this position of the text.
   [[nodiscard, gnu::cold, gnu::noinline]] bool reject(const char* reason, const char* at);
   [[nodiscard, gnu::cold, gnu::noinline]] bool reject(DecodingError error);
-  /// Requires that the message was rejected.
+  /// Requires a rejected message.
   [[nodiscard]] DecodingError takeRejection() { return std::move(rejection_).value(); }
 
  private:

@@ -18,7 +18,7 @@ void appendFoldingLineEnds(std::string_view text, BlockBuilder& out) {
   }
 }
 
-/// After "&#".
+/// Takes the number after "&#".
 [[nodiscard]] bool takeCharacterNumber(XmlScanner& in, char32_t& character) {
   const std::uint32_t base = in.take("x") ? 16 : 10;
   std::uint32_t number = 0;
@@ -32,7 +32,7 @@ void appendFoldingLineEnds(std::string_view text, BlockBuilder& out) {
     else if (letter < 6)
       digit = letter + 10;
     if (digit >= base) break;
-    if (number <= 0x10FFFF) number = number * base + digit;  // past it, it stays past it
+    if (number <= 0x10FFFF) number = number * base + digit;  // a larger number stays larger
   }
   character = number;
   return any || in.reject("not a valid character reference");
@@ -70,7 +70,7 @@ bool skipCharacterData(XmlScanner& in) {
 }
 
 bool transformText(XmlScanner& in, const char* start, BlockBuilder& out) {
-  const char* literal = start;  // what is to be appended as it is
+  const char* literal = start;  // not yet appended
   for (;;) {
     out.append({literal, static_cast<std::size_t>(in.at() - literal)});
     if (in.take("\r")) {

@@ -8,17 +8,17 @@
 
 namespace ironmoat::plist {
 
-// All are false when they have rejected the message (see XmlSource).
+// All functions return false when they reject the message (see XmlSource).
 
-/// Moves on to a '<', '&' or CR, or to the end.
+/// Moves to the next '<', '&' or CR, or to the end.
 [[nodiscard]] bool skipCharacterData(XmlScanner& in);
 
-/// Appends the content of a text element as it is to be read, from `start` to its end tag, with
-/// references and CDATA resolved, line ends folded, comments and instructions left out.
+/// Appends the value of a text element, from `start` to its end tag: references and CDATA are
+/// resolved, line ends become LF, comments and processing instructions are left out.
 [[nodiscard]] bool transformText(XmlScanner& in, const char* start, BlockBuilder& out);
 
-/// Moves over the content of a text element, to its end tag. Where the message has that content
-/// literally it is `literal`; otherwise that is none, and it is appended to `out`.
+/// Takes the value of a text element and moves to its end tag. A value that the message has
+/// literally is returned in `literal`; any other is appended to `out`, and `literal` is empty.
 [[nodiscard]] inline bool takeText(XmlScanner& in, std::optional<std::string_view>& literal,
                                    BlockBuilder& out) {
   const char* const start = in.at();

@@ -13,7 +13,7 @@ namespace ironmoat::plist {
 
 namespace {
 
-/// What stands for a character that cannot stand for itself, or nothing.
+/// The reference for a character that must be escaped, or nothing.
 std::string_view escaped(char c) noexcept {
   switch (c) {
     case '&':
@@ -48,7 +48,7 @@ class XmlWriter {
     std::uint32_t next;  // entry or element
   };
 
-  /// Writes one child of the innermost container, or its end.
+  /// Writes the next child of the innermost container, or its end tag.
   void step() {
     Open& open = open_.back();
     const Node& node = document_.node(open.node);

@@ -9,11 +9,11 @@
 
 namespace ironmoat::records {
 
-/// No place: what the lookups answer for text that is no key.
+/// The result of a lookup of text that is not a key.
 inline constexpr std::size_t kNoKey = 0xFF;
-inline constexpr std::size_t kMaxKeys = 0xFF;  // places are bytes, one of which is kNoKey
+inline constexpr std::size_t kMaxKeys = 0xFF;  // positions are bytes other than kNoKey
 
-/// From key text to its place in a table, for short tables: the first key that equals it.
+/// Maps a key's text to its position in a table by comparing all keys. For short tables.
 class KeyScan {
  public:
   static constexpr std::size_t kLongest = 13;
@@ -31,27 +31,27 @@ class KeyScan {
   std::span<const std::string_view> keys_;
 };
 
-/// From key text to its place in a table, for long tables: one multiplication, one look into a
-/// table of bytes and one comparison. Read-only once built.
+/// Maps a key's text to its position in a table by one multiplication, one lookup in a table of
+/// bytes and one comparison. For long tables. Immutable.
 class KeyIndex {
  public:
-  /// Finds a multiplier under which the keys, which must be distinct and outlive the index, take
-  /// different slots.
+  /// Searches a multiplier that gives each key a slot of its own. The keys must be distinct and
+  /// must outlive the index.
   explicit KeyIndex(std::span<const std::string_view> keys);
 
-  /// The place of the key that equals `text`, or kNoKey.
+  /// The position of the key that equals `text`, or kNoKey.
   [[nodiscard]] std::size_t find(std::string_view text) const noexcept {
     const std::uint64_t folded = fold(text);
     const std::size_t place = slots_[slotOf(folded, multiplier_)];
     if (place == kNoKey || folds_[place] != folded || keys_[place].size() != text.size()) {
       return kNoKey;
     }
-    // Up to 7 bytes the fold holds the whole text.
+    // The fold of up to 7 bytes contains the whole text.
     return text.size() < 8 || keys_[place] == text ? place : kNoKey;
   }
 
  private:
-  // 2,048 slots for 150 keys: about one multiplier in 230 keeps them all apart.
+  // 2,048 slots for 150 keys: about one multiplier in 230 gives each key its own.
   static constexpr unsigned kSlotBits = 11;
 
   template <class Word>
@@ -60,8 +60,8 @@ class KeyIndex {
     std::memcpy(&word, at, sizeof word);
     return word;
   }
-  /// First and last bytes and the length in one word: up to 7 bytes all of the text, beyond that
-  /// texts may fold alike. Keys that do never get apart; the constructor says so.
+  /// Combines the first bytes, the last bytes and the length in one word. Longer texts than 7 bytes
+  /// may have the same fold; the constructor throws std::logic_error if two keys do.
   static std::uint64_t fold(std::string_view text) noexcept {
     const char* const first = text.data();
     const std::size_t size = text.size();
@@ -69,7 +69,7 @@ class KeyIndex {
     if (size >= 8) {
       word = load<std::uint64_t>(first) ^ (load<std::uint64_t>(first + size - 8) << 1);
     } else if (size >= 4) {
-      // The halves overlap in one byte; each byte of the text also stands somewhere by itself.
+      // The halves may overlap in one byte, yet each byte of the text has bits of its own.
       word = load<std::uint32_t>(first) | load<std::uint32_t>(first + size - 4) << 24;
     } else if (size > 0) {
       const auto byte = [&](std::size_t i) {

@@ -122,7 +122,7 @@ class CodingKeys {
  public:
   static constexpr std::size_t count = Table<R>::rows.count;
 
-  /// The case at a place of the table; requires index < count.
+  /// The case at a position in the table. Requires index < count.
   static constexpr CodingKeys at(std::size_t index) { return CodingKeys(index); }
   /// The case of a member.
   template <auto Member>

@@ -8,8 +8,8 @@
 namespace ironmoat {
 
 /// Writes the bytes of one Block: append, then `finish`. Grows by doubling, so that the memory held
-/// is bounded by what was appended, never by what was announced. Throws std::bad_alloc, and
-/// std::length_error past 4 GiB - 1.
+/// is bounded by the bytes appended, never by a count that a sender announced. Throws
+/// std::bad_alloc, and std::length_error past 4 GiB - 1.
 class BlockBuilder {
  public:
   explicit BlockBuilder(Sharing sharing = Sharing::anyThread) noexcept : sharing_(sharing) {}
@@ -24,7 +24,7 @@ class BlockBuilder {
     return block_ == nullptr ? nullptr : reinterpret_cast<char*>(block_ + 1);
   }
 
-  /// Makes room for `count` more bytes without another allocation.
+  /// Reserves memory for `count` more bytes.
   void reserve(std::size_t count) {
     if (count > capacity_ - size_) growBy(count);
   }
@@ -37,10 +37,10 @@ class BlockBuilder {
   }
   void append(std::string_view text);
   void push(char byte) { *extend(1) = byte; }
-  /// Forgets what was appended after the first `size` bytes.
+  /// Removes all but the first `size` bytes.
   void truncate(std::size_t size) noexcept { size_ = size < size_ ? size : size_; }
 
-  /// The finished block, or none when nothing was ever appended. The builder is empty afterwards.
+  /// The finished block, or null if nothing was ever appended. The builder is empty afterwards.
   BlockRef finish() noexcept;
 
  private:

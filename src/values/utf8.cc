@@ -35,7 +35,7 @@ std::size_t asciiPrefix(std::string_view text) noexcept {
 std::size_t utf8SequenceLength(std::string_view text) noexcept {
   const auto byte = [&](std::size_t i) { return static_cast<unsigned char>(text[i]); };
   const unsigned lead = byte(0);
-  // The second byte's range excludes what is over long, a surrogate or past U+10FFFF.
+  // The range of the second byte excludes overlong forms, surrogates and code points past U+10FFFF.
   unsigned low = 0x80;
   unsigned high = 0xBF;
   std::size_t length = 0;

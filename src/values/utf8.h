@@ -6,13 +6,13 @@
 
 namespace ironmoat {
 
-/// How many leading bytes are ASCII.
+/// The number of leading ASCII bytes.
 std::size_t asciiPrefix(std::string_view text) noexcept;
 
 bool isAscii(std::string_view text) noexcept;
 
-/// Length in bytes of the longest prefix that is well-formed UTF-8 (no surrogates, nothing over
-/// long, nothing past U+10FFFF).
+/// Length in bytes of the longest prefix that is well-formed UTF-8: no surrogates, no overlong
+/// forms, nothing past U+10FFFF.
 std::size_t validUtf8Prefix(std::string_view text) noexcept;
 
 inline bool isValidUtf8(std::string_view text) noexcept {
@@ -23,11 +23,11 @@ inline bool isValidUtf8(std::string_view text) noexcept {
 /// byte of 0x80 or more; 0 when there is none.
 std::size_t utf8SequenceLength(std::string_view text) noexcept;
 
-/// Writes `codePoint` (a Unicode scalar value) as UTF-8 to `out`, which has room for 4 bytes;
+/// Writes `codePoint` (a Unicode scalar value) as UTF-8 to `out`, which must have 4 bytes;
 /// returns the bytes written.
 std::size_t writeUtf8(char32_t codePoint, char* out) noexcept;
 
-/// Well-formed UTF-8 as UTF-16.
+/// Requires well-formed UTF-8.
 std::u16string utf16FromUtf8(std::string_view text);
 
 }  // namespace ironmoat

@@ -6,7 +6,7 @@
 
 namespace ironmoat::testing {
 
-/// A rejection as "kind path: sentence" ("kind: sentence" without a path).
+/// A rejection as "kind path: description" ("kind: description" without a path).
 inline std::string inWords(const DecodingError& rejection) {
   std::string text(nameOf(rejection.kind()));
   if (!rejection.path().empty()) text.append(" ").append(rejection.path());

@@ -1,4 +1,4 @@
-#include "binary_sketch.h"
+#include "binary_graph.h"
 
 #include <algorithm>
 #include <map>
@@ -28,8 +28,8 @@ std::uint64_t number(std::string_view bytes) {
   return value;
 }
 
-Sketched parseObject(std::string_view area, std::uint64_t at, std::size_t referenceSize) {
-  Sketched object;
+GraphObject parseObject(std::string_view area, std::uint64_t at, std::size_t referenceSize) {
+  GraphObject object;
   const std::string_view first = piece(area, at, 1);
   if (first.empty()) return object;
   object.marker = static_cast<std::uint8_t>(first[0]);
@@ -66,39 +66,39 @@ Sketched parseObject(std::string_view area, std::uint64_t at, std::size_t refere
 
 }  // namespace
 
-BinarySketch BinarySketch::parse(std::string_view bytes) {
-  BinarySketch sketch;
+BinaryGraph BinaryGraph::parse(std::string_view bytes) {
+  BinaryGraph graph;
   if (bytes.size() < kHeader + kTrailer) {  // the smallest message
-    sketch.objects = {
+    graph.objects = {
         {0xD0, {}, {1, 2}, {}, 0, {}}, {0x50, "c", {}, {}, 0, {}}, {0x10, {1}, {}, {}, 0, {}}};
-    return sketch;
+    return graph;
   }
   const std::string_view trailer = bytes.substr(bytes.size() - kTrailer);
   bytes.remove_suffix(kTrailer);
-  sketch.offsetSize = std::clamp<std::size_t>(number(trailer.substr(6, 1)), 1, 8);
-  sketch.referenceSize = std::clamp<std::size_t>(number(trailer.substr(7, 1)), 1, 8);
+  graph.offsetSize = std::clamp<std::size_t>(number(trailer.substr(6, 1)), 1, 8);
+  graph.referenceSize = std::clamp<std::size_t>(number(trailer.substr(7, 1)), 1, 8);
   const std::uint64_t count = number(trailer.substr(8, 8));
-  sketch.root = number(trailer.substr(16, 8));
+  graph.root = number(trailer.substr(16, 8));
   const std::uint64_t table = std::min<std::uint64_t>(number(trailer.substr(24, 8)), bytes.size());
   const std::string_view area = bytes.substr(0, static_cast<std::size_t>(table));
   const std::uint64_t entries =
-      std::min<std::uint64_t>({count, (bytes.size() - table) / sketch.offsetSize, kMaxObjects});
+      std::min<std::uint64_t>({count, (bytes.size() - table) / graph.offsetSize, kMaxObjects});
   std::map<std::uint64_t, std::size_t> known;
   for (std::uint64_t i = 0; i < entries; ++i) {
     const std::uint64_t at = number(
-        bytes.substr(static_cast<std::size_t>(table + i * sketch.offsetSize), sketch.offsetSize));
-    const auto [same, isNew] = known.try_emplace(at, sketch.objects.size());
-    sketch.objects.push_back(parseObject(area, at, sketch.referenceSize));
-    if (!isNew) sketch.objects.back().sameAs = same->second;
+        bytes.substr(static_cast<std::size_t>(table + i * graph.offsetSize), graph.offsetSize));
+    const auto [same, isNew] = known.try_emplace(at, graph.objects.size());
+    graph.objects.push_back(parseObject(area, at, graph.referenceSize));
+    if (!isNew) graph.objects.back().sameAs = same->second;
   }
-  if (sketch.objects.empty()) sketch.objects.emplace_back();
-  return sketch;
+  if (graph.objects.empty()) graph.objects.emplace_back();
+  return graph;
 }
 
-std::string BinarySketch::write() const {
+std::string BinaryGraph::write() const {
   std::string out(plist::binary::kHeader);
   std::vector<std::uint64_t> offsets;
-  for (const Sketched& object : objects) {
+  for (const GraphObject& object : objects) {
     if (object.sameAs && *object.sameAs < offsets.size()) {
       offsets.push_back(offsets[*object.sameAs]);
       continue;
