@@ -47,10 +47,10 @@ TEST(Base64, RejectsForeignBytesAtEveryPosition) {
       std::string text(48, 'Q');
       text[at] = static_cast<char>(byte);
       const bool foreign = alphabet.find(text[at]) == std::string::npos;
-      if (byte == '=' || (foreign && std::string_view(" \t\r\n").find(text[at]) < 4)) continue;
+      EXPECT_EQ(decoded(text), decoded(text, Base64Way::tables)) << at << " " << byte;
+      if (std::string_view("= \t\r\n").find(text[at]) != std::string_view::npos) continue;
       const std::string wrong = "before: wrong at " + std::to_string(at);
       EXPECT_EQ(decoded(text) == wrong, foreign) << at << " " << byte;
-      EXPECT_EQ(decoded(text), decoded(text, Base64Way::tables)) << at << " " << byte;
     }
   }
 }

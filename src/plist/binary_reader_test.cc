@@ -88,6 +88,7 @@ TEST(BinaryReader, RejectsMalformedObjectsWithReasonAndOffset) {
       {"\xAF\x23" + std::string(32, 'x'), badLength},
       {"\x6F\x13" + kTopBit, tooLong},
       {"\xAF\x13" + kMax, tooLong},
+      {"\xA3\x00"s, tooLong},
       {"\xDF\x13" + kTopBit, tooLong},
       {"\xA1\x01"s, "not a valid reference at offset 9"},
       {"\xA3\x00\x00\x01"s, "not a valid reference at offset 11"},
@@ -217,6 +218,20 @@ TEST(BinaryReader, NestingLimitHoldsForSharedSubgraphsAndCycles) {
       EXPECT_EQ(chain(513, 1, parentsFirst, both), tooDeep);
       EXPECT_EQ(chain(20000, 1, parentsFirst, both), tooDeep);
     }
+  }
+  // A chain to a container whose only child was measured on another way.
+  for (const std::size_t length : {310U, 311U}) {
+    const auto row = [](BinaryBuilder& builder, std::size_t containers) {
+      for (std::size_t i = 1; i < containers; ++i) builder.array({builder.objects.size() + 1});
+    };
+    BinaryBuilder builder;
+    builder.referenceSize = 2;
+    builder.array({1, 201, 202});
+    row(builder, 200);
+    builder.array({}).array({1});
+    row(builder, length);
+    builder.array({201});
+    EXPECT_EQ(readOutcome(builder.data()).starts_with("limitExceeded"), length == 311);
   }
   BinaryBuilder loop;
   loop.root = 2;
