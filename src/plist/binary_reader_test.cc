@@ -92,6 +92,7 @@ TEST(BinaryReader, RejectsMalformedObjectsWithReasonAndOffset) {
       {"\xA3\x00"s, tooLong},
       {"\xDF\x13" + kTopBit, tooLong},
       {"\xA1\x01"s, "not a valid reference at offset 9"},
+      {"\xA3\x00\x01\x00"s, "not a valid reference at offset 10"},
       {"\xA3\x00\x00\x01"s, "not a valid reference at offset 11"},
       {"\x61\xD8\x3D"s, badPair},
       {"\x62\xD8\x3D\x00\x41"s, badPair},
