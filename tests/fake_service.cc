@@ -169,6 +169,7 @@ int main(int, char** arguments) {
   if (name == "silent") hang();
   if (name == "leaves") return 5;
   if (name == "fails_to_confine") return 65;
+  if (name == "late") std::this_thread::sleep_for(50ms);
   frames::Hello hello = frames::Hello::ours();
   if (name != "unconfined") hello.confinement = frames::kRequiredConfinement;
   if (name == "other_limits") hello.recordBytes /= 2;

@@ -420,6 +420,16 @@ TEST_F(ClientTest, ReplacesProcessesWithoutARequestNoticing) {
   EXPECT_EQ(slow.stats().retired, 1U) << "answers just in time, again and again";
 }
 
+TEST_F(ClientTest, ReplacesAProcessThatIsSeldomUsed) {
+  Client::Options old = testing::optionsFor(fakeCalled("late"), 1s);
+  old.requestsPerProcess = 1;
+  Client client(old);
+  EXPECT_EQ(outcome(client, "echo 1"), "1");
+  std::this_thread::sleep_for(2100ms);  // longer than a start may take
+  EXPECT_EQ(outcome(client, "echo 2"), "2");
+  EXPECT_EQ(client.stats().retired, 1U);
+}
+
 TEST_F(ClientTest, KeepsAProcessThatCannotBeReplaced) {
   Client::Options old = fake();
   old.program = fakeCalled("passing");

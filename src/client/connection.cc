@@ -166,10 +166,11 @@ void Connection::renew() noexcept {
     renewAfter_ = now + kRenewPause;
     return;
   }
-  if (now - successor_->startedAt > startTime(context_)) {
+  if (!isYielding()) {
+    if (now - successor_->startedAt <= startTime(context_)) return;
     successor_.reset();
     renewAfter_ = now + kRenewPause;
-  } else if (channel_.empty() && isYielding()) {
+  } else if (channel_.empty()) {
     std::unique_ptr<Process> next = std::move(successor_);
     dismiss();
     process_ = std::move(next);
