@@ -27,7 +27,10 @@ bool has(const frames::Hello& hello, frames::Confinement part) noexcept {
   return (hello.confinement & static_cast<std::uint32_t>(part)) != 0;
 }
 
-void requireUsable(const frames::Hello& hello) {
+}  // namespace
+
+frames::Hello usableHello(const Data& body) {
+  const frames::Hello hello = frames::parseHello(body);
   frames::Hello expected = frames::Hello::ours();
   expected.confinement = hello.confinement;
   if (hello != expected) throw frames::FrameError("its limits differ from this library's");
@@ -37,7 +40,10 @@ void requireUsable(const frames::Hello& hello) {
       throw frames::FrameError("its sandbox lacks: " + std::string(name));
     }
   }
+  return hello;
 }
+
+namespace {
 
 /// "the service sent a broken frame over this message: ...", the reason last.
 Failure crashed(const Loss& loss) noexcept {
@@ -110,8 +116,7 @@ void Channel::startFailed(std::string_view why, bool lasting, TimePoint now) noe
 
 void Channel::receive(const Data& body, TimePoint now) {
   if (state_ == State::greeting) {
-    const frames::Hello hello = frames::parseHello(body);
-    requireUsable(hello);
+    const frames::Hello hello = usableHello(body);
     if (!has(hello, frames::Confinement::fullMemory)) counters_.add(&Stats::limitedMemory);
     state_ = State::ready;
     return startClock(now);

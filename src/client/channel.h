@@ -35,6 +35,10 @@ std::string textOrNone(const Make& make) noexcept {
   }
 }
 
+/// The hello in the body of a frame. Throws frames::FrameError if it is none, or that of a service
+/// that this client must not use.
+frames::Hello usableHello(const Data& body);
+
 /// Ids that a service cannot guess before it has read them, so that nothing it sent earlier can
 /// pass for the reply. Never 0, which answers a frame without an id.
 class RequestIds {

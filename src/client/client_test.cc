@@ -450,6 +450,23 @@ TEST_F(ClientTest, KeepsAProcessThatCannotBeReplaced) {
   EXPECT_EQ(answered, 5);
 }
 
+TEST_F(ClientTest, KeepsAProcessWhoseSuccessorIsUnusable) {
+  for (const char* successor : {"/bin/false", "/bin/ls", "/bin/cat"}) {  // dies, lies, hangs
+    Client::Options old = fake();
+    old.program = fakeCalled("passing");
+    old.requestsPerProcess = 2;
+    Client client(old);
+    EXPECT_EQ(outcome(client, "echo 1"), "1");
+    std::filesystem::remove(old.program);
+    std::filesystem::create_symlink(successor, old.program);
+    for (int i = 0; i < 4; ++i) {
+      EXPECT_EQ(outcome(client, "echo 2"), "2") << successor;
+      std::this_thread::sleep_for(20ms);
+    }
+    EXPECT_EQ(client.stats().started, 1U) << successor;
+  }
+}
+
 TEST_F(ClientTest, LoopSleepsWhileARequestIsHeldBack) {
   Client::Options all = fake();
   all.processes = 1;

@@ -152,9 +152,18 @@ bool Connection::isDue(TimePoint now) const noexcept {
                                 channel_.slowInARow() >= kSlowInARow);
 }
 
-bool Connection::isYielding() const noexcept {
-  return successor_ && channel_.state() == Channel::State::ready &&
-         isReadable(successor_->service.socket());
+void Connection::greetSuccessor(TimePoint now) {
+  const std::span<char> room = successor_->assembler.room();
+  const ssize_t count =
+      ::recv(successor_->service.socket(), room.data(), room.size(), MSG_DONTWAIT);
+  if (count > 0) successor_->assembler.commit(static_cast<std::size_t>(count));
+  std::optional<Data> hello = successor_->assembler.next();
+  const bool isLate = !hello && now - successor_->startedAt > startTime(context_);
+  if (count == 0 || isLate || (hello && successor_->assembler.midFrame())) {
+    throw frames::FrameError("ended, sent no hello in time, or sent more than that");
+  }
+  if (hello) static_cast<void>(usableHello(*hello));
+  successor_->hello = std::move(hello);
 }
 
 void Connection::renew() noexcept {
@@ -162,22 +171,18 @@ void Connection::renew() noexcept {
   if (!isDue(now)) return;
   try {
     if (!successor_) successor_ = startProcess();
+    if (!successor_->hello) greetSuccessor(now);
   } catch (const std::exception&) {  // the present process goes on
-    renewAfter_ = now + kRenewPause;
-    return;
-  }
-  if (!isYielding()) {
-    if (now - successor_->startedAt <= startTime(context_)) return;
     successor_.reset();
     renewAfter_ = now + kRenewPause;
-  } else if (channel_.empty()) {
-    std::unique_ptr<Process> next = std::move(successor_);
-    dismiss();
-    process_ = std::move(next);
-    channel_.started(now);
-    context_.counters.add(&Stats::retired);
-    receive();  // its hello
   }
+  if (!isYielding() || !channel_.empty()) return;
+  std::unique_ptr<Process> next = std::move(successor_);
+  dismiss();
+  process_ = std::move(next);
+  channel_.started(now);
+  channel_.receive(*process_->hello, now);  // does not throw: this hello was accepted before
+  context_.counters.add(&Stats::retired);
 }
 
 void Connection::checkEnd() noexcept {

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <memory>
+#include <optional>
 
 #include "client/channel.h"
 #include "client/context.h"
@@ -40,7 +41,9 @@ class Connection {
   /// once it has sent its hello and the channel is empty. To be called between requests.
   void renew() noexcept;
   /// The successor is ready: no request should be added before it took over.
-  [[nodiscard]] bool isYielding() const noexcept;
+  [[nodiscard]] bool isYielding() const noexcept {
+    return successor_ && successor_->hello && channel_.state() == Channel::State::ready;
+  }
 
  private:
   static constexpr auto kGrace = std::chrono::milliseconds(100);
@@ -49,10 +52,13 @@ class Connection {
     process::ServiceProcess service;
     TimePoint startedAt;
     frames::FrameAssembler assembler{frames::kMaxReplyBody, Sharing::anyThread};
+    std::optional<Data> hello{};  // a successor's, which is usable
   };
 
   [[nodiscard]] std::unique_ptr<Process> startProcess() const;
   void start(TimePoint now) noexcept;
+  /// Reads the successor's hello, if it has come. Throws when the successor is of no use.
+  void greetSuccessor(TimePoint now);
   void send() noexcept;
   /// Reads once and hands what came to the channel; returns whether anything came.
   bool receive() noexcept;
