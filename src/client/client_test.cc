@@ -499,6 +499,14 @@ TEST_F(ClientTest, ACompletionMaySubmitWhileItsClientEnds) {
   EXPECT_EQ(outcomes, "unavailable: the client was destroyed");
 }
 
+TEST_F(ClientTest, APendingThatOutlivesItsClientKeepsNoDescriptor) {
+  auto client = std::make_unique<Client>(fake());
+  Pending pending = submit(*client, "ignore");
+  client.reset();
+  expectNoLeak();
+  EXPECT_EQ(outcome(pending), "unavailable: the client was destroyed");
+}
+
 TEST_F(ClientTest, CountsWhatItDoes) {
   Client client(fake(200ms));
   for (const char* message : {"echo 1", "echo 2", "refuse", "exit 1", "hang", "notServed"}) {

@@ -166,6 +166,7 @@ void SharedEngine::stop() noexcept {
   while (driven_) lock.waitUntil(changed_, TimePoint::max());
   engine_->stop(kDestroyed);
   publish();
+  engine_.reset();  // a Pending that outlives the client keeps no descriptor
   RequestList completed = std::move(completed_);
   lock.unlock();
   deliverAll(std::move(completed));

@@ -15,7 +15,10 @@ class LeakCheck : public ::testing::Test {
   static void SetUpTestSuite() {
     std::thread([] {}).join();  // sanitizers start a thread of their own with the first
   }
-  ~LeakCheck() override {
+  ~LeakCheck() override { expectNoLeak(); }
+
+ protected:
+  void expectNoLeak() const {
     EXPECT_EQ(entries("/proc/self/fd"), descriptors_);
     EXPECT_EQ(entries("/proc/self/task"), threads_);
     EXPECT_EQ(::waitpid(-1, nullptr, WNOHANG), -1) << "a child was left";
