@@ -52,9 +52,11 @@ void run(Core& core, Request& request) {
 void submitTo(Core& core, const std::shared_ptr<Request>& request) {
   const Uncancelled whole;
   try {
-    if (!core.failsEarly(*request)) return core.engine.submit(request);
+    const bool isDone = core.failsEarly(*request);
+    const bool waitsForThread = !isDone || (request->hasCompletion() && !core.forkMark.isCopy());
+    if (waitsForThread) return core.engine.submit(request);
   } catch (const ServiceError& error) {
-    request->fail(error);
+    if (!request->isDone()) request->fail(error);
   }
   request->deliver();
 }

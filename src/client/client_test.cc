@@ -507,6 +507,16 @@ TEST_F(ClientTest, APendingThatOutlivesItsClientKeepsNoDescriptor) {
   EXPECT_EQ(outcome(pending), "unavailable: the client was destroyed");
 }
 
+TEST_F(ClientTest, CompletionsAreNeverCalledBySubmit) {
+  Client client(fake());
+  for (const std::string& message : {std::string(limits::messageBytes + 1, 'x'), std::string()}) {
+    std::promise<std::thread::id> thread;
+    client.submit<VeskCommandResponse>(
+        Data(message), [&](const Outcome&) { thread.set_value(std::this_thread::get_id()); }, 50ms);
+    EXPECT_NE(thread.get_future().get(), std::this_thread::get_id());
+  }
+}
+
 TEST_F(ClientTest, CountsWhatItDoes) {
   Client client(fake(200ms));
   for (const char* message : {"echo 1", "echo 2", "refuse", "exit 1", "hang", "notServed"}) {

@@ -54,6 +54,11 @@ void SharedEngine::submit(std::shared_ptr<Request> request) {
   Lock lock(mutex_);
   if (stopping_) throw ServiceError(ServiceError::Kind::unavailable, std::string(kDestroyed));
   if (!thread_.joinable()) startThread();
+  if (one.front()->isDone()) {
+    append(completed_, one);
+    threadWakes_.notify_one();
+    return;
+  }
   // A completion that submits runs on the thread that makes room: it must not wait.
   if (std::this_thread::get_id() != thread_.get_id()) {
     const std::uint64_t ticket = nextTicket_++;

@@ -26,6 +26,7 @@ class SharedEngine {
   SharedEngine& operator=(const SharedEngine&) = delete;
   ~SharedEngine() { stop(); }
 
+  /// Of a request that is done already the completion is called, on the engine's thread.
   /// Waits while too many bytes are in flight, first come first served. Throws ServiceError when
   /// the thread cannot be started or the client is being destroyed, and std::bad_alloc; the request
   /// then has no outcome.
