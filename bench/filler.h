@@ -42,11 +42,12 @@ class Filler {
   virtual std::int64_t integer(std::int64_t usual) { return usual; }
 
  private:
-  template <class T>
-  void value(Optional<T>& field) {
-    T inner{};
+  template <class Optional>
+  requires requires(Optional field) { field.has_value(); }
+  void value(Optional& field) {
+    typename Optional::value_type inner{};
     value(inner);
-    field = Optional<T>(std::move(inner));
+    field = std::move(inner);
   }
   void value(Int& field) { field = integer(static_cast<Int>(1000 * ++number_)); }
   void value(Int64& field) { field = integer(static_cast<Int64>(1732309874123456789 + ++number_)); }

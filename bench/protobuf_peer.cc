@@ -36,8 +36,9 @@ class Copier {
   }
 
  private:
-  template <class T>
-  static void put(const Optional<T>& value, Message& into, const FieldDescriptor* to) {
+  template <class Optional>
+  requires requires(Optional field) { field.has_value(); }
+  static void put(const Optional& value, Message& into, const FieldDescriptor* to) {
     if (value) put(*value, into, to);
   }
   template <class T>

@@ -44,8 +44,9 @@ void describe(std::string& out, const List<T>& list) {
   out.append("[").append(std::to_string(list.size())).append(":");
   for (const T& element : list) describe(out, element);
 }
-template <class T>
-void describe(std::string& out, const Optional<T>& value) {
+template <class Optional>
+requires requires(const Optional& value) { value.has_value(); }
+void describe(std::string& out, const Optional& value) {
   if (!value) {
     out += '-';
   } else {
@@ -105,20 +106,36 @@ class SlowDecoder {
     left -= amount;
   }
 
+  /// One more than the place of the last entry under `key`, or 0.
+  std::uint32_t lastEntry(const plist::Node& node, std::string_view key) {
+    std::uint32_t entry = node.count;
+    while (entry > 0 && document_.text(document_.node(document_.keys(node)[entry - 1])) != key) {
+      --entry;
+    }
+    return entry;
+  }
+  template <class R>
+  void payForValues(const plist::Node& node, Path path) {
+    std::size_t place = 0;
+    std::size_t bytes = 0;
+    testing::FieldsOf<R>::List::forEach([&](auto field) {
+      const std::string_view key = records::Table<R>::rows.keys[place++];
+      if (field.sparse && lastEntry(node, key) != 0) bytes += 16;
+    });
+    pay(left_.recordBytes, bytes, path, "memory of lists exceeds the limit of 67108864 bytes");
+  }
   template <class R>
   void record(plist::NodeIndex index, Path path, std::string& out) {
     const plist::Node& node = expect(plist::Kind::dictionary, index, path);
     pay(left_.scannedEntries, node.count, path,
         "size of shared dictionaries exceeds the limit of 8388608 entries");
+    payForValues<R>(node, path);
     out += '{';
     std::size_t place = 0;
     testing::FieldsOf<R>::List::forEach([&](auto field) {
       const std::string_view key = records::Table<R>::rows.keys[place++];
       const std::string below = path + (path.empty() ? "" : ".") + std::string(key);
-      std::uint32_t entry = node.count;  // the last one wins
-      while (entry > 0 && document_.text(document_.node(document_.keys(node)[entry - 1])) != key) {
-        --entry;
-      }
+      const std::uint32_t entry = lastEntry(node, key);
       using T = typename decltype(field)::Type;
       if (entry != 0) {
         value(document_.values(node)[entry - 1], below, out, static_cast<T*>(nullptr));

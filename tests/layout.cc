@@ -23,6 +23,10 @@ void printRecord() {
   const typename R::Arguments record{};
   R::Arguments::Fields::forEach([&](auto field) {
     using F = decltype(field);
+    if constexpr (F::sparse) {
+      std::cout << "  value " << F::Stored::index << ' ' << F::name << '\n';
+      return;
+    }
     const auto* const start = reinterpret_cast<const std::byte*>(&record);
     const auto* const at = reinterpret_cast<const std::byte*>(&F::in(record));
     std::cout << "  " << at - start << ' ' << F::name << ": " << sizeof(typename F::Type) << '\n';

@@ -70,12 +70,6 @@ class Optional {
   }
   [[nodiscard]] T value_or(T fallback) const { return has_value() ? **this : std::move(fallback); }
 
-  /// Internal: what `other` holds or that it is absent; `other` ends without being destroyed.
-  /// Unlike moving it asks nothing, which no processor could foretell.
-  static Optional takenFrom(const Optional& other) noexcept requires(detail::Niche<T>::exists) {
-    return Optional(detail::Niche<T>::takenFrom(*other));
-  }
-
   void reset() noexcept { *this = Optional(); }
 
   friend bool operator==(const Optional& a, const Optional& b) {

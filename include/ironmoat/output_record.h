@@ -26,7 +26,7 @@ inline constinit thread_local bool initialiserThrew = false;
 /// first one is labelled `with`, every other one with its field's name), once `admit` has let them
 /// pass. A daemon reads the members of `A` and never makes one, but in its tests.
 ///
-/// For each `A` there is a function `void admit(const A&)`, which throws what the host refuses.
+/// For each `A` there is a function `void admit(const A&)`, which throws what the host rejects.
 template <class Self, class A>
 struct OutputRecord : A {
   using Arguments = A;

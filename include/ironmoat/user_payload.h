@@ -1,167 +1,172 @@
 #pragma once
 
+#include <cstddef>
 #include <string_view>
 
 #include "ironmoat/http_headers.h"
 #include "ironmoat/output_record.h"
 #include "ironmoat/payload_parts.h"
+#include "ironmoat/sparse_field.h"
 
 namespace ironmoat {
 
 struct DrelUserPayload;
 
-/// What DrelUserPayload is made with, in label order; `command` is labelled `with`.
-struct DrelUserPayloadArguments {
+/// What DrelUserPayload is made with, in label order; `command` is labelled `with`. A field of type
+/// IRONMOAT_SPARSE(T) is read as an Optional<T> is (sparse_field.h).
+struct DrelUserPayloadArguments : detail::SparseValues {
+  using Sparse = DrelUserPayloadArguments;
+  static constexpr std::size_t kFirstLine = __LINE__ + 1;
   Int command = 0;
-  Optional<Int> commandContext;
-  Optional<Int> version;
-  Optional<Data> payload;
-  Optional<Data> bulkedPayload;
-  Optional<Data> fanoutPayload;
-  Optional<Data> additionalPayload;
-  Optional<Data> payloadMetadata;
-  Optional<String> messageId;
-  Optional<Data> messageUUID;
-  Optional<String> queueId;
-  Optional<Bool> deliveryStatus;
+  IRONMOAT_SPARSE(Int) commandContext;
+  IRONMOAT_SPARSE(Int) version;
+  IRONMOAT_SPARSE(Data) payload;
+  IRONMOAT_SPARSE(Data) bulkedPayload;
+  IRONMOAT_SPARSE(Data) fanoutPayload;
+  IRONMOAT_SPARSE(Data) additionalPayload;
+  IRONMOAT_SPARSE(Data) payloadMetadata;
+  IRONMOAT_SPARSE(String) messageId;
+  IRONMOAT_SPARSE(Data) messageUUID;
+  IRONMOAT_SPARSE(String) queueId;
+  IRONMOAT_SPARSE(Bool) deliveryStatus;
   Optional<DrelUserPayloadDeliveryContext> deliveryContext;
-  Optional<Int> certifiedDeliveryVersion;
-  Optional<Data> certifiedDeliveryRts;
-  Optional<Bool> noResponseNeeded;
-  Optional<Bool> generateDeliveryReceipt;
-  Optional<Data> sessionToken;
-  Optional<Data> dommelSessionToken;
-  Optional<String> destinationId;
-  Optional<String> userAgent;
-  Optional<String> KibbOwnerId;
-  Optional<Data> KibbFileSignature;
-  Optional<Int64> KibbFileLength;
-  Optional<String> KibbAuthToken;
-  Optional<String> KibbAuthUrl;
-  Optional<String> KibbAuthId;
+  IRONMOAT_SPARSE(Int) certifiedDeliveryVersion;
+  IRONMOAT_SPARSE(Data) certifiedDeliveryRts;
+  IRONMOAT_SPARSE(Bool) noResponseNeeded;
+  IRONMOAT_SPARSE(Bool) generateDeliveryReceipt;
+  IRONMOAT_SPARSE(Data) sessionToken;
+  IRONMOAT_SPARSE(Data) dommelSessionToken;
+  IRONMOAT_SPARSE(String) destinationId;
+  IRONMOAT_SPARSE(String) userAgent;
+  IRONMOAT_SPARSE(String) KibbOwnerId;
+  IRONMOAT_SPARSE(Data) KibbFileSignature;
+  IRONMOAT_SPARSE(Int64) KibbFileLength;
+  IRONMOAT_SPARSE(String) KibbAuthToken;
+  IRONMOAT_SPARSE(String) KibbAuthUrl;
+  IRONMOAT_SPARSE(String) KibbAuthId;
   Optional<List<String>> KibbDownloadAuthList;
   Optional<List<String>> KibbDownloadUrlList;
-  Optional<String> KibbDownloadUrl;
-  Optional<String> KibbUploadUrl;
-  Optional<Int64> KibbExpiryNanos;
-  Optional<Int> contentVersion;
-  Optional<String> contentHeaders;
-  Optional<Data> contentBody;
-  Optional<Data> contentReferenceSignature;
-  Optional<Int> attachmentSize;
-  Optional<Data> token;
-  Optional<String> senderId;
-  Optional<String> senderOpaqueId;
-  Optional<String> mspId;
-  Optional<Int> responseStatus;
-  Optional<Int64> epochTimeNanos;
-  Optional<Int64> originalEpochTimeNanos;
-  Optional<Int> failReason;
-  Optional<Data> failMessageId;
-  Optional<String> failMessageIdString;
-  Optional<Int> failDownloadAttachmentSize;
-  Optional<Int> failUploadAttachmentSize;
-  Optional<String> failReasonMessage;
-  Optional<Int64> failTimeElapsed;
-  Optional<String> encryptionType;
-  Optional<Int> storageFlags;
-  Optional<Int> priority;
-  Optional<Int> senderExpectsAck;
+  IRONMOAT_SPARSE(String) KibbDownloadUrl;
+  IRONMOAT_SPARSE(String) KibbUploadUrl;
+  IRONMOAT_SPARSE(Int64) KibbExpiryNanos;
+  IRONMOAT_SPARSE(Int) contentVersion;
+  IRONMOAT_SPARSE(String) contentHeaders;
+  IRONMOAT_SPARSE(Data) contentBody;
+  IRONMOAT_SPARSE(Data) contentReferenceSignature;
+  IRONMOAT_SPARSE(Int) attachmentSize;
+  IRONMOAT_SPARSE(Data) token;
+  IRONMOAT_SPARSE(String) senderId;
+  IRONMOAT_SPARSE(String) senderOpaqueId;
+  IRONMOAT_SPARSE(String) mspId;
+  IRONMOAT_SPARSE(Int) responseStatus;
+  IRONMOAT_SPARSE(Int64) epochTimeNanos;
+  IRONMOAT_SPARSE(Int64) originalEpochTimeNanos;
+  IRONMOAT_SPARSE(Int) failReason;
+  IRONMOAT_SPARSE(Data) failMessageId;
+  IRONMOAT_SPARSE(String) failMessageIdString;
+  IRONMOAT_SPARSE(Int) failDownloadAttachmentSize;
+  IRONMOAT_SPARSE(Int) failUploadAttachmentSize;
+  IRONMOAT_SPARSE(String) failReasonMessage;
+  IRONMOAT_SPARSE(Int64) failTimeElapsed;
+  IRONMOAT_SPARSE(String) encryptionType;
+  IRONMOAT_SPARSE(Int) storageFlags;
+  IRONMOAT_SPARSE(Int) priority;
+  IRONMOAT_SPARSE(Int) senderExpectsAck;
   List<DrelUserPayload> dstIdTokenList;
   List<DrelUserPayload> corvelMessageList;
-  Optional<Int> storageCheckVersion;
-  Optional<Int64> dateExpirationSeconds;
-  Optional<Int> corvelProtocol;
-  Optional<Bool> internalBuild;
-  Optional<Bool> loggingProfile;
-  Optional<Bool> traceProfile;
-  Optional<Bool> groupMessage;
-  Optional<String> contentType;
-  Optional<String> adhocServiceOverride;
-  Optional<Data> responseIdentifier;
-  Optional<String> responseIdentifierString;
-  Optional<String> strictTransportSecurity;
-  Optional<String> traceId;
-  Optional<String> splunkHint;
-  Optional<String> asHttpHeader;
-  Optional<Int> dommelDeliveryStatus;
-  Optional<String> dommelReportId;
-  Optional<Int> retryCount;
-  Optional<String> testOptions;
-  Optional<Int> fanoutChunkNumber;
-  Optional<Bool> fanoutLastChunk;
-  Optional<String> url;
-  Optional<Int> parloRetryCount;
-  Optional<Int> webtunnelVersion;
-  Optional<String> httpUrl;
+  IRONMOAT_SPARSE(Int) storageCheckVersion;
+  IRONMOAT_SPARSE(Int64) dateExpirationSeconds;
+  IRONMOAT_SPARSE(Int) corvelProtocol;
+  IRONMOAT_SPARSE(Bool) internalBuild;
+  IRONMOAT_SPARSE(Bool) loggingProfile;
+  IRONMOAT_SPARSE(Bool) traceProfile;
+  IRONMOAT_SPARSE(Bool) groupMessage;
+  IRONMOAT_SPARSE(String) contentType;
+  IRONMOAT_SPARSE(String) adhocServiceOverride;
+  IRONMOAT_SPARSE(Data) responseIdentifier;
+  IRONMOAT_SPARSE(String) responseIdentifierString;
+  IRONMOAT_SPARSE(String) strictTransportSecurity;
+  IRONMOAT_SPARSE(String) traceId;
+  IRONMOAT_SPARSE(String) splunkHint;
+  IRONMOAT_SPARSE(String) asHttpHeader;
+  IRONMOAT_SPARSE(Int) dommelDeliveryStatus;
+  IRONMOAT_SPARSE(String) dommelReportId;
+  IRONMOAT_SPARSE(Int) retryCount;
+  IRONMOAT_SPARSE(String) testOptions;
+  IRONMOAT_SPARSE(Int) fanoutChunkNumber;
+  IRONMOAT_SPARSE(Bool) fanoutLastChunk;
+  IRONMOAT_SPARSE(String) url;
+  IRONMOAT_SPARSE(Int) parloRetryCount;
+  IRONMOAT_SPARSE(Int) webtunnelVersion;
+  IRONMOAT_SPARSE(String) httpUrl;
   Optional<DrelUserPayloadHttpHeaders> httpHeaders;
-  Optional<Data> httpBody;
-  Optional<String> httpBodyUrl;
-  Optional<Data> httpBodyKey;
-  Optional<Int> httpResponseStatus;
-  Optional<String> httpErrorMsg;
-  Optional<Bool> writeToNimbra;
-  Optional<Bool> pessimisticCheck;
-  Optional<Bool> unfilteredHeaders;
-  Optional<Int> deliveryStatusFlags;
-  Optional<String> conferenceURI;
-  Optional<Data> selfSessionToken;
-  Optional<Data> queryHash;
-  Optional<Int> testDropPoint;
-  Optional<Bool> userPlusOne;
-  Optional<Bool> isInitiatorKey;
-  Optional<Int> errorCode;
-  Optional<Bool> messageCheckpoint;
-  Optional<Int> conversationId;
-  Optional<Int> protocolVersion;
-  Optional<String> applicationId;
-  Optional<Int> reason;
-  Optional<Int> prevErrorCode;
-  Optional<Data> prevAccessToken;
-  Optional<Data> prevRelayIp;
-  Optional<Int> prevTimestamp;
-  Optional<Data> activeAccessToken;
-  Optional<Data> activeRelayIp;
-  Optional<Int> selfAllocTokenCountOld;
-  Optional<Int> selfAllocTokenCount;
+  IRONMOAT_SPARSE(Data) httpBody;
+  IRONMOAT_SPARSE(String) httpBodyUrl;
+  IRONMOAT_SPARSE(Data) httpBodyKey;
+  IRONMOAT_SPARSE(Int) httpResponseStatus;
+  IRONMOAT_SPARSE(String) httpErrorMsg;
+  IRONMOAT_SPARSE(Bool) writeToNimbra;
+  IRONMOAT_SPARSE(Bool) pessimisticCheck;
+  IRONMOAT_SPARSE(Bool) unfilteredHeaders;
+  IRONMOAT_SPARSE(Int) deliveryStatusFlags;
+  IRONMOAT_SPARSE(String) conferenceURI;
+  IRONMOAT_SPARSE(Data) selfSessionToken;
+  IRONMOAT_SPARSE(Data) queryHash;
+  IRONMOAT_SPARSE(Int) testDropPoint;
+  IRONMOAT_SPARSE(Bool) userPlusOne;
+  IRONMOAT_SPARSE(Bool) isInitiatorKey;
+  IRONMOAT_SPARSE(Int) errorCode;
+  IRONMOAT_SPARSE(Bool) messageCheckpoint;
+  IRONMOAT_SPARSE(Int) conversationId;
+  IRONMOAT_SPARSE(Int) protocolVersion;
+  IRONMOAT_SPARSE(String) applicationId;
+  IRONMOAT_SPARSE(Int) reason;
+  IRONMOAT_SPARSE(Int) prevErrorCode;
+  IRONMOAT_SPARSE(Data) prevAccessToken;
+  IRONMOAT_SPARSE(Data) prevRelayIp;
+  IRONMOAT_SPARSE(Int) prevTimestamp;
+  IRONMOAT_SPARSE(Data) activeAccessToken;
+  IRONMOAT_SPARSE(Data) activeRelayIp;
+  IRONMOAT_SPARSE(Int) selfAllocTokenCountOld;
+  IRONMOAT_SPARSE(Int) selfAllocTokenCount;
   List<DrelHoplinePluginRequest> pluginRequests;
-  Optional<String> pluginName;
-  Optional<String> pluginConfig;
-  Optional<Int> pluginStream;
-  Optional<Bool> pluginDevMode;
-  Optional<Bool> hoplineNewSession;
-  Optional<Int> requestType;
-  Optional<Data> veskSessionId;
-  Optional<Int> relayProvider;
-  Optional<Bool> sharedSession;
-  Optional<String> groupId;
-  Optional<Int> groupMemberCount;
-  Optional<Int> allocateInfoAttribute;
-  Optional<Data> relayIp;
-  Optional<Data> relayIpv6;
-  Optional<Int> relayPort;
-  Optional<Data> relayAccessToken;
-  Optional<Data> relaySessionKey;
-  Optional<Data> relaySessionId;
-  Optional<Int64> expiryEpochTimeMillis;
-  Optional<Data> initiatorIp;
-  Optional<Int64> participantId;
-  Optional<Data> softwareVersion;
-  Optional<String> relayBuildVersion;
-  Optional<Int64> allocationEpochTimeMillis;
-  Optional<Int> allocationStatus;
+  IRONMOAT_SPARSE(String) pluginName;
+  IRONMOAT_SPARSE(String) pluginConfig;
+  IRONMOAT_SPARSE(Int) pluginStream;
+  IRONMOAT_SPARSE(Bool) pluginDevMode;
+  IRONMOAT_SPARSE(Bool) hoplineNewSession;
+  IRONMOAT_SPARSE(Int) requestType;
+  IRONMOAT_SPARSE(Data) veskSessionId;
+  IRONMOAT_SPARSE(Int) relayProvider;
+  IRONMOAT_SPARSE(Bool) sharedSession;
+  IRONMOAT_SPARSE(String) groupId;
+  IRONMOAT_SPARSE(Int) groupMemberCount;
+  IRONMOAT_SPARSE(Int) allocateInfoAttribute;
+  IRONMOAT_SPARSE(Data) relayIp;
+  IRONMOAT_SPARSE(Data) relayIpv6;
+  IRONMOAT_SPARSE(Int) relayPort;
+  IRONMOAT_SPARSE(Data) relayAccessToken;
+  IRONMOAT_SPARSE(Data) relaySessionKey;
+  IRONMOAT_SPARSE(Data) relaySessionId;
+  IRONMOAT_SPARSE(Int64) expiryEpochTimeMillis;
+  IRONMOAT_SPARSE(Data) initiatorIp;
+  IRONMOAT_SPARSE(Int64) participantId;
+  IRONMOAT_SPARSE(Data) softwareVersion;
+  IRONMOAT_SPARSE(String) relayBuildVersion;
+  IRONMOAT_SPARSE(Int64) allocationEpochTimeMillis;
+  IRONMOAT_SPARSE(Int) allocationStatus;
   List<DrelHoplineAllocationStatus> allocationStatuses;
   List<DrelHoplineSelfAllocToken> selfAllocTokenList;
-  Optional<Data> relayReportingBlob;
-  Optional<Int> relayServerType;
+  IRONMOAT_SPARSE(Data) relayReportingBlob;
+  IRONMOAT_SPARSE(Int) relayServerType;
   List<DrelHoplinePluginAllocation> pluginAllocations;
-  Optional<Int> hoplineErrorCode;
-  Optional<Int> originalCommand;
-  Optional<Bool> isBulkedPayload;
-  Optional<Bool> wantsAppAck;
-  Optional<String> errorDomain;
-  Optional<Bool> expectsPeerResponse;
-  Optional<Int> allowGDR;
+  IRONMOAT_SPARSE(Int) hoplineErrorCode;
+  IRONMOAT_SPARSE(Int) originalCommand;
+  IRONMOAT_SPARSE(Bool) isBulkedPayload;
+  IRONMOAT_SPARSE(Bool) wantsAppAck;
+  IRONMOAT_SPARSE(String) errorDomain;
+  IRONMOAT_SPARSE(Bool) expectsPeerResponse;
+  IRONMOAT_SPARSE(Int) allowGDR;
 
   using R = DrelUserPayloadArguments;
   using Fields = FieldList<
@@ -208,22 +213,6 @@ IRONMOAT_API void admit(const DrelUserPayloadArguments& arguments);
 struct IRONMOAT_API DrelUserPayload : OutputRecord<DrelUserPayload, DrelUserPayloadArguments> {
   using OutputRecord::OutputRecord;
   static constexpr std::string_view schemaName = "DrelUserPayload";
-
-  DrelUserPayload(const DrelUserPayload&) = default;
-  DrelUserPayload(DrelUserPayload&&) = default;
-  DrelUserPayload& operator=(const DrelUserPayload&) = default;
-  DrelUserPayload& operator=(DrelUserPayload&&) = default;
-  ~DrelUserPayload() {
-    clearFromTheBack(dstIdTokenList);
-    clearFromTheBack(corvelMessageList);
-  }
-
- private:
-  // Payloads made last are those that the caches still hold: 16 MiB of them are unpacked and
-  // destroyed in a sixth less time than from the front.
-  static void clearFromTheBack(List<DrelUserPayload>& list) noexcept {
-    while (!list.empty()) list.pop_back();
-  }
 };
 
 }  // namespace ironmoat

@@ -41,31 +41,17 @@ class Slice {
     range_ = {block, {offset, length}};
   }
   Slice(const Slice& other) noexcept : range_(other.range_) {
-    if (range_.block != nullptr) [[unlikely]] {
-      range_.block->retain();
-    }
+    if (range_.block != nullptr) range_.block->retain();
   }
   constexpr Slice(Slice&& other) noexcept : range_(other.range_) {
-    if (range_.block != nullptr) [[unlikely]] {
-      other.range_ = kAbsent;
-    }
+    if (range_.block != nullptr) other.range_ = kAbsent;
   }
   Slice& operator=(Slice other) noexcept {
     std::swap(range_, other.range_);
     return *this;
   }
   constexpr ~Slice() {
-    // Most fields of a record are absent: hinted, the tests of 69 of them stand in one line.
-    if (range_.block != nullptr) [[unlikely]] {
-      range_.block->release();
-    }
-  }
-
-  /// What `other` holds, its reference included: `other` ends without being destroyed.
-  static constexpr Slice takenFrom(const Slice& other) noexcept {
-    Slice slice;
-    slice.range_ = other.range_;
-    return slice;
+    if (range_.block != nullptr) range_.block->release();
   }
 
   static constexpr Slice absent() noexcept {
@@ -205,14 +191,10 @@ struct SliceNiche {
 template <>
 struct Niche<String> : SliceNiche<String> {
   static bool isAbsent(const String& value) noexcept { return value.slice_.isAbsent(); }
-  static String takenFrom(const String& value) noexcept {
-    return String(Slice::takenFrom(value.slice_));
-  }
 };
 template <>
 struct Niche<Data> : SliceNiche<Data> {
   static bool isAbsent(const Data& value) noexcept { return value.slice_.isAbsent(); }
-  static Data takenFrom(const Data& value) noexcept { return Data(Slice::takenFrom(value.slice_)); }
 };
 
 }  // namespace detail

@@ -48,8 +48,25 @@ class Reader {
 
   template <class A, auto... Members>
   [[gnu::always_inline]] void fields(FieldList<A, Members...>, A& into, const char* bits) {
+    if constexpr (detail::SparseRecord<A>) makeRoom<FieldList<A, Members...>>(into, bits);
     std::size_t i = 0;
     (field(into.*Members, i++, bits), ...);
+  }
+
+  template <class Fields>
+  void makeRoom(detail::SparseValues& into, const char* bits) {
+    std::size_t count = 0;
+    std::size_t i = 0;
+    Fields::forEach([&](auto field) {
+      if constexpr (field.sparse) count += static_cast<std::uint8_t>(bits[i / 8]) >> (i % 8) & 1U;
+      ++i;
+    });
+    chargeRecords(count, sizeof(detail::Cell));
+    into.reserve(count);
+  }
+  void chargeRecords(std::size_t count, std::size_t size) {
+    if (count > recordBytes_ / size) refuse("the lists take too much memory");
+    recordBytes_ -= count * size;
   }
 
   template <class T>
@@ -71,6 +88,12 @@ class Reader {
     } else {
       std::construct_at(&into, read<T>());
     }
+  }
+
+  template <class R, class T, std::size_t Index>
+  [[gnu::always_inline]] void field(SparseField<R, T, Index>& into, std::size_t i,
+                                    const char* bits) {
+    if ((bits[i / 8] >> (i % 8) & 1) != 0) into.append(read<T>());
   }
 
   template <class T>
@@ -107,8 +130,7 @@ class Reader {
     static_assert(leastBytes<T>() > 0, "or a few bytes could announce any number of elements");
     const std::size_t count = load<std::uint32_t>(take(4));
     if (count > left() / leastBytes<T>()) refuse("a list announces more than there is");
-    if (count > recordBytes_ / sizeof(T)) refuse("the lists take too much memory");
-    recordBytes_ -= count * sizeof(T);
+    chargeRecords(count, sizeof(T));
     if (count == 0) return;
     elements.reserve(count);
     if constexpr (Record<T>) {

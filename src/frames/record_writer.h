@@ -62,8 +62,9 @@ class Writer {
     return value<Fixed>(from, at);
   }
 
-  template <std::size_t Fixed, class T>
-  [[gnu::always_inline]] char* field(const Optional<T>& from, std::size_t i, std::uint8_t* bits,
+  template <std::size_t Fixed, class Optional>
+  requires requires(const Optional& from) { from.has_value(); }
+  [[gnu::always_inline]] char* field(const Optional& from, std::size_t i, std::uint8_t* bits,
                                      char* at) {
     // Most fields of a record are absent: hinted, the tests of 150 of them stand in 2 KB.
     if (from) [[unlikely]] {

@@ -54,6 +54,14 @@ void Decoder::rejectOutOfRange() const {
   reject(DecodingError::Kind::outOfRange, "not a valid signed 64-bit integer");
 }
 
+void Decoder::rejectScalar(Kind expected) const {
+  if (node().kind == Kind::wideInteger && expected == Kind::integer) {
+    rejectOutOfRange();
+  } else if (expect(expected)) {
+    (void)chargeDelivered(node().count);
+  }
+}
+
 void Decoder::rejectMissing(const std::string_view& key) const {
   std::string description("missing required key");
   const auto keys = document_.keys(node());

@@ -5,13 +5,13 @@
 #include <concepts>
 #include <cstddef>
 #include <cstdint>
-#include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
 
 #include "ironmoat/errors.h"
 #include "ironmoat/limits.h"
+#include "ironmoat/sparse_values.h"
 #include "ironmoat/values.h"
 #include "plist/document.h"
 
@@ -83,6 +83,13 @@ class Decoder {
     return charge(decoding_.budget.deliveredBytes, bytes,
                   "size of text and data exceeds the limit of ", limits::deliveredBytes, " bytes");
   }
+  /// chargeDelivered, but for the rejection: whoever gets false asks for it.
+  [[nodiscard]] bool takeDelivered(std::size_t bytes) const noexcept {
+    std::size_t& left = decoding_.budget.deliveredBytes;
+    if (bytes > left) return false;
+    left -= bytes;
+    return true;
+  }
   [[nodiscard]] bool chargeScanned(std::size_t entries) const {
     return charge(decoding_.budget.scannedEntries, entries,
                   "size of shared dictionaries exceeds the limit of ", limits::scannedEntries,
@@ -91,6 +98,8 @@ class Decoder {
 
   [[gnu::cold]] void rejectMismatch(Kind expected) const;
   [[gnu::cold]] void rejectOutOfRange() const;
+  /// Rejects a value that is not of this kind, or not within its budget.
+  [[gnu::cold, gnu::noinline]] void rejectScalar(Kind expected) const;
   [[gnu::cold]] void rejectMissing(const std::string_view& key) const;
 
  private:
@@ -134,10 +143,9 @@ template <Scalar T>
     return false;
   }
 }
-/// The value. Requires a preceding admitsScalar(). Always inlined, so that text and data are
-/// returned in registers.
+/// The value. Requires a preceding admitsScalar().
 template <Scalar T>
-[[gnu::always_inline]] inline T scalar(const Decoder& decoder) {
+T scalar(const Decoder& decoder) {
   const Node& node = decoder.node();
   if constexpr (std::same_as<T, Bool>) {
     return node.payload != 0;
@@ -201,11 +209,31 @@ class KeyedDecodingContainer {
     decoder_.rejectMissing(key.stringValue());
     return false;
   }
-  /// Decodes the entry under `key` if there is one. `value` must be absent. Always inlined, so that
-  /// a caller which knows of the entry saves the test.
+  /// Decodes the entry under `key` if there is one. `value` must be absent.
   template <class T>
-  [[nodiscard, gnu::always_inline]] bool decodeIfPresent(Optional<T>& value, Keys key) const {
-    return !contains(key) || decodeEntry(value, key);
+  [[nodiscard]] bool decodeIfPresent(Optional<T>& value, Keys key) const {
+    return !contains(key) || decodeInto(Decoder(decoder_, key.stringValue(), values_[key.index()]),
+                                        *(value = Optional<T>(T{})));
+  }
+  /// The entry under `key`, which must be one of `kind`, as the value of the sparse field of the
+  /// key's index; requires an entry, and of `values` what SparseValues::append does.
+  [[nodiscard]] bool append(ironmoat::detail::SparseValues& values, Keys key, Kind kind) const {
+    const Document& document = decoder_.document();
+    const Node& node = document.node(values_[key.index()]);
+    if (node.kind != kind || !decoder_.takeDelivered(node.count)) [[unlikely]] {
+      Decoder(decoder_, key.stringValue(), values_[key.index()]).rejectScalar(kind);
+      return false;
+    }
+    values.append(key.index(), document.cell(node));
+    return true;
+  }
+  /// How many of `keys` have an entry.
+  [[nodiscard]] std::size_t countOf(const KeySet& keys) const noexcept {
+    std::size_t count = 0;
+    for (std::size_t word = 0; word < keys.size(); ++word) {
+      count += static_cast<std::size_t>(std::popcount(seen_[word] & keys[word]));
+    }
+    return count;
   }
 
   /// Calls `visit(key)` in the order of the cases for each key that has an entry or is in
@@ -225,18 +253,6 @@ class KeyedDecodingContainer {
  private:
   static constexpr std::size_t kAhead = 16;
 
-  template <class T>
-  [[nodiscard]] bool decodeEntry(Optional<T>& value, Keys key) const {
-    const Decoder decoder(decoder_, key.stringValue(), values_[key.index()]);
-    if constexpr (Scalar<T>) {
-      if (!admitsScalar<T>(decoder)) return false;
-      std::construct_at(&value, scalar<T>(decoder));  // absent so far: it owns nothing
-      return true;
-    } else {
-      value = Optional<T>(T{});
-      return decodeInto(decoder, *value);
-    }
-  }
   void findEntries() {
     const Document& document = decoder_.document();
     const Node& dictionary = decoder_.node();

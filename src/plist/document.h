@@ -5,6 +5,7 @@
 #include <span>
 #include <string_view>
 
+#include "ironmoat/sparse_values.h"
 #include "ironmoat/values.h"
 #include "plist/scratch_array.h"
 #include "values/block_builder.h"
@@ -38,7 +39,7 @@ struct Node {
   Kind kind;
   bool transformed;       ///< string, data: the bytes are in the side block, not the source
   std::uint16_t height;   ///< containers on the longest way down, this one included; scalars 0
-  std::uint32_t count;    ///< dictionary: entries; array, set: elements; string, data: bytes
+  std::uint32_t count;    ///< dictionary: entries; array, set: elements; string, data: bytes; or 0
   std::uint64_t payload;  ///< containers: first child; string, data: offset; scalars: the value
 };
 static_assert(sizeof(Node) == 16);
@@ -80,6 +81,15 @@ class Document {
   [[nodiscard]] detail::Slice slice(const Node& node) const noexcept {
     return {(node.transformed ? side_ : source_).get(), static_cast<std::uint32_t>(node.payload),
             node.count};
+  }
+  /// The same, or the value of an integer or boolean node, for a sparse record.
+  [[nodiscard]] detail::Cell cell(const Node& node) const noexcept {
+    const bool text = node.kind == Kind::string || node.kind == Kind::data;
+    if (text && node.count == 0) return detail::Cell::emptyText();
+    Block* const block = (node.transformed ? side_ : source_).get();
+    if (text) block->retain();
+    // The offset of a text fits in the lower half; the count of a number is 0.
+    return {text ? block : nullptr, node.payload | std::uint64_t{node.count} << 32};
   }
 
  private:

@@ -59,8 +59,8 @@ class KeyedEncodingContainer {
     encoder_.builder().string(key.stringValue());
     encodeValue(encoder_, value);
   }
-  template <class T>
-  void encodeIfPresent(const Optional<T>& value, Keys key) {
+  template <class Field>
+  void encodeIfPresent(const Field& value, Keys key) {
     if (value) encode(*value, key);
   }
 

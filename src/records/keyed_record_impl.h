@@ -1,10 +1,9 @@
 #pragma once
 
 #include <array>
+#include <concepts>
 #include <cstddef>
 #include <cstdint>
-#include <type_traits>
-#include <variant>
 
 #include "plist/decoder.h"
 #include "plist/encoder.h"
@@ -30,57 +29,81 @@ template <class Container, class T, class Keys>
   if constexpr (detail::isRequired<T>) {
     return container.decode(field, key);
   } else {
-    // forEach visits a key that is not required only when it has an entry. Said to the compiler,
-    // this saves a second test of it for each field; a sanitized build checks.
-    if (!container.contains(key)) __builtin_unreachable();
     return container.decodeIfPresent(field, key);
   }
+}
+
+/// The kind of value that a sparse field of type T takes.
+template <plist::Scalar T>
+constexpr plist::Kind kindFor() {
+  if constexpr (std::same_as<T, String>) return plist::Kind::string;
+  if constexpr (std::same_as<T, Data>) return plist::Kind::data;
+  if constexpr (std::same_as<T, Bool>) return plist::Kind::boolean;
+  return plist::Kind::integer;
+}
+
+/// Decodes the fields that have an entry or need one. Sparse ones differ in nothing but the kind of
+/// their value, so that no branch depends on which of them a message has.
+template <class R>
+[[nodiscard]] bool decodeSparse(const plist::Decoder& decoder, R& record) {
+  using Keys = typename R::CodingKeys;
+  using Container = plist::KeyedDecodingContainer<Keys>;
+  struct Way {
+    plist::Kind kind;  // of a sparse field
+    bool (*other)(const Container&, R&, Keys) = nullptr;
+  };
+  static constexpr auto ways = detail::overMembers(
+      Table<R>::rows, []<auto... Members>() {
+        return std::array<Way, Keys::count>{[] {
+          if constexpr (Field<Members>::sparse) {
+            return Way{kindFor<typename Field<Members>::Stored::value_type>()};
+          } else {
+            return Way{plist::Kind::null, [](const Container& container, R& into, Keys key) {
+                         return decodeField(container, into.*Members, key);
+                       }};
+          }
+        }()...};
+      });
+  static constexpr auto bitsOf = [](auto chosen) {
+    return detail::overMembers(
+        Table<R>::rows, [&]<auto... Members>() {
+          typename Container::KeySet bits{};
+          std::size_t index = 0;
+          ((bits[index / 64] |= std::uint64_t{chosen(Field<Members>())} << (index % 64), ++index),
+           ...);
+          return bits;
+        });
+  };
+  static constexpr auto sparse = bitsOf([](auto field) { return field.sparse; });
+  static constexpr auto required =
+      bitsOf([](auto field) { return detail::isRequired<typename decltype(field)::Type>; });
+  const auto container = decoder.container<Keys>();
+  if (!container) return false;
+  const std::size_t count = container.countOf(sparse);
+  if (!decoder.chargeRecords(count, sizeof(ironmoat::detail::Cell))) return false;
+  record.reserve(count);
+  return container.forEach(required, [&](Keys key) {
+    const Way& way = ways[key.index()];
+    return way.other == nullptr ? container.append(record, key, way.kind)
+                                : way.other(container, record, key);
+  });
 }
 
 template <class R>
 [[nodiscard]] bool decodeFields(const plist::Decoder& decoder, R& record) {
   static_assert(wellFormed<R>());
   using Keys = typename R::CodingKeys;
-  using Container = plist::KeyedDecodingContainer<Keys>;
-  // A scalar by its type, of which there are few: calls to a function for each of 150 fields no
-  // processor foretells, nor do so many functions stay in its caches.
-  using DecodeOne = bool (*)(const Container&, R&, Keys);
-  using Way = std::variant<Optional<String> R::*, Optional<Data> R::*, Optional<Int> R::*,
-                           Optional<Int64> R::*, Optional<Bool> R::*, Int R::*, DecodeOne>;
-  static constexpr auto ways = detail::overMembers(
-      Table<R>::rows, []<auto... Members>() {
-        return std::array<Way, Keys::count>{[] {
-          if constexpr (std::is_constructible_v<Way, decltype(Members)>) {
-            return Way(Members);
-          } else {
-            return Way(DecodeOne([](const Container& container, R& into, Keys key) {
-              return decodeField(container, into.*Members, key);
-            }));
-          }
-        }()...};
-      });
-  static constexpr auto required = detail::overMembers(
-      Table<R>::rows, []<auto... Members>() {
-        typename Container::KeySet bits{};
-        std::size_t index = 0;
-        ((detail::isRequired<typename Field<Members>::Type>
-              ? void(bits[index / 64] |= std::uint64_t{1} << (index % 64))
-              : void(),
-          ++index),
-         ...);
-        return bits;
-      });
-  const auto container = decoder.container<Keys>();
-  return container && container.forEach(required, [&](Keys key) {
-    const auto by = [&](auto way) {
-      if constexpr (std::is_member_pointer_v<decltype(way)>) {
-        return decodeField(container, record.*way, key);
-      } else {
-        return way(container, record, key);
-      }
-    };
-    return std::visit(by, ways[key.index()]);
-  });
+  if constexpr (ironmoat::detail::SparseRecord<R>) {
+    return decodeSparse(decoder, record);
+  } else {
+    const auto container = decoder.container<Keys>();
+    return container &&
+           detail::overMembers(
+               Table<R>::rows, [&]<auto... Members>() {
+                 return (decodeField(container, record.*Members, Keys::template of<Members>()) &&
+                         ...);
+               });
+  }
 }
 
 /// Writes `record` as a dictionary: required fields always, optional ones when present.

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstddef>
+#include <memory>
 #include <string_view>
 #include <type_traits>
 #include <utility>
@@ -56,27 +57,10 @@ using FieldNamed = decltype(pick<fieldIndex<R>(Name::name)>(
     static_cast<const Placing<std::make_index_sequence<FieldsOf<R>::Type::count>,
                               typename FieldsOf<R>::Type>*>(nullptr)));
 
-/// Whether a value that was moved from needs no destructor: a number never does; text and data are
-/// left without a block, a list without memory; an optional value is left absent or as those.
-template <class T>
-inline constexpr bool ownsNothingOnceMovedFrom = std::is_trivially_destructible_v<T>;
-template <>
-inline constexpr bool ownsNothingOnceMovedFrom<String> = true;
-template <>
-inline constexpr bool ownsNothingOnceMovedFrom<Data> = true;
-template <class T>
-inline constexpr bool ownsNothingOnceMovedFrom<List<T>> = true;
-template <class T>
-inline constexpr bool ownsNothingOnceMovedFrom<Optional<T>> = ownsNothingOnceMovedFrom<T>;
-
-/// What happens to the wire record afterwards: it is destroyed, or left as it is.
-enum class Wires { destroyed, abandoned };
-
 /// What argument `Argument` is made of: the converted part of its name, else the wire field of its
-/// name, which must be of exactly its type. The argument is made of it in place (by way of a
-/// temporary each of 150 would cost two copies).
-template <class Argument, Wires wires, class Wire, class Converted>
-decltype(auto) argumentOf(Wire& wire, Converted& converted) noexcept {
+/// name, which must be of exactly its type.
+template <class Argument, class Wire, class Converted>
+auto&& argumentOf(Wire& wire, Converted& converted) noexcept {
   using Part = FieldNamed<Converted, Argument>;
   using Same = FieldNamed<Wire, Argument>;
   static_assert(!std::is_void_v<Same>, "no wire field has this argument's name");
@@ -86,26 +70,28 @@ decltype(auto) argumentOf(Wire& wire, Converted& converted) noexcept {
   } else {
     static_assert(std::is_same_v<typename Same::Type, typename Argument::Type>,
                   "the wire field of this argument's name is of another type");
-    static_assert(ownsNothingOnceMovedFrom<typename Same::Type>,
-                  "nobody destroys the wire field of this argument's name");
-    if constexpr (wires == Wires::abandoned &&
-                  requires { Same::Type::takenFrom(Same::in(wire)); }) {
-      return Same::Type::takenFrom(Same::in(wire));
-    } else {
-      return std::move(Same::in(wire));
-    }
+    return std::move(Same::in(wire));
   }
 }
 
-template <class Output, Wires wires, class Wire, class Converted>
-typename Output::Arguments argumentsFrom(Wire& wire, Converted& converted) noexcept {
-  using Arguments = typename Output::Arguments;
-  return [&]<auto... Members>(FieldList<Arguments, Members...>) {
-    static_assert(sizeof...(Members) == FieldsOf<Wire>::Type::count,
-                  "a wire field has no argument");
-    return Arguments{argumentOf<Field<Members>, wires>(wire, converted)...};
-  }
-  (typename Arguments::Fields());
+/// Moves all values of sparse fields at once, and each other field by itself, over one that owns
+/// nothing yet.
+template <class Arguments, auto... Members, class Wire, class Converted>
+Arguments sparseArguments(FieldList<Arguments, Members...>, Wire& wire,
+                          Converted& converted) noexcept {
+  Arguments arguments;
+  static_cast<SparseValues&>(arguments) = std::move(static_cast<SparseValues&>(wire));
+  const auto take = [&]<class Argument>(Argument) {
+    auto&& from = argumentOf<Argument>(wire, converted);
+    if constexpr (Argument::sparse) {
+      static_assert(Argument::Stored::index == std::remove_cvref_t<decltype(from)>::index,
+                    "the wire field of this argument's name has another place");
+    } else {
+      std::construct_at(&Argument::in(arguments), std::forward<decltype(from)>(from));
+    }
+  };
+  (take(Field<Members>()), ...);
+  return arguments;
 }
 
 }  // namespace detail
@@ -115,7 +101,17 @@ typename Output::Arguments argumentsFrom(Wire& wire, Converted& converted) noexc
 template <class Output, class Wire, class Converted = NothingConverted>
 typename Output::Arguments argumentsFrom(Wire&& wire, Converted&& converted = {}) noexcept {
   static_assert(std::is_rvalue_reference_v<Wire&&>);
-  return detail::argumentsFrom<Output, detail::Wires::destroyed>(wire, converted);
+  using Arguments = typename Output::Arguments;
+  return [&]<auto... Members>(FieldList<Arguments, Members...>) {
+    static_assert(sizeof...(Members) == detail::FieldsOf<Wire>::Type::count,
+                  "a wire field has no argument");
+    if constexpr (detail::SparseRecord<Arguments>) {
+      return detail::sparseArguments(FieldList<Arguments, Members...>(), wire, converted);
+    } else {
+      return Arguments{detail::argumentOf<Field<Members>>(wire, converted)...};
+    }
+  }
+  (typename Arguments::Fields());
 }
 
 }  // namespace ironmoat

@@ -1,7 +1,6 @@
 #include "unpackers/corvel_payload_unpacker.h"
 
 #include "records/message_payload.h"
-#include "unpackers/consumption.h"
 #include "unpackers/conversion.h"
 #include "unpackers/decode_message.h"
 #include "unpackers/header_block.h"
@@ -33,16 +32,17 @@ NothingConverted convertParts(Wire&) {
   return {};
 }
 
-/// An absent list and an empty one both give an empty one.
+/// An absent list and an empty one both give an empty one. The wire list's memory goes back before
+/// the lists around it are converted.
 template <class Output, class Wire>
 List<Output> convertList(Optional<List<Wire>>& wire) {
   List<Output> output;
   if (!wire) return output;
-  Consumable<List<Wire>> elements(std::move(*wire));
+  List<Wire> elements = std::move(*wire);
   output.reserve(elements.size());
-  while (!elements.done()) {
+  for (Wire& element : elements) {
     output.emplace_back(
-        [&] { return elements.template consume<Output>(convertParts(elements.current())); });
+        [&] { return argumentsFrom<Output>(std::move(element), convertParts(element)); });
   }
   return output;
 }
@@ -73,10 +73,10 @@ Converted convertParts(VeskCorvelProtocolPayload& wire) {
 }  // namespace
 
 DrelUserPayload VeskCorvelPayloadUnpacker::unpack(const Data& message) const {
-  Consumable<VeskCorvelProtocolPayload> wire;
-  decodeMessage(message, wire.current());
+  VeskCorvelProtocolPayload wire;
+  decodeMessage(message, wire);
   return DrelUserPayload(
-      [&] { return wire.consume<DrelUserPayload>(convertParts(wire.current())); });
+      [&] { return argumentsFrom<DrelUserPayload>(std::move(wire), convertParts(wire)); });
 }
 
 }  // namespace ironmoat

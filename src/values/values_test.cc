@@ -2,11 +2,15 @@
 
 #include <gtest/gtest.h>
 
+#include <array>
+#include <random>
 #include <stdexcept>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
+#include "ironmoat/sparse_field.h"
 #include "values/utf8.h"
 
 namespace ironmoat {
@@ -89,6 +93,103 @@ TEST(Utf8, WrittenCharactersAreValidAndComeBackAsUtf16) {
         units.size() == 1 ? units[0] : 0x10000 + ((units[0] & 0x3FFU) << 10) + (units[1] & 0x3FFU);
     ASSERT_EQ(back, c);
   }
+}
+
+/// Fields in each word of presence bits, at its edges.
+struct SparseSample : detail::SparseValues {
+  template <class T, std::size_t Index>
+  using Field = SparseField<SparseSample, T, Index>;
+  [[no_unique_address]] Field<String, 0> first;
+  [[no_unique_address]] Field<Int, 1> number;
+  [[no_unique_address]] Field<String, 63> text;
+  [[no_unique_address]] Field<Data, 64> data;
+  [[no_unique_address]] Field<Int64, 100> wide;
+  [[no_unique_address]] Field<Bool, 128> truth;
+  [[no_unique_address]] Field<String, 191> last;
+};
+
+/// The same fields, each with memory of its own.
+struct DenseSample {
+  Optional<String> first;
+  Optional<Int> number;
+  Optional<String> text;
+  Optional<Data> data;
+  Optional<Int64> wide;
+  Optional<Bool> truth;
+  Optional<String> last;
+  friend bool operator==(const DenseSample&, const DenseSample&) = default;
+};
+
+template <class Visit>
+void forBoth(SparseSample& sparse, DenseSample& dense, std::size_t which, Visit visit) {
+  std::size_t place = 0;
+  const auto one = [&](auto& a, auto& b) {
+    if (place++ == which) visit(a, b);
+  };
+  one(sparse.first, dense.first), one(sparse.number, dense.number), one(sparse.text, dense.text);
+  one(sparse.data, dense.data), one(sparse.wide, dense.wide), one(sparse.truth, dense.truth);
+  one(sparse.last, dense.last);
+}
+
+DenseSample denseCopy(const SparseSample& record) {
+  return {record.first, record.number, record.text, record.data,
+          record.wide,  record.truth,  record.last};
+}
+
+TEST(SparseFieldTest, HoldsWhatAnOptionalWouldInAnyOrderOfChanges) {
+  std::mt19937 random(1);  // NOLINT(cert-msc51-cpp): the same each time
+  for (int round = 0; round < 200; ++round) {
+    SparseSample sparse;
+    DenseSample dense;
+    for (int change = 0; change < 30; ++change) {
+      forBoth(sparse, dense, random() % 7, [&]<class Field>(Field& field, auto& model) {
+        using T = typename Field::value_type;
+        const auto number = random() % 3;
+        if (number == 0) {
+          field.reset();
+          model.reset();
+        } else if constexpr (std::is_arithmetic_v<T>) {
+          field = static_cast<T>(number);
+          model = static_cast<T>(number);
+        } else {
+          const T value(std::string(number - 1, 'x'));  // empty ones, too
+          field = value;
+          model = value;
+        }
+      });
+      ASSERT_EQ(denseCopy(sparse), dense);
+    }
+    const SparseSample copy = sparse;
+    SparseSample assigned;
+    assigned.last = String("replaced");
+    assigned = copy;
+    const SparseSample moved = std::move(sparse);
+    EXPECT_EQ(denseCopy(copy), dense);
+    EXPECT_EQ(denseCopy(assigned), dense);
+    EXPECT_EQ(denseCopy(moved), dense);
+    EXPECT_EQ(denseCopy(sparse), DenseSample());  // NOLINT(bugprone-use-after-move)
+    assigned = std::move(assigned = SparseSample());
+    EXPECT_EQ(denseCopy(assigned), DenseSample());
+  }
+}
+
+TEST(SparseFieldTest, ReadsAsAnOptional) {
+  SparseSample record;
+  EXPECT_FALSE(record.text);
+  EXPECT_THROW(static_cast<void>(record.text.value()), std::bad_optional_access);
+  EXPECT_EQ(record.number.value_or(7), 7);
+  record.text = String("a text");
+  record.first = record.text;
+  record.number = 5;
+  EXPECT_TRUE(record.text && record.text.has_value() && record.first == String("a text"));
+  EXPECT_EQ(record.text->view().data(), record.first.value().view().data());  // one block
+  ++*record.number;
+  EXPECT_EQ(record.number.value_or(7), 6);
+  SparseSample other;
+  other.text = record.text;
+  record = SparseSample();
+  EXPECT_EQ(other.text, String("a text"));
+  EXPECT_FALSE(other.first == other.text);
 }
 
 }  // namespace

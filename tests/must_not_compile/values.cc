@@ -1,4 +1,4 @@
-// Ways to make a Data and a String that work, and with each CASE_ one that loses bytes.
+// Ways to make and keep values that work, and with each CASE_ one that loses bytes.
 
 #include "ironmoat/values.h"
 
@@ -8,6 +8,8 @@
 #include <span>
 #include <string>
 #include <vector>
+
+#include "ironmoat/user_payload.h"
 
 namespace ironmoat {
 
@@ -44,6 +46,15 @@ inline void make(const std::string& text, const std::vector<char>& chars,
 #elif defined(CASE_text_of_nothing)
   String{nullptr};
 #endif
+}
+
+inline Optional<String> keep(const DrelUserPayload& payload) {
+#ifdef CASE_field_kept_without_its_record
+  auto kept = payload.traceId;
+#else
+  Optional<String> kept = payload.traceId;
+#endif
+  return kept;
 }
 
 }  // namespace ironmoat

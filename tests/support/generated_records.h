@@ -66,9 +66,10 @@ class BasicRecordGenerator {
   void fill(List<T>& list, int depth) {
     for (auto left = depth > 0 ? below(4) : 0; left > 0; --left) list.push_back(some<T>(depth - 1));
   }
-  template <class T>
-  void fill(Optional<T>& value, int depth) {
-    if (present()) value = some<T>(depth);
+  template <class Optional>
+  requires requires(Optional value) { value.has_value(); }
+  void fill(Optional& value, int depth) {
+    if (present()) value = some<typename Optional::value_type>(depth);
   }
   template <class T>
   T some(int depth) {
