@@ -15,6 +15,7 @@
 
 #include "frames/frame.h"
 #include "frames/frame_assembler.h"
+#include "support/request_frame.h"
 #include "support/tight_message.h"
 
 namespace {

@@ -26,6 +26,7 @@
 #include "records/message_payload.h"
 #include "records/web_tunnel.h"
 #include "support/rejection.h"
+#include "support/request_frame.h"
 #include "support/wire_fields.h"
 #include "support/written.h"
 #include "support/xml_message.h"

@@ -42,7 +42,7 @@ void runTestServer() { run(TEST_SERVER); }
 class FullyConfinedService : public ::testing::Test {
  protected:
   void SetUp() override {
-    if (frames::kSanitizedBuild) {
+    if (confinement::kSanitizedBuild) {
       GTEST_SKIP() << "built with a sanitizer, which needs what the confinement takes";
     }
   }
@@ -85,7 +85,7 @@ TEST_F(FullyConfinedService, WorksAsAnOrdinaryUser) {
     if (setgroups(0, nullptr) == 0 && setgid(kNobody) == 0 && setuid(kNobody) == 0) runService();
   });
   const std::uint32_t bits = service.reportedConfinement();
-  EXPECT_EQ(bits & frames::kRequiredConfinement, frames::kRequiredConfinement);
+  EXPECT_EQ(bits & confinement::kRequiredParts, confinement::kRequiredParts);
   // What can be traced belongs to its user.
   struct stat info = {};
   ASSERT_EQ(stat(("/proc/" + std::to_string(service.pid()) + "/mem").c_str(), &info), 0);
@@ -136,7 +136,7 @@ TEST(ConfinedService, EndsWithTheThreadThatStartedIt) {
 
 TEST_F(FullyConfinedService, RejectsWhatItHasNoMemoryForAndGoesOn) {
   SpokenTo server(runTestServer);
-  EXPECT_NE(server.reportedConfinement() & static_cast<unsigned>(frames::Confinement::fullMemory),
+  EXPECT_NE(server.reportedConfinement() & static_cast<unsigned>(confinement::Part::fullMemory),
             0U);
   for (std::uint64_t id = 0; id < 12; ++id) {
     server.request(id, id % 3 == 0 ? "hold 1024" : "hold 600");
@@ -161,8 +161,8 @@ TEST_F(FullyConfinedService, TellsOfAnInheritedLimitOnItsMemory) {
     runTestServer();
   });
   const std::uint32_t bits = server.reportedConfinement();
-  EXPECT_EQ(bits & frames::kRequiredConfinement, frames::kRequiredConfinement);
-  EXPECT_EQ(bits & static_cast<unsigned>(frames::Confinement::fullMemory), 0U);
+  EXPECT_EQ(bits & confinement::kRequiredParts, confinement::kRequiredParts);
+  EXPECT_EQ(bits & static_cast<unsigned>(confinement::Part::fullMemory), 0U);
 }
 
 /// How often `text` is found in the memory of a process, which only root may read.
@@ -238,7 +238,7 @@ TEST(ConfinedService, BadRequestsGetAnErrorAndTheNextIsServed) {
   const auto all = replies(request(5, "NoSuchType") + lyingName + tiny + request(9));
   ASSERT_EQ(all.size(), 4U);
   for (const std::uint64_t id : {5, 8, 0}) EXPECT_EQ(all.at(id).status, Status::notServed) << id;
-  EXPECT_EQ(frames::parseSentence(all.at(5).body), "no unpacker for this type");
+  EXPECT_EQ(frames::parseSentence(all.at(5).body), "not a served output type");
   EXPECT_EQ(all.at(9).status, Status::record);
 }
 

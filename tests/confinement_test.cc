@@ -61,7 +61,7 @@ std::string confinedCall(long number, const Arguments& a) {
 class ConfinementTest : public ::testing::Test {
  protected:
   void SetUp() override {
-    if (frames::kSanitizedBuild) {
+    if (confinement::kSanitizedBuild) {
       GTEST_SKIP() << "built with a sanitizer, which needs what the confinement takes";
     }
     std::fflush(nullptr);

@@ -17,7 +17,7 @@
 #include <thread>
 #include <utility>
 
-#include "frames/confinement_bits.h"
+#include "confinement_parts/confinement_parts.h"
 #include "frames/frame.h"
 #include "frames/frame_assembler.h"
 #include "frames/record_codec.h"
@@ -171,7 +171,7 @@ int main(int, char** arguments) {
   if (name == "fails_to_confine") return 65;
   if (name == "late") std::this_thread::sleep_for(50ms);
   frames::Hello hello = frames::Hello::ours();
-  if (name != "unconfined") hello.confinement = frames::kRequiredConfinement;
+  if (name != "unconfined") hello.confinement = confinement::kRequiredParts;
   if (name == "other_limits") hello.recordBytes /= 2;
   BlockBuilder greeting;
   frames::appendHello(greeting, hello);

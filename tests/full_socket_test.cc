@@ -10,6 +10,7 @@
 #include "frames/record_codec.h"
 #include "process/service_process.h"
 #include "support/fault_load.h"
+#include "support/request_frame.h"
 
 namespace ironmoat::testing {
 namespace {
@@ -35,7 +36,7 @@ std::size_t peakMemory(pid_t pid) {
   }
   return 0;
 }
-constexpr std::size_t kMostMemory = frames::kSanitizedBuild ? 4096 : 256;  // MiB
+constexpr std::size_t kMostMemory = confinement::kSanitizedBuild ? 4096 : 256;  // MiB
 
 /// Writes first, until nothing more is taken; then reads a little at a time. The server neither
 /// grows nor gives up.
@@ -79,7 +80,7 @@ TEST_F(FaultsTest, APeerThatHardlyReads) {
     assembler.commit(static_cast<std::size_t>(got));
     while (const auto body = assembler.next()) {
       if (++count == 0) {
-        greeted = frames::parseHello(*body).version == frames::kVersion;
+        greeted = frames::parseHello(*body).replyBytes == limits::replyBytes;
         continue;
       }
       const frames::Reply reply = frames::parseReply(*body);

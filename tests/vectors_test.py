@@ -180,7 +180,7 @@ class PythonClient(unittest.TestCase):
         self.assertEqual([isinstance(answer, dict) and answer["command"] for answer in answers],
                          [1, False, 3, False, 5])
         answer, = client.unpack([("Unknown", b"")])
-        self.assertEqual(str(answer), "no unpacker for this type")
+        self.assertEqual(str(answer), "not a served output type")
         client.close()
 
     def test_replies_that_lie(self):

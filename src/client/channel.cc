@@ -6,7 +6,7 @@
 #include <iterator>
 #include <utility>
 
-#include "frames/confinement_bits.h"
+#include "confinement_parts/confinement_parts.h"
 #include "frames/frame.h"
 
 namespace ironmoat::client {
@@ -23,7 +23,7 @@ constexpr unsigned kMaxDoublings = 4;
 constexpr std::size_t kBatch = std::size_t{64} << 10;
 constexpr std::size_t kMaxCopied = std::size_t{16} << 10;
 
-bool has(const frames::Hello& hello, frames::Confinement part) noexcept {
+bool has(const frames::Hello& hello, confinement::Part part) noexcept {
   return (hello.confinement & static_cast<std::uint32_t>(part)) != 0;
 }
 
@@ -34,9 +34,8 @@ frames::Hello usableHello(const Data& body) {
   frames::Hello expected = frames::Hello::ours();
   expected.confinement = hello.confinement;
   if (hello != expected) throw frames::FrameError("its limits differ from this library's");
-  for (const auto& [part, name, required] : frames::kConfinementNames) {
-    const bool isRequired = (frames::kRequiredConfinement & static_cast<std::uint32_t>(part)) != 0;
-    if (isRequired && !has(hello, part)) {
+  for (const auto& [part, name, need] : confinement::kParts) {
+    if (isRequired(part) && !has(hello, part)) {
       throw frames::FrameError("its sandbox lacks: " + std::string(name));
     }
   }
@@ -117,7 +116,7 @@ void Channel::startFailed(std::string_view why, bool lasting, TimePoint now) noe
 void Channel::receive(const Data& body, TimePoint now) {
   if (state_ == State::greeting) {
     const frames::Hello hello = usableHello(body);
-    if (!has(hello, frames::Confinement::fullMemory)) counters_.add(&Stats::limitedMemory);
+    if (!has(hello, confinement::Part::fullMemory)) counters_.add(&Stats::limitedMemory);
     state_ = State::ready;
     return startClock(now);
   }

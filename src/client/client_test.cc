@@ -171,7 +171,7 @@ TEST_F(ClientTest, FailsTheCulpritAndNotItsNeighbours) {
       {"badStatus", "sent a broken frame over this message: "},
       {"badText", "sent a broken frame over this message: "},
       {"greetAgain", "sent a broken frame over this message: "},
-      {"flood", "sent a broken frame over this message: the reply has an unknown status"},
+      {"flood", "sent a broken frame over this message: not a valid status: 170"},
   };
   for (const auto& row : rows) {
     Client client(fake());

@@ -10,7 +10,6 @@
 
 #include <algorithm>
 #include <array>
-#include <bit>
 #include <cerrno>
 #include <csignal>
 #include <exception>
@@ -20,8 +19,6 @@
 #include "ironmoat/limits.h"
 
 namespace ironmoat::confinement {
-
-using frames::Confinement;
 
 namespace {
 
@@ -37,13 +34,6 @@ constexpr int kSetDenyWriteExecute = 65;
 constexpr int kGetDenyWriteExecute = 66;
 constexpr unsigned long kRefuseExecGain = 1;  // NOLINT(google-runtime-int): as prctl takes it
 
-std::string nameOf(Confinement part) {
-  const auto* const known =
-      std::find_if(frames::kConfinementNames.begin(), frames::kConfinementNames.end(),
-                   [part](const auto& named) { return named.part == part; });
-  return std::string(known->name);
-}
-
 /// Lowers a limit for good, never above what was given.
 bool limit(__rlimit_resource resource, rlim_t most) noexcept {
   rlimit value = {};
@@ -54,15 +44,15 @@ bool limit(__rlimit_resource resource, rlim_t most) noexcept {
 }
 
 struct Limit {
-  Confinement part;
+  Part part;
   __rlimit_resource resource;
   rlim_t most;
 };
 constexpr std::array kZeroLimits = {
-    Limit{Confinement::noCoreFile, RLIMIT_CORE, 0},
-    Limit{Confinement::noFileGrowth, RLIMIT_FSIZE, 0},
-    Limit{Confinement::noOpenFiles, RLIMIT_NOFILE, 0},
-    Limit{Confinement::noProcesses, RLIMIT_NPROC, 0},
+    Limit{Part::noCoreFile, RLIMIT_CORE, 0},
+    Limit{Part::noFileGrowth, RLIMIT_FSIZE, 0},
+    Limit{Part::noOpenFiles, RLIMIT_NOFILE, 0},
+    Limit{Part::noProcesses, RLIMIT_NPROC, 0},
 };
 
 /// The kernel kills this process once the reading end of its standard error is closed, as the death
@@ -97,12 +87,12 @@ class Parts {
  public:
   /// Does `act`, which returns whether it worked, unless a sanitizer is in the way.
   template <class Act>
-  void require(Confinement part, Act act) {
-    if (frames::kSanitizedBuild && !frames::standsSanitizers(part)) return;
+  void require(Part part, Act act) {
+    if (!isRequired(part)) return;
     if (!act()) throw CannotConfine(part, errno);
     inForce(part);
   }
-  void inForce(Confinement part) noexcept { bits_ |= static_cast<std::uint32_t>(part); }
+  void inForce(Part part) noexcept { bits_ |= static_cast<std::uint32_t>(part); }
   [[nodiscard]] std::uint32_t bits() const noexcept { return bits_; }
 
  private:
@@ -111,46 +101,43 @@ class Parts {
 
 }  // namespace
 
-CannotConfine::CannotConfine(Confinement part, int error)
-    : std::system_error(error, std::generic_category(), "cannot have: " + nameOf(part)),
-      part_(part) {}
-
-int CannotConfine::exitStatus() const noexcept {
-  return frames::kCannotConfineStatus + std::countr_zero(static_cast<std::uint32_t>(part_));
-}
+CannotConfine::CannotConfine(Part part, int error)
+    : std::system_error(error, std::generic_category(),
+                        "unavailable: " + std::string(lackToldBy(statusWithout(part))->name)),
+      exitStatus_(statusWithout(part)) {}
 
 std::uint32_t confine() {
   throwOnce();
   Parts parts;
-  parts.require(Confinement::endsWithParent, [] {
+  parts.require(Part::endsWithParent, [] {
     return endWithReaderOfStandardError() || ::prctl(PR_SET_PDEATHSIG, SIGKILL) == 0;
   });
-  if (::setsid() >= 0 || ::getsid(0) == ::getpid()) parts.inForce(Confinement::ownSession);
-  parts.require(Confinement::notDumpable, [] { return ::prctl(PR_SET_DUMPABLE, 0) == 0; });
+  if (::setsid() >= 0 || ::getsid(0) == ::getpid()) parts.inForce(Part::ownSession);
+  parts.require(Part::notDumpable, [] { return ::prctl(PR_SET_DUMPABLE, 0) == 0; });
 
   // A limit does not touch what is open already.
-  if (!frames::kSanitizedBuild) ::closefrom(STDERR_FILENO + 1);
+  if (!kSanitizedBuild) ::closefrom(STDERR_FILENO + 1);
   for (const Limit& zero : kZeroLimits) {
     parts.require(zero.part, [&] { return limit(zero.resource, zero.most); });
   }
-  parts.require(Confinement::addressSpaceLimit, [] { return limit(RLIMIT_AS, kAddressSpace); });
+  parts.require(Part::addressSpaceLimit, [] { return limit(RLIMIT_AS, kAddressSpace); });
   rlimit memory = {};
   if (::getrlimit(RLIMIT_AS, &memory) == 0 && memory.rlim_cur >= kAddressSpace) {
-    parts.inForce(Confinement::fullMemory);
+    parts.inForce(Part::fullMemory);
   }
   if (::prctl(PR_SET_SPECULATION_CTRL, PR_SPEC_STORE_BYPASS, PR_SPEC_FORCE_DISABLE, 0, 0) == 0) {
-    parts.inForce(Confinement::noStoreBypass);
+    parts.inForce(Part::noStoreBypass);
   }
 
   ::prctl(kSetDenyWriteExecute, kRefuseExecGain, 0, 0, 0);
   const int denied = ::prctl(kGetDenyWriteExecute, 0, 0, 0, 0);
   if (denied > 0 && (static_cast<unsigned>(denied) & kRefuseExecGain) != 0) {
-    parts.inForce(Confinement::noNewCode);
+    parts.inForce(Part::noNewCode);
   }
-  parts.require(Confinement::noCapabilities, [] { return dropCapabilities(); });
-  parts.require(Confinement::noNewPrivileges,
+  parts.require(Part::noCapabilities, [] { return dropCapabilities(); });
+  parts.require(Part::noNewPrivileges,
                 [] { return ::prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0; });
-  parts.require(Confinement::systemCallFilter, [] { return filterSystemCalls(); });
+  parts.require(Part::systemCallFilter, [] { return filterSystemCalls(); });
   return parts.bits();
 }
 

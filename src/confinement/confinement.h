@@ -4,30 +4,29 @@
 #include <cstdint>
 #include <system_error>
 
-#include "frames/confinement_bits.h"
+#include "confinement_parts/confinement_parts.h"
 
-/// Takes from a process all that unpacking does not need: to be called before it looks at the first
-/// byte that it was sent. Needs no privilege, no file and no namespace, and cannot be undone.
+/// Takes from a process all rights that unpacking does not need, before the process reads the first
+/// byte of a request. Needs no privilege, no file and no namespace; cannot be undone.
 namespace ironmoat::confinement {
 
 /// Bytes of address space for the whole process.
 inline constexpr std::size_t kAddressSpace = std::size_t{1} << 30;
 
-/// A part of the confinement that cannot be had here; `code()` says why.
+/// A required part of the sandbox is unavailable; `code()` says why.
 class CannotConfine : public std::system_error {
  public:
-  CannotConfine(frames::Confinement part, int error);
-  [[nodiscard]] frames::Confinement part() const noexcept { return part_; }
-  /// What a process exits with that must not run without, see frames::lackToldBy.
-  [[nodiscard]] int exitStatus() const noexcept;
+  CannotConfine(Part part, int error);
+  /// The exit status of a process that does not run without the part: see lackToldBy().
+  [[nodiscard]] int exitStatus() const noexcept { return exitStatus_; }
 
  private:
-  frames::Confinement part_;
+  int exitStatus_;
 };
 
-/// Confines the process, which must have a single thread, for good. Returns the frames::Confinement
-/// bits of what is in force, which are all but those that this kernel, this processor or a
-/// sanitizer cannot do. Throws CannotConfine, some of it being in force by then.
+/// Sandboxes the process, which must have a single thread, for good. Returns the bits of the Parts
+/// in force: all but those that this kernel, this processor or a sanitizer does not allow. Throws
+/// CannotConfine; then some of the parts are in force.
 std::uint32_t confine();
 
 }  // namespace ironmoat::confinement

@@ -13,7 +13,7 @@
 #include <new>
 #include <utility>
 
-#include "frames/confinement_bits.h"
+#include "confinement_parts/confinement_parts.h"
 
 namespace ironmoat::confinement {
 
@@ -96,7 +96,7 @@ void wipeAndReleaseMemory() noexcept {
   // Whole free pages go back to the kernel. What is free in pages that are also in use is taken
   // from malloc piece by piece, from large to small.
   releaseMemory();
-  if constexpr (!frames::kSanitizedBuild) {
+  if constexpr (!confinement::kSanitizedBuild) {
     ::mallopt(M_TOP_PAD, 0);  // so that the heap hardly grows for what does not fit
     Piece* taken = nullptr;
     for (std::size_t size = std::size_t{64} << 10; size > 1024; size /= 2) {

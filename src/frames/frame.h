@@ -8,39 +8,44 @@
 #include <string_view>
 
 #include "ironmoat/errors.h"
+#include "ironmoat/fields.h"
+#include "ironmoat/limits.h"
 #include "ironmoat/values.h"
 #include "values/block_builder.h"
 
-/// What crosses the trust line, byte for byte: doc/frames.md describes it.
+/// The frames between a client and a service; doc/frames.md specifies every byte.
 namespace ironmoat::frames {
 
 inline constexpr std::uint16_t kVersion = 1;
 inline constexpr std::size_t kLengthBytes = 4;
-/// The longest body of a request: id, a name of up to 255 bytes with its length, a message.
-extern const std::size_t kMaxRequestBody;
-/// The longest that a request frame has before its message, length included.
-inline constexpr std::size_t kMaxRequestHead = kLengthBytes + 8 + 1 + 255;
-extern const std::size_t kMaxReplyBody;
+inline constexpr std::size_t kMaxName = 255;  // bytes of an output type's name
+/// Bytes of a request frame before its message, length included.
+inline constexpr std::size_t kMaxRequestHead = kLengthBytes + 8 + 1 + kMaxName;
+inline constexpr std::size_t kMaxRequestBody =
+    kMaxRequestHead - kLengthBytes + limits::messageBytes;
+inline constexpr std::size_t kMaxReplyBody = 8 + 1 + limits::replyBytes;
 
-/// A frame breaks the rules of doc/frames.md. Nothing after it on the connection can be trusted.
+/// A frame violates the protocol. Nothing after it on the connection can be trusted.
 class FrameError : public std::runtime_error {
  public:
   using std::runtime_error::runtime_error;
 };
 
-/// The service's first frame.
+/// The service's first frame: its sandbox and its limits, by default those of this build.
 struct Hello {
-  std::uint16_t version = kVersion;
-  std::uint32_t confinement = 0;  ///< bits of frames::Confinement
-  std::uint64_t messageBytes = 0;
-  std::uint64_t recordBytes = 0;
-  std::uint64_t deliveredBytes = 0;
-  std::uint64_t replyBytes = 0;
-  std::uint32_t nestedContainers = 0;
+  std::uint32_t confinement = 0;  ///< bits of confinement::Part
+  std::uint64_t messageBytes = limits::messageBytes;
+  std::uint64_t recordBytes = limits::recordBytes;
+  std::uint64_t deliveredBytes = limits::deliveredBytes;
+  std::uint64_t replyBytes = limits::replyBytes;
+  std::uint32_t nestedContainers = limits::nestedContainers;
 
-  /// This build's version and limits.
-  static Hello ours();
+  static Hello ours() { return {}; }
   friend bool operator==(const Hello&, const Hello&) = default;
+
+  using H = Hello;
+  using Fields = FieldList<H, &H::confinement, &H::messageBytes, &H::recordBytes,
+                           &H::deliveredBytes, &H::replyBytes, &H::nestedContainers>;
 };
 
 struct Request {
@@ -52,8 +57,8 @@ struct Request {
 enum class Status : std::uint8_t {
   record = 0,     ///< the body is the encoded record
   refused = 1,    ///< a DecodingError
-  notServed = 2,  ///< unknown output type or a bad request; the body is a sentence
-  failed = 3,     ///< the service failed in another way; the body is a sentence
+  notServed = 2,  ///< unknown output type, or a bad request; the body is a description
+  failed = 3,     ///< the service failed in another way; the body is a description
 };
 
 struct Reply {
@@ -62,29 +67,30 @@ struct Reply {
   Data body;
 };
 
-/// Each appends one whole frame, length included, or leaves `out` as it was and throws: FrameError
-/// for what no frame can hold, std::bad_alloc. Of a path or sentence as much is written as a frame
-/// can carry.
+// Each `append` function appends one whole frame, length included, or throws and leaves `out` as it
+// was: FrameError if no frame can hold the arguments, std::bad_alloc. Paths and sentences are
+// truncated to what a frame can carry.
+
 void appendHello(BlockBuilder& out, const Hello& hello);
-void appendRequest(BlockBuilder& out, std::uint64_t id, std::string_view outputType,
-                   std::string_view message);
-/// Everything of a request frame that stands before the message, for senders that write the
-/// message's bytes from where they are.
+/// The part of a request frame before its message, which the caller sends from where it is.
 void appendRequestHead(BlockBuilder& out, std::uint64_t id, std::string_view outputType,
                        std::size_t messageBytes);
-/// How many bytes that is.
-[[nodiscard]] std::size_t requestHeadBytes(std::string_view outputType) noexcept;
+/// Bytes of that part.
+[[nodiscard]] inline std::size_t requestHeadBytes(std::string_view outputType) noexcept {
+  return kMaxRequestHead - kMaxName + outputType.size();
+}
 void appendRefusal(BlockBuilder& out, std::uint64_t id, const DecodingError& error);
 void appendSentence(BlockBuilder& out, std::uint64_t id, Status status, std::string_view sentence);
 
-/// A reply whose body is appended between `begin` and `end`. `begin` returns the frame's start in
-/// `out`, which `end` takes; to give the reply up, truncate `out` to it. `end` does that itself
-/// before it throws FrameError over a reply that is too long.
+/// The caller appends the body of a reply between the two. `begin` returns the start of the frame
+/// in `out`, to which the caller truncates it to give the reply up. `end` does not check the
+/// length: encodeRecord() bounds what it appends, and the receiver rejects a longer frame.
 std::size_t beginReply(BlockBuilder& out, std::uint64_t id, Status status);
-void endReply(BlockBuilder& out, std::size_t start);
+void endReply(BlockBuilder& out, std::size_t start) noexcept;
 
-/// Each takes the body of one frame (what follows its length) and throws FrameError when it is not
-/// exactly as described. Views point into `body`, slices hold its block.
+// Each `parse` function takes the body of one frame, without its length, and throws FrameError if
+// the body is not exactly as specified. Views point into `body`; slices share its block.
+
 Hello parseHello(const Data& body);
 Request parseRequest(const Data& body);
 Reply parseReply(const Data& body);
@@ -93,7 +99,7 @@ DecodingError parseRefusal(const Data& body);
 /// The text inside a reply of status `notServed` or `failed`.
 std::string parseSentence(const Data& body);
 
-/// The id of a request whose rest may be broken; nothing when not even that is there.
+/// The id of a request that may be invalid; none if the body is too short for one.
 std::optional<std::uint64_t> requestId(const Data& body) noexcept;
 
 }  // namespace ironmoat::frames

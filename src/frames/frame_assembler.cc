@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <string>
 #include <string_view>
 
 #include "frames/frame.h"
@@ -13,9 +14,11 @@ namespace {
 constexpr std::size_t kBuffer = std::size_t{64} << 10;
 constexpr std::size_t kWorthReading = std::size_t{16} << 10;
 
-Data dataOf(const BlockRef& block) noexcept {
-  return block ? Data(detail::Slice(block.get(), 0, block->size())) : Data();
+[[noreturn, gnu::cold, gnu::noinline]] void rejectLength(std::size_t length, std::size_t limit) {
+  throw FrameError("frame exceeds the limit of " + std::to_string(limit) + " bytes: found " +
+                   std::to_string(length));
 }
+
 }  // namespace
 
 FrameAssembler::FrameAssembler(std::size_t maxBody, Sharing sharing)
@@ -30,7 +33,7 @@ std::span<char> FrameAssembler::room() {
     return {large_.bytes() + large_.size(),
             std::min(remaining_, large_.capacity() - large_.size())};
   }
-  // Only the start of one frame is left, and it moves at most once: afterwards it starts at 0.
+  // The buffer holds the start of one frame only. It moves at most once: then it starts at 0.
   if (first_ != 0 && kBuffer - last_ < kWorthReading) {
     std::memmove(buffer_.get(), buffer_.get() + first_, last_ - first_);
     last_ -= first_;
@@ -42,22 +45,21 @@ std::span<char> FrameAssembler::room() {
 void FrameAssembler::commit(std::size_t count) {
   if (remaining_ == 0) {
     last_ += count;
-    return;
+  } else {
+    large_.extend(count);  // within what `room` reserved
+    remaining_ -= count;
   }
-  large_.extend(count);  // within what `room` reserved
-  remaining_ -= count;
-  largeDone_ = remaining_ == 0;
 }
 
 std::optional<Data> FrameAssembler::next() {
-  if (largeDone_) return takeLarge();
-  const std::size_t came = last_ - first_;
-  if (came < kLengthBytes) return std::nullopt;  // always so while a large frame arrives
+  if (large_.size() != 0 && remaining_ == 0) return takeLarge();
+  const std::size_t received = last_ - first_;
+  if (received < kLengthBytes) return std::nullopt;  // as always while a large frame is incomplete
   const char* const frame = buffer_.get() + first_;
   const std::size_t length = load<std::uint32_t>(frame);
-  if (length > maxBody_) throw FrameError("a frame announces more bytes than any may have");
+  if (length > maxBody_) rejectLength(length, maxBody_);
 
-  const std::string_view body(frame + kLengthBytes, std::min(came - kLengthBytes, length));
+  const std::string_view body(frame + kLengthBytes, std::min(received - kLengthBytes, length));
   if (body.size() == length) {
     Data whole(detail::Slice::copyOf(body, sharing_));
     first_ += kLengthBytes + length;
@@ -65,7 +67,7 @@ std::optional<Data> FrameAssembler::next() {
     return whole;
   }
   if (length > kBuffer - kLengthBytes) {
-    // Twice what came, in the block where the rest will arrive.
+    // Twice what is received, in the block that will receive the rest.
     large_.reserve(std::min(length, std::max(kBuffer, 2 * body.size())));
     large_.append(body);
     remaining_ = length - body.size();
@@ -74,14 +76,14 @@ std::optional<Data> FrameAssembler::next() {
   return std::nullopt;
 }
 
+Data FrameAssembler::takeLarge() {
+  const BlockRef body = large_.finish();
+  return Data(detail::Slice(body.get(), 0, body->size()));
+}
+
 void FrameAssembler::wipeSpare() noexcept {
   std::memset(buffer_.get(), 0, first_);
   std::memset(buffer_.get() + last_, 0, kBuffer - last_);
-}
-
-Data FrameAssembler::takeLarge() {
-  largeDone_ = false;
-  return dataOf(large_.finish());
 }
 
 }  // namespace ironmoat::frames

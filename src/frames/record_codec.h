@@ -8,20 +8,20 @@
 
 namespace ironmoat::frames {
 
-/// Bytes or a record break the rules that doc/frames.md gives for a record of that type.
+/// Bytes or a record violate what doc/frames.md specifies for records of the type.
 class RecordError : public std::runtime_error {
  public:
   using std::runtime_error::runtime_error;
 };
 
-/// Appends the body of a reply that carries `record`. Throws RecordError when it is nested too
-/// deeply or too large for a reply; a part of it may then be in `out`.
+/// Appends `record` as the body of a reply. Throws RecordError if it exceeds the limits on nesting
+/// or replies; then `out` may end with a part of it.
 template <MessageSchema R>
 void encodeRecord(const R& record, BlockBuilder& out);
 
-/// The record back. Trusts nothing: every length, count, tag and text is checked, lists and depth
-/// are bounded as in ironmoat/limits.h. Text and bytes are slices of `body`. Throws RecordError,
-/// and what the record's initialiser throws.
+/// The record that `body` encodes. Untrusted input: checks every length, count, bit and text, and
+/// holds lists, text and nesting to ironmoat/limits.h. Text and data are slices of `body`. Throws
+/// RecordError, and what the record's initialiser throws.
 template <MessageSchema R>
 R decodeRecord(const Data& body);
 

@@ -64,16 +64,16 @@ TEST(RecordLayoutTest, BytesThatBreakTheRulesAreRefused) {
     std::string body;
     std::string_view sentence;
   } rows[] = {
-      {"", "the record ends too early"},
-      {"\0\0"s + command, "a field that every record has is missing"},
-      {"\x01\x80"s + command, "a field that no record has is present"},
-      {"\x01\0"s + command + "x", "bytes follow the record"},
-      {"\x01\0"s + command.substr(1), "the record ends too early"},
-      {"\x41\0"s + command + "\2"s, "a truth value is neither 0 nor 1"},
-      {"\x01\1"s + command + "\2\0\0\0\xC3("s, "a text is not valid UTF-8"},
-      {"\x01\1"s + command + "\xFF\xFF\xFF\xFFxyz"s, "the record ends too early"},
-      {"\x05\0"s + command + "\4\0\0\0xyz"s, "the record ends too early"},
-      {"\x05\0"s + command + "\3\0\0"s, "the record ends too early"},
+      {"", "unexpected end of record"},
+      {"\0\0"s + command, "missing required field"},
+      {"\x01\x80"s + command, "unexpected presence bit"},
+      {"\x01\0"s + command + "x", "unexpected bytes after the record"},
+      {"\x01\0"s + command.substr(1), "unexpected end of record"},
+      {"\x41\0"s + command + "\2"s, "not a valid Bool"},
+      {"\x01\1"s + command + "\2\0\0\0\xC3("s, "not a valid UTF-8 text"},
+      {"\x01\1"s + command + "\xFF\xFF\xFF\xFFxyz"s, "unexpected end of record"},
+      {"\x05\0"s + command + "\4\0\0\0xyz"s, "unexpected end of record"},
+      {"\x05\0"s + command + "\3\0\0"s, "unexpected end of record"},
   };
   for (const auto& row : rows) {
     EXPECT_EQ(refusal<Response>(row.body), row.sentence) << ::testing::PrintToString(row.body);
@@ -96,10 +96,10 @@ TEST(RecordLimitsTest, NeitherDepthNorCountsAreTheSenders) {
   const std::string opening = two.substr(0, two.find(nested(1), 1));
   std::string deep;
   for (std::uint32_t i = 0; i < limits::nestedContainers; ++i) deep += opening;
-  EXPECT_EQ(refusal<Payload>(deep + nested(1)), "records are nested too deeply");
+  EXPECT_EQ(refusal<Payload>(deep + nested(1)), "nesting exceeds the limit of 512 records");
   std::string announced = two;  // 255 elements, and the bytes of one
   announced.replace(opening.size() - 4, 4, "\xFF\0\0\0"s);
-  EXPECT_EQ(refusal<Payload>(announced), "a list announces more than there is");
+  EXPECT_EQ(refusal<Payload>(announced), "list exceeds the rest of the record");
 }
 
 TEST(RecordLimitsTest, ListsAreBoundedByTheMemoryTheyTake) {
@@ -112,7 +112,7 @@ TEST(RecordLimitsTest, ListsAreBoundedByTheMemoryTheyTake) {
   EXPECT_EQ(refusal<Payload>(encoded(Payload::with(arguments))), "");
   arguments.corvelMessageList.push_back(Payload::with({}));
   EXPECT_EQ(refusal<Payload>(encoded(Payload::with(std::move(arguments)))),
-            "the lists take too much memory");
+            "memory of lists exceeds the limit of 67108864 bytes");
 }
 
 TEST(RecordLimitsTest, TextAndDataAreBoundedInAll) {

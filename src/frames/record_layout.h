@@ -4,12 +4,14 @@
 #include <concepts>
 #include <cstddef>
 #include <cstdint>
+#include <string>
 
 #include "frames/record_codec.h"
 #include "ironmoat/fields.h"
 #include "ironmoat/values.h"
+#include "values/record_traits.h"
 
-/// What is known of an encoded record while compiling.
+/// The parts of an encoded record that its type determines.
 namespace ironmoat::frames {
 
 template <class T>
@@ -18,41 +20,28 @@ template <class T>
 concept Scalar = Number<T> || std::same_as<T, Bool>;
 template <class T>
 concept Text = std::same_as<T, String> || std::same_as<T, Data>;
-template <class T>
-concept Record = requires {
-  typename T::Arguments::Fields;
-};
-
-template <class T>
-constexpr bool isOptional = false;
-template <class T>
-constexpr bool isOptional<Optional<T>> = true;
-
-template <class T>
-constexpr bool isList = false;
-template <class T>
-constexpr bool isList<List<T>> = true;
 
 template <class A, class Fields = typename A::Fields>
 struct Layout;
 
-/// Bytes of a value without what is only known at run time (text, elements, a record's fields).
+/// Bytes of a value without those that only its content determines: text, elements, a record's
+/// fields.
 template <class T>
 constexpr std::size_t fixedBytes() {
-  if constexpr (isOptional<T>) return fixedBytes<typename T::value_type>();
+  if constexpr (kIsOptional<T>) return fixedBytes<typename T::value_type>();
   if constexpr (Number<T>) return 8;
   if constexpr (std::same_as<T, Bool>) return 1;
   if constexpr (Record<T>) return 0;
   return 4;
 }
 
-/// The fewest bytes that any value of T takes.
+/// The fewest bytes of a value of T.
 template <class T>
-constexpr std::size_t leastBytes() {
-  if constexpr (isOptional<T>) {
+constexpr std::size_t minBytes() {
+  if constexpr (kIsOptional<T>) {
     return 0;
   } else if constexpr (Record<T>) {
-    return Layout<typename T::Arguments>::least;
+    return Layout<typename T::Arguments>::minimum;
   } else {
     return fixedBytes<T>();
   }
@@ -63,27 +52,32 @@ struct Layout<A, FieldList<A, Members...>> {
   static constexpr std::size_t presence = (sizeof...(Members) + 7) / 8;
   static constexpr std::size_t fixed =
       presence + (fixedBytes<typename Field<Members>::Type>() + ...);
-  static constexpr std::size_t least =
-      presence + (leastBytes<typename Field<Members>::Type>() + ...);
+  static constexpr std::size_t minimum =
+      presence + (minBytes<typename Field<Members>::Type>() + ...);
 
   using Bits = std::array<std::uint8_t, presence>;
-  /// The bits of the fields that are always there.
+  /// The bits of the fields that are always present.
   static constexpr Bits required = [] {
     Bits bits{};
     std::size_t i = 0;
     ((bits[i / 8] |=
-      static_cast<std::uint8_t>(!isOptional<typename Field<Members>::Type> << (i % 8)),
+      static_cast<std::uint8_t>(!kIsOptional<typename Field<Members>::Type> << (i % 8)),
       ++i),
      ...);
     return bits;
   }();
-  /// The bits of the last byte that belong to no field.
+  /// The bits of the last byte without a field.
   static constexpr std::uint8_t unusedInLast =
       sizeof...(Members) % 8 == 0 ? 0 : static_cast<std::uint8_t>(0xFF << (sizeof...(Members) % 8));
 };
 
-[[noreturn, gnu::cold, gnu::noinline]] inline void refuse(const char* sentence) {
-  throw RecordError(sentence);
+[[noreturn, gnu::cold, gnu::noinline]] inline void reject(const char* description) {
+  throw RecordError(description);
+}
+[[noreturn, gnu::cold, gnu::noinline]] inline void rejectExcess(const char* what, std::size_t limit,
+                                                                const char* unit) {
+  throw RecordError(std::string(what) + " exceeds the limit of " + std::to_string(limit) + ' ' +
+                    unit);
 }
 
 }  // namespace ironmoat::frames

@@ -13,7 +13,7 @@
 
 namespace ironmoat::frames {
 
-/// Reads one record out of a body that nobody vouches for.
+/// Reads one record from an untrusted body.
 class Reader {
  public:
   explicit Reader(const Data& body)
@@ -22,7 +22,8 @@ class Reader {
   template <Record R>
   [[gnu::noinline]] void record(typename R::Arguments& into) {
     using Arguments = typename R::Arguments;
-    if (++depth_ > limits::nestedContainers) refuse("records are nested too deeply");
+    if (++depth_ > limits::nestedContainers)
+      rejectExcess("nesting", limits::nestedContainers, "records");
     const char* const bits = take(Layout<Arguments>::presence);
     checkPresence<Layout<Arguments>>(bits);
     fields<Arguments>(typename Arguments::Fields(), into, bits);
@@ -30,7 +31,7 @@ class Reader {
   }
 
   void finish() const {
-    if (at_ != end_) refuse("bytes follow the record");
+    if (at_ != end_) reject("unexpected bytes after the record");
   }
 
  private:
@@ -40,9 +41,9 @@ class Reader {
     for (std::size_t i = 0; i < L::presence; ++i) {
       missing |= static_cast<std::uint8_t>(L::required[i] & ~static_cast<std::uint8_t>(bits[i]));
     }
-    if (missing != 0) refuse("a field that every record has is missing");
+    if (missing != 0) reject("missing required field");
     if ((static_cast<std::uint8_t>(bits[L::presence - 1]) & L::unusedInLast) != 0) {
-      refuse("a field that no record has is present");
+      reject("unexpected presence bit");
     }
   }
 
@@ -65,7 +66,7 @@ class Reader {
     into.reserve(count);
   }
   void chargeRecords(std::size_t count, std::size_t size) {
-    if (count > recordBytes_ / size) refuse("the lists take too much memory");
+    if (count > recordBytes_ / size) rejectExcess("memory of lists", limits::recordBytes, "bytes");
     recordBytes_ -= count * size;
   }
 
@@ -82,8 +83,8 @@ class Reader {
   template <class T>
   [[gnu::always_inline]] void field(Optional<T>& into, std::size_t i, const char* bits) {
     if ((bits[i / 8] >> (i % 8) & 1) == 0) return;
-    // Still absent, so it owns nothing and can be built over, which saves the moves of assigning.
-    if constexpr (isList<T>) {
+    // An absent field owns nothing: to construct over it saves the moves of an assignment.
+    if constexpr (kIsList<T>) {
       fill(**std::construct_at(&into, T()));
     } else {
       std::construct_at(&into, read<T>());
@@ -102,7 +103,7 @@ class Reader {
       return load<T>(take(sizeof(T)));
     } else if constexpr (std::same_as<T, Bool>) {
       const char byte = *take(1);
-      if (byte != 0 && byte != 1) refuse("a truth value is neither 0 nor 1");
+      if (byte != 0 && byte != 1) reject("not a valid Bool");
       return byte == 1;
     } else if constexpr (std::same_as<T, Data>) {
       return Data(bytes());
@@ -113,8 +114,7 @@ class Reader {
     }
   }
 
-  /// A record that is no element lies on the stack while its fields are read, so it has to be a
-  /// small one.
+  /// A record outside of lists is on the stack while its fields are read, so it must be small.
   template <Record R>
   [[gnu::noinline]] R nested() {
     static_assert(sizeof(R) <= 512);
@@ -127,14 +127,14 @@ class Reader {
 
   template <class T>
   [[gnu::noinline]] void fill(List<T>& elements) {
-    static_assert(leastBytes<T>() > 0, "or a few bytes could announce any number of elements");
+    static_assert(minBytes<T>() > 0, "a few bytes must not announce any number of elements");
     const std::size_t count = load<std::uint32_t>(take(4));
-    if (count > left() / leastBytes<T>()) refuse("a list announces more than there is");
+    if (count > left() / minBytes<T>()) reject("list exceeds the rest of the record");
     chargeRecords(count, sizeof(T));
     if (count == 0) return;
     elements.reserve(count);
     if constexpr (Record<T>) {
-      // Kept off the stack: records of kilobytes may lie inside one another here.
+      // Off the stack: here records of kilobytes nest.
       const auto arguments = std::make_unique<std::optional<typename T::Arguments>>();
       for (std::size_t i = 0; i < count; ++i) {
         record<T>(arguments->emplace());
@@ -145,7 +145,7 @@ class Reader {
     }
   }
 
-  /// A function of its own, so that what it needs of the stack is not held while records nest.
+  /// Not inline, so that nested records do not hold its stack frame.
   template <Record R>
   [[gnu::noinline]] static void append(List<R>& to, typename R::Arguments& arguments) {
     to.emplace_back([&] { return typename R::Arguments(std::move(arguments)); });
@@ -153,21 +153,22 @@ class Reader {
 
   [[gnu::noinline]] String text() {
     detail::Slice text = bytes();
-    if (!isValidUtf8(text.view())) refuse("a text is not valid UTF-8");
+    if (!isValidUtf8(text.view())) reject("not a valid UTF-8 text");
     return String(std::move(text));
   }
 
   [[gnu::noinline]] detail::Slice bytes() {
     const std::size_t length = load<std::uint32_t>(take(4));
     const char* const first = take(length);
-    if (length > deliveredBytes_) refuse("the record carries too much text and data");
+    if (length > deliveredBytes_)
+      rejectExcess("size of text and data", limits::deliveredBytes, "bytes");
     deliveredBytes_ -= length;
     return {block_, static_cast<std::uint32_t>(first - block_->bytes()),
             static_cast<std::uint32_t>(length)};
   }
 
   const char* take(std::size_t count) {
-    if (count > left()) refuse("the record ends too early");
+    if (count > left()) reject("unexpected end of record");
     return std::exchange(at_, at_ + count);
   }
   [[nodiscard]] std::size_t left() const noexcept { return static_cast<std::size_t>(end_ - at_); }

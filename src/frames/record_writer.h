@@ -14,11 +14,12 @@ namespace ironmoat::frames {
 
 /// Writes one record.
 ///
-/// Room is claimed for all that is fixed in a record at once, and again after each part whose
-/// size is only known at run time; so before each field there is room for the fixed parts of it
-/// and of all fields behind it, and these are stored without a check. `at` is where the next byte
-/// goes, handed from one function to the next: as a member it would be stored and loaded with every
-/// field, since a stored byte may be any object's.
+/// Invariant: before each field there is room for the fixed bytes of it and of all later fields of
+/// its record, so they are stored without a check. The record claims this room at its start, and
+/// again after each part whose size only its content determines.
+///
+/// `at` is the position of the next byte. It is an argument and a result, not a member, which every
+/// field would load and store: a stored byte may alias any object.
 class Writer {
  public:
   explicit Writer(BlockBuilder& out)
@@ -27,17 +28,19 @@ class Writer {
   template <Record R>
   void write(const R& from) {
     settle(record(from, out_.bytes() + start_));
-    if (out_.size() - start_ > limits::replyBytes) refuse("the record is too large for a reply");
+    if (out_.size() - start_ > limits::replyBytes)
+      rejectExcess("record", limits::replyBytes, "bytes");
   }
 
  private:
-  /// Claims are upper bounds: only the end knows what was used of them.
+  /// Claims are upper bounds, so a record within the limit may claim this much more.
   static constexpr std::size_t kSlack = std::size_t{64} << 10;
 
   template <Record R>
   [[gnu::noinline]] char* record(const R& from, char* at) {
     using Arguments = typename R::Arguments;
-    if (++depth_ > limits::nestedContainers) refuse("records are nested too deeply");
+    if (++depth_ > limits::nestedContainers)
+      rejectExcess("nesting", limits::nestedContainers, "records");
     at = claim(at, Layout<Arguments>::fixed);
     const std::size_t presenceAt = static_cast<std::size_t>(at - out_.bytes());
     auto bits = Layout<Arguments>::required;
@@ -66,7 +69,7 @@ class Writer {
   requires requires(const Optional& from) { from.has_value(); }
   [[gnu::always_inline]] char* field(const Optional& from, std::size_t i, std::uint8_t* bits,
                                      char* at) {
-    // Most fields of a record are absent: hinted, the tests of 150 of them stand in 2 KB.
+    // Most fields are absent: with the hint their tests are next to one another.
     if (from) [[unlikely]] {
       bits[i / 8] |= static_cast<std::uint8_t>(1U << (i % 8));
       return value<Fixed>(*from, at);
@@ -74,8 +77,8 @@ class Writer {
     return at;
   }
 
-  // `value` finds room for fixedBytes<T>() at `at`, and leaves room for `Fixed` bytes unless the
-  // size of T is known.
+  // `value` requires room for fixedBytes<T>() at `at`. Unless the size of T is fixed, it leaves
+  // room for `Fixed` bytes after it.
 
   template <std::size_t Fixed, Scalar T>
   char* value(T from, char* at) {
@@ -104,7 +107,7 @@ class Writer {
     return claim(at, behind);
   }
 
-  /// No overflow: a text has less than 4 GiB.
+  /// No overflow: a text is shorter than 4 GiB.
   [[gnu::noinline]] char* text(std::string_view from, char* at, std::size_t behind) {
     at = store(at, static_cast<std::uint32_t>(from.size()));
     at = claim(at, from.size() + behind);
@@ -118,16 +121,16 @@ class Writer {
 
   [[gnu::cold, gnu::noinline]] char* grow(char* at, std::size_t count) {
     settle(at);
-    // No overflow: `count` is little more than 4 GiB at most, and the builder has less than that.
+    // No overflow: `count` is at most little more than 4 GiB, and the builder's size less.
     if (out_.size() - start_ + count > limits::replyBytes + kSlack) {
-      refuse("the record is too large for a reply");
+      rejectExcess("record", limits::replyBytes, "bytes");
     }
     out_.reserve(count);
     end_ = out_.bytes() + out_.capacity();
     return out_.bytes() + out_.size();
   }
 
-  /// Tells the builder how much was written into its room.
+  /// Tells the builder how much of its room is written.
   void settle(const char* at) {
     out_.extend(static_cast<std::size_t>(at - (out_.bytes() + out_.size())));
   }

@@ -1,5 +1,5 @@
-// What the host's initialisers let pass, and nothing else: a test that links definitions of its own
-// gets those instead, since no other symbol pulls this file out of its library.
+// The checks of the host's initialisers, and nothing else: a test that defines its own links them
+// instead, since no other symbol takes this file from its library.
 //
 // This host accepts every value. To reject one, throw here: no record is made, and the daemon gets
 // a DecodingError `rejectedByHost`, with the description of a std::exception.

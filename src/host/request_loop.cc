@@ -18,8 +18,8 @@ namespace {
 
 constexpr timespec kIdle = {1, 0};
 
-/// Waits until the descriptor is ready, at most for `time` if that is given; false when the time is
-/// up or the wait failed. pselect, because poll takes no descriptor under an open-files limit of 0.
+/// Waits until the descriptor is ready, at most for `time` unless it is null; false if the time is
+/// up or the wait failed. pselect, because poll rejects descriptors under an open-files limit of 0.
 bool waitFor(int descriptor, bool toRead, const timespec* time) {
   int count = 0;
   do {
@@ -57,7 +57,7 @@ void RequestLoop::run(const frames::Hello& hello) {
     frames::appendSentence(replies_, 0, frames::Status::notServed, error.what());
     flush();
   } catch (const std::bad_alloc&) {
-    // Not even room to read a request: end in order, so that the peer can start another service.
+    // No memory to read a request: end in order, so that the peer can start another service.
     flush();
   }
 }
@@ -66,8 +66,8 @@ std::optional<Data> RequestLoop::take() {
   return withMemory([&] { return assembler_.next(); });
 }
 
-/// A request that runs out of memory is tried once more when nothing else is in memory, so that its
-/// outcome depends on its own bytes only.
+/// If memory runs out, tries once more with nothing else in memory, so that the outcome of a
+/// request depends on its own bytes only.
 void RequestLoop::answer(const Data& request) {
   try {
     return server_.answer(request, replies_);
@@ -112,7 +112,7 @@ bool RequestLoop::flush() {
   const char* next = replies_.bytes();
   std::size_t left = broken_ ? 0 : replies_.size();
   while (left > 0) {
-    const iovec piece = {const_cast<char*>(next), left};  // writev: all that the filter allows
+    const iovec piece = {const_cast<char*>(next), left};  // the filter allows writev only
     const ssize_t count = ::writev(output_, &piece, 1);
     if (count >= 0) {
       next += count;

@@ -13,37 +13,37 @@
 
 namespace ironmoat::host {
 
-/// Serves one connection on the calling thread: answers each request in the order of arrival, and
-/// writes the replies once no whole request is left or enough of them have gathered.
+/// Serves one connection on the calling thread: answers requests in the order of their arrival, and
+/// writes the replies when no whole request is left or kBatch bytes of them are waiting.
 ///
-/// Blocks in a write while the peer does not read, and reads nothing meanwhile: what the service
-/// holds is bounded by one request, its reply and kBatch bytes of earlier replies. After kIdle
-/// without a request it wipes and releases its memory.
+/// While the peer does not read, the loop blocks in a write and reads nothing: so memory is bounded
+/// by one request, its reply and kBatch bytes of earlier replies. After one second without a
+/// request the loop wipes and releases its memory.
 class RequestLoop {
  public:
-  /// The descriptors stay the caller's. `input` becomes nonblocking if it is a socket; anything
-  /// else may be shared with other processes and is left as it is.
+  /// The caller owns the descriptors. A socket `input` becomes non-blocking; any other is
+  /// unchanged, because other processes may share it.
   RequestLoop(const IronmoatServer& server, int input, int output);
 
-  /// Writes `hello`, then serves until the end of input, until the peer stops reading, or until a
-  /// frame exceeds the limit on its length; everything received before that is answered.
+  /// Writes `hello`, then serves until the input ends, the peer stops reading, or a frame exceeds
+  /// the limit on its length. Answers all requests received before that.
   void run(const frames::Hello& hello);
 
  private:
   static constexpr std::size_t kBatch = std::size_t{8} << 10;
 
-  /// The next request that has arrived whole. Throws FrameError after which the input is useless.
+  /// The next whole request, if one is received. Throws FrameError; then the input is of no use.
   std::optional<Data> take();
   void answer(const Data& request);
-  /// Waits for input and reads some; false at its end.
+  /// Waits for input and reads some; false at the end of input.
   bool receive();
-  /// Writes what `replies_` holds; false once the peer has stopped reading.
+  /// Writes all of `replies_`; false if the peer has stopped reading.
   bool flush();
-  /// Makes room after an allocation has failed.
+  /// Writes the replies and frees memory after an allocation has failed.
   void release();
-  /// Wipes and releases what earlier requests have left in memory.
+  /// Wipes and releases the memory of earlier requests.
   void rest();
-  /// `act`, a second time after a `release` if memory ran out.
+  /// Calls `act`; if memory runs out, once more after a `release`.
   template <class Act>
   auto withMemory(Act act) {
     try {

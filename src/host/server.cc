@@ -31,32 +31,32 @@ void IronmoatServer::add(std::string_view outputType, Handler handler) {
 void IronmoatServer::answer(const Data& request, BlockBuilder& reply) const {
   const std::uint64_t id = frames::requestId(request).value_or(0);
   const std::size_t start = reply.size();
+  const auto withoutRecord = [&]() -> BlockBuilder& {
+    reply.truncate(start);
+    return reply;
+  };
   try {
     const frames::Request parsed = frames::parseRequest(request);
     const auto found = std::find_if(
         registrations_.begin(), registrations_.end(),
         [&](const Registration& known) { return known.outputType == parsed.outputType; });
     if (found == registrations_.end()) {
-      return frames::appendSentence(reply, id, Status::notServed, "no unpacker for this type");
+      return frames::appendSentence(reply, id, Status::notServed, "not a served output type");
     }
-    const std::size_t frame = frames::beginReply(reply, id, Status::record);
+    frames::beginReply(reply, id, Status::record);
     withHostRejections([&] { found->handler(parsed.message, reply); });
-    frames::endReply(reply, frame);
+    frames::endReply(reply, start);
   } catch (const DecodingError& rejection) {
-    reply.truncate(start);
-    frames::appendRefusal(reply, id, rejection);
+    frames::appendRefusal(withoutRecord(), id, rejection);
   } catch (const std::bad_alloc&) {
-    reply.truncate(start);
+    withoutRecord();
     throw;
   } catch (const frames::FrameError& error) {
-    reply.truncate(start);
-    frames::appendSentence(reply, id, Status::notServed, error.what());
+    frames::appendSentence(withoutRecord(), id, Status::notServed, error.what());
   } catch (const std::exception& error) {
-    reply.truncate(start);
-    frames::appendSentence(reply, id, Status::failed, error.what());
+    frames::appendSentence(withoutRecord(), id, Status::failed, error.what());
   } catch (...) {
-    reply.truncate(start);
-    frames::appendSentence(reply, id, Status::failed, "the unpacker failed");
+    frames::appendSentence(withoutRecord(), id, Status::failed, "the unpacker failed");
   }
 }
 
@@ -70,26 +70,18 @@ void IronmoatServer::serve(const Data& request, BlockBuilder& reply) const {
   }
 }
 
-namespace {
-
-std::uint32_t confineOrExit() {
-  try {
-    return confinement::confine();
-  } catch (const confinement::CannotConfine& error) {
-    std::_Exit(error.exitStatus());
-  }
-}
-
-}  // namespace
-
 void IronmoatServer::run() {
-  // A peer that stops reading is an end, not a crash; so is output that is a file.
+  // When the peer stops reading, or the output is a file, the service ends in order.
   static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
   static_cast<void>(std::signal(SIGXFSZ, SIG_IGN));
   confinement::prepareMemory();
   host::RequestLoop loop(*this, STDIN_FILENO, STDOUT_FILENO);
   frames::Hello hello = frames::Hello::ours();
-  if (confine_ == Confine::yes) hello.confinement = confineOrExit();
+  try {
+    if (confine_ == Confine::yes) hello.confinement = confinement::confine();
+  } catch (const confinement::CannotConfine& error) {
+    std::_Exit(error.exitStatus());
+  }
   loop.run(hello);
 }
 

@@ -19,7 +19,7 @@ class RequestLoop;
 }
 
 /// Serves unpack requests over the process's standard input and output: one connected stream
-/// socket, or two pipes. doc/frames.md describes what is spoken there.
+/// socket, or two pipes. doc/frames.md specifies the protocol.
 class IronmoatServer {
  public:
   /// The shared instance. It lives as long as the process.
@@ -27,13 +27,13 @@ class IronmoatServer {
 
   enum class Confine : std::uint8_t { yes, no };
 
-  /// An unconfined server is for tests and measurements; clients refuse it.
+  /// An unconfined server is for tests and measurements; clients reject it.
   explicit IronmoatServer(Confine confine = Confine::yes) noexcept : confine_(confine) {}
   IronmoatServer(const IronmoatServer&) = delete;
   IronmoatServer& operator=(const IronmoatServer&) = delete;
   virtual ~IronmoatServer() = default;
 
-  /// Binds an output type to the unpacker that produces it. Before `run`, once for a type.
+  /// Binds an output type to its unpacker. Must be called before `run`, once for each type.
   template <MessageSchema Output, MessageUnpacker Unpacker>
   requires std::same_as<typename Unpacker::MessageSchemaType, Output>
   void registerUnpacker(Unpacker unpacker) {
@@ -43,13 +43,13 @@ class IronmoatServer {
   }
 
   /// Sandboxes the process for good, then serves on the calling thread until the end of input.
-  /// Also returns when the peer breaks the protocol or stops reading. Where the sandbox is not to
-  /// be had, the process ends with an exit status that says which part (frames::lackToldBy); it has
-  /// then read and written nothing.
+  /// Also returns if the peer violates the protocol or stops reading. If a required part of the
+  /// sandbox is unavailable, the process ends before it has read or written anything, with the exit
+  /// status of that part (confinement::statusWithout).
   virtual void run();
 
-  /// One request: the frame body of a request to the whole frame of its reply. Never throws for
-  /// what a request says; any number of threads at once.
+  /// Appends the whole reply frame to the frame body of a request. Throws nothing that a request
+  /// causes. Thread-safe.
   void serve(const Data& request, BlockBuilder& reply) const;
 
  private:
@@ -62,7 +62,7 @@ class IronmoatServer {
     Handler handler;
   };
   void add(std::string_view outputType, Handler handler);
-  /// As `serve`, but throws std::bad_alloc where memory runs out; `reply` is as it was then.
+  /// As `serve`, but throws std::bad_alloc if memory runs out and leaves `reply` as it was.
   void answer(const Data& request, BlockBuilder& reply) const;
 
   Confine confine_;

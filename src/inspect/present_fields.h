@@ -2,24 +2,9 @@
 
 #include <string_view>
 
-#include "ironmoat/values.h"
+#include "values/record_traits.h"
 
 namespace ironmoat::inspect {
-
-template <class T>
-concept Record = requires {
-  typename T::Arguments::Fields;
-};
-
-template <class T>
-inline constexpr bool kIsOptional = false;
-template <class T>
-inline constexpr bool kIsOptional<Optional<T>> = true;
-
-template <class T>
-inline constexpr bool kIsList = false;
-template <class T>
-inline constexpr bool kIsList<List<T>> = true;
 
 /// Calls `visit(name, value)` for each field that is present, in the order of the initialiser's
 /// arguments. The first field, whose label is `with`, goes by its own name like the others.

@@ -153,12 +153,11 @@ int selfTest(std::ostream& out, const std::string& serviceProgram) {
     if (!safe) status = 1;
   };
   out << "In force in " << serviceProgram << ":\n";
-  for (const frames::ConfinementName& known : frames::kConfinementNames) {
-    const auto bit = static_cast<std::uint32_t>(known.part);
-    const bool inForce = (bits & bit) != 0;
-    line(known.name, inForce ? "yes" : "no", inForce || (frames::kRequiredConfinement & bit) == 0);
+  for (const confinement::PartDescription& known : confinement::kParts) {
+    const bool inForce = (bits & static_cast<std::uint32_t>(known.part)) != 0;
+    line(known.name, inForce ? "yes" : "no", inForce || !isRequired(known.part));
   }
-  if (frames::kSanitizedBuild) {
+  if (confinement::kSanitizedBuild) {
     out << "Nothing tried: a build with a sanitizer has no filter.\n";
     return status;
   }

@@ -14,7 +14,7 @@
 #include <system_error>
 #include <utility>
 
-#include "frames/confinement_bits.h"
+#include "confinement_parts/confinement_parts.h"
 
 namespace ironmoat::process {
 
@@ -62,7 +62,7 @@ struct SpawnSettings {
 
 std::string exitWord(int status) {
   std::string word = "exited with status " + std::to_string(status);
-  if (const auto* const lack = frames::lackToldBy(status)) {
+  if (const auto* const lack = confinement::lackToldBy(status)) {
     word += " (unavailable part of its sandbox: " + std::string(lack->name) + ")";
   }
   return word;

@@ -14,6 +14,7 @@
 #include "frames/record_codec.h"
 #include "host/server.h"
 #include "support/rejection.h"
+#include "support/request_frame.h"
 #include "support/written.h"
 #include "support/xml_message.h"
 #include "unpackers/command_response_unpacker.h"

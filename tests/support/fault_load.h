@@ -19,7 +19,7 @@
 #include <utility>
 #include <vector>
 
-#include "frames/confinement_bits.h"
+#include "confinement_parts/confinement_parts.h"
 #include "ironmoat/client.h"
 #include "ironmoat/command_response.h"
 #include "support/client_outcome.h"
@@ -34,7 +34,7 @@ using Clock = std::chrono::steady_clock;
 /// `--full` was given: minutes by hand instead of seconds in CI.
 inline bool fullSize = false;
 inline int sized(int usual, int full) {
-  return fullSize ? full : frames::kSanitizedBuild ? std::max(usual / 5, 2) : usual;
+  return fullSize ? full : confinement::kSanitizedBuild ? std::max(usual / 5, 2) : usual;
 }
 
 using FaultsTest = LeakCheck;

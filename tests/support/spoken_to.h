@@ -17,6 +17,7 @@
 #include "frames/frame.h"
 #include "frames/frame_assembler.h"
 #include "ironmoat/command_response.h"
+#include "support/request_frame.h"
 
 namespace ironmoat::testing {
 
