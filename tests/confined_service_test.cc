@@ -1,6 +1,5 @@
-// Servers as processes, looked at from outside: what they report, what the kernel says of them,
-// what they do where they cannot be confined and with frames that lie, and how they share their
-// limit of memory. (S1, S4, S6, S12)
+// The sandboxed service from outside: what it reports, what the kernel says of it, what it does
+// without a part of its sandbox, with invalid frames, with a slow peer and without memory.
 
 #include <grp.h>
 #include <gtest/gtest.h>
@@ -13,7 +12,6 @@
 
 #include <chrono>
 #include <csignal>
-#include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <map>
@@ -22,15 +20,19 @@
 #include <thread>
 
 #include "confinement/confinement.h"
-#include "support/spoken_to.h"
+#include "frames/record_codec.h"
+#include "ironmoat/limits.h"
+#include "support/child_server.h"
 
 namespace ironmoat {
 namespace {
 
+using namespace std::chrono_literals;
+using confinement::Part;
 using frames::Status;
-using testing::SpokenTo;
+using testing::ChildServer;
 
-/// By descriptor, for a user who may not search the folder that it is in.
+/// By its descriptor, for a user who has no access to its folder.
 void run(const char* program) {
   static char* const nothing[] = {nullptr};
   fexecve(open(program, O_RDONLY | O_CLOEXEC), nothing, nothing);
@@ -38,61 +40,60 @@ void run(const char* program) {
 void runService() { run(IRONMOAT_SERVICE); }
 void runTestServer() { run(TEST_SERVER); }
 
-/// Needs what a sanitizer does not stand.
-class FullyConfinedService : public ::testing::Test {
- protected:
-  void SetUp() override {
-    if (confinement::kSanitizedBuild) {
-      GTEST_SKIP() << "built with a sanitizer, which needs what the confinement takes";
-    }
-  }
-};
+bool isIn(std::uint32_t bits, Part part) { return (bits & static_cast<std::uint32_t>(part)) != 0; }
+bool hasRequiredParts(std::uint32_t bits) {
+  return (bits & confinement::kRequiredParts) == confinement::kRequiredParts;
+}
 
-std::string contents(const std::filesystem::path& file) {
-  std::ifstream in(file);
+std::string processFile(pid_t pid, const char* name) {
+  std::ifstream in("/proc/" + std::to_string(pid) + '/' + name);
   return {std::istreambuf_iterator(in), {}};
 }
 
-rlim_t limitOf(pid_t pid, __rlimit_resource resource) {
-  rlimit value = {};
-  EXPECT_EQ(prlimit(pid, resource, nullptr, &value), 0);
-  EXPECT_EQ(value.rlim_cur, value.rlim_max) << resource;
-  return value.rlim_max;
-}
+class SandboxedService : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    if (confinement::kSanitizedBuild) GTEST_SKIP() << "a sanitizer needs what the sandbox forbids";
+  }
+};
 
-TEST_F(FullyConfinedService, IsConfinedToTheKernelToo) {
-  SpokenTo service(runService);
+TEST_F(SandboxedService, HasItsSandboxInTheKernelToo) {
+  ChildServer service(runService);
   ASSERT_TRUE(service.receive());
-  for (const auto none : {RLIMIT_CORE, RLIMIT_FSIZE, RLIMIT_NOFILE, RLIMIT_NPROC}) {
-    EXPECT_EQ(limitOf(service.pid(), none), 0U) << none;
+  for (const auto& [resource, expected] :
+       std::map<__rlimit_resource, rlim_t>{{RLIMIT_CORE, 0},
+                                           {RLIMIT_FSIZE, 0},
+                                           {RLIMIT_NOFILE, 0},
+                                           {RLIMIT_NPROC, 0},
+                                           {RLIMIT_AS, confinement::kAddressSpace}}) {
+    rlimit value = {};
+    EXPECT_EQ(prlimit(service.pid(), resource, nullptr, &value), 0);
+    EXPECT_EQ(value.rlim_max, expected) << resource;
+    EXPECT_EQ(value.rlim_cur, expected) << resource;
   }
-  EXPECT_EQ(limitOf(service.pid(), RLIMIT_AS), confinement::kAddressSpace);
-  int threads = 0;
-  const auto process = std::filesystem::path("/proc") / std::to_string(service.pid());
-  for (const auto& thread : std::filesystem::directory_iterator(process / "task")) {
-    const std::string status = contents(thread.path() / "status");
-    EXPECT_NE(status.find("\nSeccomp:\t2\n"), std::string::npos) << status;
-    EXPECT_NE(status.find("\nNoNewPrivs:\t1\n"), std::string::npos) << status;
-    ++threads;
+  const std::string status = processFile(service.pid(), "status");
+  const std::string none = "\t0000000000000000\n";
+  for (const std::string& line :
+       {std::string("Seccomp:\t2\n"), std::string("NoNewPrivs:\t1\n"), std::string("Threads:\t1\n"),
+        "CapPrm:" + none, "CapEff:" + none, "CapInh:" + none, "CapAmb:" + none}) {
+    EXPECT_NE(status.find('\n' + line), std::string::npos) << line << status;
   }
-  EXPECT_EQ(threads, 1);
 }
 
-TEST_F(FullyConfinedService, WorksAsAnOrdinaryUser) {
+TEST_F(SandboxedService, HasItsSandboxWhenAnOrdinaryUserStartsIt) {
   if (geteuid() != 0) GTEST_SKIP() << "the other tests show it: this user is an ordinary one";
   constexpr id_t kNobody = 65534;
-  SpokenTo service([] {
+  ChildServer service([] {
     if (setgroups(0, nullptr) == 0 && setgid(kNobody) == 0 && setuid(kNobody) == 0) runService();
   });
-  const std::uint32_t bits = service.reportedConfinement();
-  EXPECT_EQ(bits & confinement::kRequiredParts, confinement::kRequiredParts);
-  // What can be traced belongs to its user.
+  EXPECT_TRUE(hasRequiredParts(service.reportedParts()));
+  // A process that can be traced belongs to its user.
   struct stat info = {};
   ASSERT_EQ(stat(("/proc/" + std::to_string(service.pid()) + "/mem").c_str(), &info), 0);
   EXPECT_EQ(info.st_uid, 0U);
 }
 
-TEST_F(FullyConfinedService, RefusesToServeUnconfined) {
+TEST_F(SandboxedService, ExitsWithNumberOfPartThatIsUnavailable) {
   struct Denied {
     int call;
     unsigned argument;
@@ -110,59 +111,52 @@ TEST_F(FullyConfinedService, RefusesToServeUnconfined) {
            Denied{SCMP_SYS(prlimit64), 1, RLIMIT_AS, 71},
            Denied{SCMP_SYS(prctl), 0, PR_SET_PDEATHSIG, 73},
        }) {
-    SpokenTo service([&] {
+    ChildServer service([&] {
       scmp_filter_ctx filter = seccomp_init(SCMP_ACT_ALLOW);
       const scmp_arg_cmp same = {denied.argument, SCMP_CMP_EQ, denied.value, 0};
       seccomp_rule_add_array(filter, SCMP_ACT_ERRNO(EPERM), denied.call, 1, &same);
       if (seccomp_load(filter) == 0) runService();
     });
-    EXPECT_FALSE(service.receive()) << "greeted without " << denied.status;
-    const int status = service.end();
-    EXPECT_TRUE(WIFEXITED(status));
-    EXPECT_EQ(WEXITSTATUS(status), denied.status);
+    EXPECT_FALSE(service.receive()) << "sent a hello without " << denied.status;
+    EXPECT_EQ(service.end(), W_EXITCODE(denied.status, 0));
   }
 }
 
-TEST(ConfinedService, EndsWithTheThreadThatStartedIt) {
-  std::unique_ptr<SpokenTo> service;
-  std::thread starter([&] {
-    service = std::make_unique<SpokenTo>(runService);
+TEST(Service, EndsWithThreadThatStartedIt) {
+  std::unique_ptr<ChildServer> service;
+  std::thread([&] {
+    service = std::make_unique<ChildServer>(runService);
     EXPECT_TRUE(service->receive());
-  });
-  starter.join();
-  const int status = service->end();
-  EXPECT_TRUE(WIFSIGNALED(status) && WTERMSIG(status) == SIGKILL);
+  }).join();
+  EXPECT_EQ(service->end(), W_EXITCODE(0, SIGKILL));
 }
 
-TEST_F(FullyConfinedService, RejectsWhatItHasNoMemoryForAndGoesOn) {
-  SpokenTo server(runTestServer);
-  EXPECT_NE(server.reportedConfinement() & static_cast<unsigned>(confinement::Part::fullMemory),
-            0U);
+TEST_F(SandboxedService, RejectsMessageThatExceedsItsMemoryAndServesTheNext) {
+  ChildServer server(runTestServer);
+  EXPECT_TRUE(isIn(server.reportedParts(), Part::fullMemory));
   for (std::uint64_t id = 0; id < 12; ++id) {
-    server.request(id, id % 3 == 0 ? "hold 1024" : "hold 600");
+    const bool fits = id % 3 != 0;
+    server.request(id, fits ? "hold 600" : "hold 1024");
     const auto body = server.receive();
     ASSERT_TRUE(body) << id;
     const frames::Reply reply = frames::parseReply(*body);
-    if (id % 3 == 0) {
-      ASSERT_EQ(reply.status, Status::refused) << id;
-      EXPECT_EQ(frames::parseRefusal(reply.body).kind(), DecodingError::Kind::notEnoughMemory);
-    } else {
-      EXPECT_EQ(reply.status, Status::record) << id;
-    }
+    ASSERT_EQ(reply.status, fits ? Status::record : Status::refused) << id;
+    if (fits) continue;
+    EXPECT_EQ(frames::parseRefusal(reply.body).kind(), DecodingError::Kind::notEnoughMemory);
   }
   server.endInput();
   EXPECT_EQ(server.end(), 0);
 }
 
-TEST_F(FullyConfinedService, TellsOfAnInheritedLimitOnItsMemory) {
-  SpokenTo server([] {
+TEST_F(SandboxedService, ReportsThatItInheritedALowerLimitOnMemory) {
+  ChildServer server([] {
     const rlimit half = {confinement::kAddressSpace / 2, confinement::kAddressSpace / 2};
     setrlimit(RLIMIT_AS, &half);
     runTestServer();
   });
-  const std::uint32_t bits = server.reportedConfinement();
-  EXPECT_EQ(bits & confinement::kRequiredParts, confinement::kRequiredParts);
-  EXPECT_EQ(bits & static_cast<unsigned>(confinement::Part::fullMemory), 0U);
+  const std::uint32_t bits = server.reportedParts();
+  EXPECT_TRUE(hasRequiredParts(bits));
+  EXPECT_FALSE(isIn(bits, Part::fullMemory));
 }
 
 /// How often `text` is found in the memory of a process, which only root may read.
@@ -187,31 +181,30 @@ std::size_t occurrences(pid_t pid, const std::string& text) {
   return found;
 }
 
-TEST_F(FullyConfinedService, ForgetsMessagesWhenItIsIdle) {
+TEST_F(SandboxedService, WipesMessagesFromItsMemoryWhenIdle) {
   if (geteuid() != 0) GTEST_SKIP() << "needs the right to read another process's memory";
-  SpokenTo service(runService);
+  ChildServer service(runService);
   ASSERT_TRUE(service.receive());
   const std::string mark = "a text that is nowhere else: ";
-  std::uint64_t id = 0;
   for (const std::size_t size : {10, 100, 1000, 5000, 40'000, 70'000, 1'000'000, 300, 20}) {
     std::string text;
     while (text.size() < size) text += mark;
-    for (const char* entity : {"", "&amp;"}) {  // literal, and transformed
-      service.request(++id, "<plist><dict><key>c</key><integer>1</integer><key>qai</key><string>" +
-                                text + entity + "</string></dict></plist>");
-      ASSERT_TRUE(service.receive());
-      service.request(++id, "<plist><dict><key>" + text + "</key><true/></dict></plist>");
+    for (const std::string& entries :
+         {"<key>" + text + "</key><true/>",
+          "<key>c</key><integer>1</integer><key>qai</key><string>" + text + "</string>",
+          "<key>c</key><integer>1</integer><key>qai</key><string>" + text + "&amp;</string>"}) {
+      service.request(1, "<plist><dict>" + entries + "</dict></plist>");
       ASSERT_TRUE(service.receive());
     }
   }
   EXPECT_GT(occurrences(service.pid(), mark), 0U) << "the search works";
-  std::this_thread::sleep_for(std::chrono::milliseconds(1300));
+  std::this_thread::sleep_for(1300ms);
   EXPECT_EQ(occurrences(service.pid(), mark), 0U);
 }
 
-/// All that comes back for `input`, by its id, from the hello to the end in order.
+/// All replies to `input`, by their ids.
 std::map<std::uint64_t, frames::Reply> replies(std::string_view input) {
-  SpokenTo service(runService);
+  ChildServer service(runService);
   EXPECT_TRUE(service.receive());
   service.send(input);
   service.endInput();
@@ -224,6 +217,7 @@ std::map<std::uint64_t, frames::Reply> replies(std::string_view input) {
   EXPECT_EQ(service.end(), 0);
   return all;
 }
+
 std::string request(std::uint64_t id, std::string_view type = VeskCommandResponse::schemaName) {
   BlockBuilder out;
   frames::appendRequest(out, id, type,
@@ -231,7 +225,7 @@ std::string request(std::uint64_t id, std::string_view type = VeskCommandRespons
   return {out.bytes(), out.size()};
 }
 
-TEST(ConfinedService, BadRequestsGetAnErrorAndTheNextIsServed) {
+TEST(Service, AnswersInvalidRequestWithErrorAndServesTheNext) {
   std::string lyingName = request(8);
   lyingName[12] = '\xFF';                            // longer than the frame
   const std::string tiny("\x03\x00\x00\x00xyz", 7);  // too short for an id
@@ -242,7 +236,7 @@ TEST(ConfinedService, BadRequestsGetAnErrorAndTheNextIsServed) {
   EXPECT_EQ(all.at(9).status, Status::record);
 }
 
-TEST(ConfinedService, OverLongAndCutFramesEndTheConnectionInOrder) {
+TEST(Service, EndsInOrderWhenAFrameIsTooLongOrTruncated) {
   const std::string whole = request(1);
   const std::string tooLong = std::string(4, '\xFF') + std::string(100'000, 'x');
   const auto all = replies(whole + tooLong + request(2));
@@ -253,26 +247,64 @@ TEST(ConfinedService, OverLongAndCutFramesEndTheConnectionInOrder) {
   }
 }
 
-TEST(ConfinedService, NonBlockingDescriptorsAndStopsDoNotMatter) {
-  SpokenTo server(runTestServer, O_NONBLOCK);
+TEST(Service, EndsInOrderWhenItsPeerStopsReading) {
+  ChildServer service(runService);
+  service.endOutput();
+  service.send(request(1));
+  EXPECT_EQ(service.end(), 0);
+}
+
+TEST(Service, ServesThroughNonBlockingPipesWhileItIsStoppedAndContinued) {
+  ChildServer server(runTestServer, ChildServer::Connection::nonBlockingPipes);
   ASSERT_TRUE(server.receive());
-  const std::string large(std::size_t{8} << 20, 'x');
-  server.request(1, large);
-  const auto stopAndGo = [&] {
+  const auto stopAndContinue = [&] {
     for (int i = 0; i < 5; ++i) {
-      std::this_thread::sleep_for(std::chrono::milliseconds(5));
+      std::this_thread::sleep_for(5ms);
       kill(server.pid(), SIGSTOP);
       kill(server.pid(), SIGCONT);
     }
   };
-  stopAndGo();  // as it waits to write, more than a pipe holds
+  const std::string large(std::size_t{8} << 20, 'x');
+  server.request(1, large);
+  stopAndContinue();  // while it waits to write, more than a pipe holds
   const auto reply = server.receive();
   ASSERT_TRUE(reply);
   EXPECT_GT(reply->size(), large.size());
-  stopAndGo();  // as it waits to read
+  stopAndContinue();  // while it waits to read
   server.request(2, "hold 1");
   EXPECT_TRUE(server.receive());
   server.endInput();
+  EXPECT_EQ(server.end(), 0);
+}
+
+/// Both directions of the connection are full, and stay so for most of the replies.
+TEST(Service, NeitherGrowsNorGivesUpWhenItsPeerHardlyReads) {
+  constexpr int kRequests = 48;
+  constexpr std::size_t kMaxPeak = confinement::kSanitizedBuild ? 4096 : 256;  // MiB
+  ChildServer server(runTestServer);
+  BlockBuilder requests;
+  for (int id = 0; id < kRequests; ++id) {
+    std::string message = "tell " + std::to_string(id) + ' ';
+    message.resize(std::size_t{2} << 20, 'x');
+    frames::appendRequest(requests, static_cast<std::uint64_t>(id), VeskCommandResponse::schemaName,
+                          message);
+  }
+  const std::string_view rest = server.send({requests.bytes(), requests.size()}, 500);
+  EXPECT_GT(rest.size(), requests.size() / 2) << "it read on, with its replies unread";
+  ASSERT_TRUE(server.receive()) << "the hello";
+  std::thread sender([&] { EXPECT_EQ(server.send(rest), ""); });
+  for (int id = 0; id < kRequests; ++id) {
+    const auto body = server.receive();
+    if (!body) break;  // which the sender reports
+    const auto record = frames::decodeRecord<VeskCommandResponse>(frames::parseReply(*body).body);
+    EXPECT_EQ(record.command, id);
+    EXPECT_EQ(record.token.value().size(), std::size_t{2} << 20);
+    std::this_thread::sleep_for(5ms);
+  }
+  const std::string status = processFile(server.pid(), "status");
+  EXPECT_LT(std::stoul(status.substr(status.find("VmHWM:") + 6)) >> 10, kMaxPeak);
+  server.endInput();
+  sender.join();
   EXPECT_EQ(server.end(), 0);
 }
 
