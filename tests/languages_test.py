@@ -1,9 +1,9 @@
-"""The clients in examples/go and examples/rust, built with what is generated from records.json: all
-test vectors, a service that dies, and one that lies.
+"""The clients in examples/python, examples/go and examples/rust, the latter two built with types that
+are generated from records.json: all test vectors, a service that dies, and one that lies.
 
-    languages_test.py go|rust BUILD_FOLDER SERVICE TEST_SERVER
+    languages_test.py python|go|rust BUILD_FOLDER SERVICE TEST_SERVER
 
-Exits with 77 when there is no compiler.
+Exits with 77 if there is no compiler.
 """
 
 import json
@@ -17,6 +17,7 @@ import unittest
 
 import vectors_test
 
+ironmoat = vectors_test.ironmoat
 ROOT = vectors_test.ROOT
 LANGUAGE, BUILD, SERVICE, TEST_SERVER = sys.argv[1], *map(pathlib.Path, sys.argv[2:5])
 PROGRAM = BUILD / LANGUAGE / "unpack_messages"
@@ -41,6 +42,12 @@ def build(compiler):
 
 def outcomes(service, requests):
     """Of {output type, file}, in their order."""
+    if LANGUAGE == "python":
+        client = ironmoat.Client(service, vectors_test.RECORDS, 5, vectors_test.SANITIZED)
+        answers = client.unpack([(output_type, pathlib.Path(file).read_bytes())
+                                 for output_type, file in requests])
+        client.close()
+        return list(map(vectors_test.shown, answers))
     lines = "".join(f"{output_type} {file}\n" for output_type, file in requests)
     result = subprocess.run([PROGRAM, service, str(vectors_test.SANITIZED)], input=lines.encode(),
                             stdout=subprocess.PIPE, check=True, timeout=100)
@@ -60,7 +67,7 @@ def outcomes_of_bytes(service, requests):
 class Language(unittest.TestCase):
     maxDiff = 2000
 
-    def test_vectors(self):
+    def test_gets_the_outcomes_of_the_vectors(self):
         requests = [(entry, file) for entry in vectors_test.ENTRIES for file in entry["files"]]
         answers = outcomes(SERVICE, [(entry["outputType"], vectors_test.VECTORS / file)
                                      for entry, file in requests])
@@ -68,11 +75,11 @@ class Language(unittest.TestCase):
             with self.subTest(file):
                 self.assertEqual(vectors_test.comparable(answer, entry), vectors_test.outcome(entry))
 
-    def test_a_message_over_the_limit(self):
+    def test_gets_a_rejection_for_a_message_over_the_limit(self):
         answer, = outcomes_of_bytes(SERVICE, [(vectors_test.RESPONSE, b"x" * (17 << 20))])
         self.assertEqual(answer["error"]["kind"], "limitExceeded")
 
-    def test_the_message_at_fault_fails_alone(self):
+    def test_fails_only_the_message_that_kills_or_stalls_the_service(self):
         messages = [b"a 1", b"crash 2", b"b 3", b"stall 4", b"c 5"]
         answers = outcomes_of_bytes(
             TEST_SERVER, [(vectors_test.RESPONSE, message) for message in messages])
@@ -80,7 +87,7 @@ class Language(unittest.TestCase):
         self.assertEqual(commands, [1, None, 3, None, 5])
         self.assertTrue(all("failure" in answers[place] for place in (1, 3)))
 
-    def test_replies_that_lie(self):
+    def test_rejects_replies_that_violate_the_protocol(self):
         good = [(vectors_test.RESPONSE, b"\0\x01\0" + bytes(8)),
                 (vectors_test.PAYLOAD, vectors_test.nested_payloads(512)),
                 (vectors_test.RESPONSE, b"\1\5" + vectors_test.REFUSAL[2:] + b"why"),
@@ -97,10 +104,11 @@ class Language(unittest.TestCase):
 
 
 if __name__ == "__main__":
-    found = shutil.which("go" if LANGUAGE == "go" else "rustc")
-    if not found:
-        print(f"skipped: no compiler for {LANGUAGE} is installed")
-        sys.exit(77)
-    build(found)
-    sys.setrecursionlimit(10_000)  # for what is nested deep
+    if LANGUAGE != "python":
+        found = shutil.which("go" if LANGUAGE == "go" else "rustc")
+        if not found:
+            print(f"skipped: no compiler for {LANGUAGE} is installed")
+            sys.exit(77)
+        build(found)
+    sys.setrecursionlimit(10_000)  # for records of 512 levels
     unittest.main(argv=sys.argv[:1])
