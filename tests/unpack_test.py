@@ -70,7 +70,7 @@ class InFolder(unittest.TestCase):
 
 
 class CommandLine(InFolder):
-    def test_prints_a_line_for_each_file_and_exits_with_the_highest_status(self):
+    def test_prints_line_for_each_file_and_exits_with_highest_status(self):
         good = '{"file": "good", "record": {"command": 5, "applicationId": "é"}}\n'
         bad = ('{"file": "bad", "error": {"kind": "typeMismatch", "path": "U", '
                f'"message": "expected data, found string", "offset": {BAD.index(b"<string>")}, '
@@ -83,7 +83,7 @@ class CommandLine(InFolder):
                 (["missing", "good", ".", "bad"], 2, missing + good + folder + bad)):
             self.expect(unpack("--format=json", *files), status, output)
 
-    def test_reads_the_files_that_it_is_told_to(self):
+    def test_reads_named_files_in_order_and_folders_and_lists_when_asked(self):
         for name in ("spool/b", "spool/a/z", "spool/a/y", "spool/-", "two\nlines"):
             self.write(name, GOOD)
         os.symlink("../good", "spool/link")
@@ -102,7 +102,7 @@ class CommandLine(InFolder):
         for arguments in (["-", "-"], ["-", "--files-from=-"], ["--files-from=missing"]):
             self.assertEqual(unpack(*arguments, input=b"good").returncode, 2)
 
-    def test_reads_nothing_when_usage_is_wrong(self):
+    def test_reads_nothing_when_option_is_unknown(self):
         self.expect(unpack("good", "--nonsense"), 2, "", "vesk-unpack: not a valid option: "
                     "'--nonsense'\nTry 'vesk-unpack --help'.\n")
 
@@ -113,16 +113,19 @@ class CommandLine(InFolder):
             self.assertEqual((result.returncode, result.stderr), (0, b""))
             self.assertRegex(result.stdout, b"^" + text + b"$")
 
-    def test_says_why_there_is_no_service(self):
-        self.write("lacks", b"#!/bin/sh\nexit 65\n", 0o755)
-        for program, why in (("/nonexistent/service", "No such file"), ("/bin/true", "status 0"),
-                             ("./lacks", "no new privileges")):
+    def test_reports_why_service_is_unavailable(self):
+        script = b"#!/bin/sh\nprintf 'last ~\\177' >&2; exit %d\n"
+        for status, why in ((64, "system call filter"), (73, "ends with parent"),
+                            (77, "full memory"), (78, "exited with status 78 (last ~")):
+            self.write(f"exits{status}", script % status, 0o755)
+            self.assertIn(why, lines("--service", f"./exits{status}", "good")[0]["error"]["message"])
+        for program, why in (("/nonexistent/service", "No such file"), ("/bin/true", "status 0")):
             for line in lines("--service", program, "good", "bad"):
                 self.assertEqual(line["error"]["kind"], "unavailable")
                 self.assertIn(why, line["error"]["message"])
             self.assertEqual(unpack("--service", program, "good").returncode, 2)
 
-    def test_starts_no_service_that_others_can_replace(self):
+    def test_starts_no_service_that_other_users_can_replace(self):
         self.write("open/VeskIronmoatService", b"#!/bin/sh\ntouch ran\n", 0o755)
         os.chmod("open", 0o777)
         tool = os.path.abspath(shutil.copy(TOOL, "open"))
@@ -136,7 +139,7 @@ class CommandLine(InFolder):
                 self.assertIn(b"../good", result.stdout + result.stderr)
         self.assertFalse(os.path.exists("ran") or os.path.exists("open/ran"))
 
-    def test_rejects_messages_that_are_too_long_without_reading_them_whole(self):
+    def test_rejects_too_long_message_without_reading_it_whole(self):
         for name, size in (("huge", 5 << 30), ("longest", MESSAGE_BYTES)):
             self.write(name, b"")
             os.truncate(name, size)
@@ -145,12 +148,12 @@ class CommandLine(InFolder):
         self.assertEqual([(each["kind"], each["message"]) for each in errors[:2]], [too_long] * 2)
         self.assertEqual(errors[2]["kind"], "malformed")
 
-    def test_takes_file_names_that_are_not_text(self):
+    def test_accepts_file_name_that_is_not_text(self):
         self.write(b'n\xff\n"\xc3\xa9\x1b', binary({"c": 1}))
         self.assertEqual(lines(b'n\xff\n"\xc3\xa9\x1b'),
                          [{"file": 'n\ufffd\n"é\x1b', "record": {"command": 1}}])
 
-    def test_fails_when_output_cannot_be_written(self):
+    def test_exits_with_2_when_output_cannot_be_written(self):
         for arguments in (["good"], ["good", "bad"], ["--help"]):
             with open("/dev/full", "wb") as full:
                 result = unpack(*arguments, stdout=full)
@@ -159,9 +162,9 @@ class CommandLine(InFolder):
 
 
 class Companions(unittest.TestCase):
-    """The man page and the completions know what the tool does."""
+    """The man page and the shell completions."""
 
-    def test_know_all_options(self):
+    def test_list_all_options(self):
         options = set(re.findall(r"^  (--[a-z-]+)", unpack("--help").stdout.decode(), re.MULTILINE))
         self.assertGreater(len(options), 8)
         page = (PROJECT / "doc/man/vesk-unpack.1").read_text().replace("Fl Fl ", "--")
@@ -177,7 +180,7 @@ class Companions(unittest.TestCase):
             ["bash", "-c", script, "bash", PROJECT / "packaging/completion/vesk-unpack.bash",
              "vesk-unpack", *words], cwd=PROJECT / "examples", text=True).split()
 
-    def test_complete_values(self):
+    def test_complete_values_of_options(self):
         types = ["payload", "command-response", "web-tunnel-response"]
         for words, expected in (
                 (["--type", ""], [*types, "auto"]), (["--type", "=", "pay"], ["payload"]),
@@ -187,9 +190,9 @@ class Companions(unittest.TestCase):
 
 
 class Positions(InFolder):
-    """The tool shows where a message is wrong alike for both formats and all encodings."""
+    """Of errors, in both formats and all encodings."""
 
-    def test_are_those_of_the_value_at_fault_in_text(self):
+    def test_are_line_and_column_of_value_at_fault_in_text(self):
         body = ('<plist version=">1"><dict><!-- <dict> --><key>c</key><integer>5</integer>'
                 '<key><![CDATA[<s>]]></key><?a <b>?><array ><data/><true/></array>'
                 '<key>é&lt;</key><dict/>\n%s</dict></plist>')
@@ -208,7 +211,7 @@ class Positions(InFolder):
                     "kind": kind, "path": path, "offset": len((mark + ahead).encode(encoding)),
                     "line": 1 + ahead.count("\n"), "column": len(ahead) - ahead.rindex("\n")})
 
-    def test_are_offsets_of_the_value_at_fault_in_binary_messages(self):
+    def test_are_offset_of_value_at_fault_in_binary_message(self):
         filler = {str(number): number for number in range(300)}  # for offsets of two bytes
         for message, path, marker in (({"c": 5, "U": "found me"}, "U", b"\x58found me"),
                                       ({"c": 5, "s": 2**64 - 1}, "s", b"\x14" + bytes(8)),
@@ -218,7 +221,7 @@ class Positions(InFolder):
             self.assertEqual((found["path"], found["offset"]), (path, content.index(marker)))
             self.assertNotIn("line", found)
 
-    def test_come_with_a_hint_when_a_key_differs_only_in_case(self):
+    def test_come_with_hint_when_key_differs_only_in_case(self):
         for message, hinted in (({"C": 5}, True), ({"d": 1, "cc": 1, "\u0421": 1}, False)):
             for content in (binary(message), xml(message)):
                 found = error(content)
@@ -227,7 +230,7 @@ class Positions(InFolder):
 
 
 class Types(InFolder):
-    def test_have_the_schemas_of_the_tables(self):
+    def test_have_schemas_of_the_tables(self):
         page = json.loads((PROJECT / "doc/records.json").read_text())["records"]
 
         def reached(name):
@@ -246,7 +249,7 @@ class Types(InFolder):
             self.assertEqual(sum(line.startswith("  ") for line in text.splitlines()),
                              sum(len(record["fields"]) for record in records))
 
-    def test_are_chosen_by_auto_for_the_record_that_got_most(self):
+    def test_auto_takes_record_with_most_values(self):
         rows = [
             ({"c": 5}, "command-response", ["web-tunnel-response", "payload"]),
             ({"c": 5, "i": 7}, "command-response", ["web-tunnel-response"]),
@@ -262,7 +265,7 @@ class Types(InFolder):
         self.expect(unpack("--type=auto", "0"), 0,
                     "0 (command-response; also fits: web-tunnel-response, payload)\n  command  5\n")
 
-    def test_are_all_reported_when_none_fits(self):
+    def test_auto_reports_all_rejections_when_they_differ(self):
         found = error(xml({"c": 5, "i": True}), "--type=auto")
         self.assertEqual(found["kind"], "noTypeFits")
         self.assertEqual([(each["type"], each["path"], each["message"]) for each in found["types"]],
@@ -274,17 +277,17 @@ class Types(InFolder):
             found = error(content, "--type=auto", *service)  # the same for all types
             self.assertEqual((found["kind"], "types" in found), (kind, False))
 
-    def test_are_hinted_at_when_none_is_given(self):
+    def test_are_hinted_at_when_default_type_rejects(self):
         hint = "(decoded as payload; --type auto tries all types)\n"
-        for arguments, hinted in (([], True), (["--type=payload"], False), (["good"], False),
-                                  (["--format=json"], False), (["--summary"], False),
-                                  (["missing"], False)):
+        for arguments, hinted in (
+                ([], True), (["bad", "good"], True), (["--type=payload"], False), (["good"], False),
+                (["--format=json"], False), (["--summary"], False), (["missing"], False)):
             result = run(TOOL, *arguments, input=xml({"C": 5}))
             self.assertEqual(result.stderr.decode().endswith(hint), hinted)
 
 
 class Output(InFolder):
-    def test_is_only_the_exit_status_or_a_summary_when_asked_for(self):
+    def test_is_exit_status_or_summary_only_when_asked(self):
         self.write("junk", b"")
         for files, status in ((["good"], 0), (["good", "bad"], 1), (["bad", "missing"], 2)):
             self.expect(unpack("--quiet", *files), status, "")
@@ -302,11 +305,11 @@ $""")
             "messages": 14, "accepted": 10, "types": {"command-response": 10},
             "errors": {"malformed": 1, "typeMismatch": 2, "unreadable": 1}, "bytes": 10 * len(GOOD) + 2 * len(BAD)})
 
-    def test_keeps_integers_exact_when_asked_to(self):
+    def test_has_integers_as_strings_when_asked(self):
         line, = lines("--exact-integers", input=binary({"c": 5, "i": 2**63 - 1}))
         self.assertEqual(line["record"], {"command": "5", "messageId": "9223372036854775807"})
 
-    def test_shows_records_and_rejections_as_text(self):
+    def test_shows_records_and_rejections_in_order_as_text(self):
         self.write("good", xml({"c": 5, "U": bytes(range(16)), "qai": "a.b", "qrss": False}))
         record = ("good\n"
                   "  command        5\n"
@@ -323,7 +326,7 @@ $""")
             "vesk-unpack: missing: unreadable: No such file or directory\n"
             "\n" + record)
 
-    def test_holds_nothing_of_the_sender_that_controls_a_terminal(self):
+    def test_escapes_senders_text_that_would_control_a_terminal(self):
         nasty = "\x1b]0;owned\x07\x9b2J\r\n\u202e" + "a" * 10_000
         names = [f"\x1b[31m{name}\n" for name in ("good", "bad", "missing")]
         self.write(names[0], binary({"c": 5, "qai": nasty, "\x1b[2J": 1}))
@@ -349,20 +352,23 @@ $""")
             process.wait(timeout=60)
         return output.decode().replace("\r\n", "\n")
 
-    def test_has_colours_on_a_terminal_only(self):
+    def test_has_colours_on_terminal_only(self):
         self.assertIn("\x1b[", self.on_terminal("good", "missing"))
         for environment in ({"NO_COLOR": "1"}, {"TERM": "dumb"}):
             self.assertNotIn("\x1b", self.on_terminal("good", "missing", **environment))
         self.assertNotIn("\x1b[", self.on_terminal("--format=json", "good"))
 
-    def test_wraps_descriptions_at_the_width_of_the_terminal(self):
+    def test_wraps_descriptions_at_width_of_terminal(self):
         for columns, words in ((40, ":\n    expected data, found string"),
                                (64, ": expected data, found string"),
                                (63, ": expected data, found\n    string")):
             shown = self.on_terminal("bad", columns=columns, NO_COLOR="1")
             self.assertIn("vesk-unpack: bad: typeMismatch at U" + words + "\n  line 8", shown)
+        shown = self.on_terminal("--service=/bin/true", "good", columns=40, NO_COLOR="1").splitlines()
+        self.assertGreater(len(shown), 2)
+        self.assertLessEqual(max(map(len, shown)), 40)
 
-    def test_has_a_progress_line_on_a_terminal_that_goes_away(self):
+    def test_erases_progress_line_on_terminal(self):
         os.mkfifo("slow")
         feeder = threading.Timer(0.5, self.write, ("slow", GOOD))
         feeder.start()
@@ -371,6 +377,28 @@ $""")
         self.assertIn("1 of 2 messages", output)
         on_screen = re.sub(".*\r\x1b\\[K", "", output)
         self.assertNotIn("of 2 messages", on_screen)
+
+
+class SelfTest(InFolder):
+    def test_passes_for_the_service(self):
+        result = run(TOOL, "--self-test")
+        output = result.stdout.decode()
+        self.assertEqual((result.returncode, "NOT SAFE" in output), (0, False), output)
+        if "sanitizer" not in output:
+            self.assertGreater(output.count("killed by SIGSYS"), 8)
+
+    def test_fails_when_a_required_part_is_missing(self):
+        hello = b"IRONMOAT" + struct.pack("<HIQQQQI", 1, 0x3FFF ^ 2, *[0] * 5)
+        self.write("unsafe", f"#!{sys.executable}\nimport sys\n"
+                   f"sys.stdout.buffer.write({bytes([len(hello), 0, 0, 0]) + hello})\n".encode(), 0o755)
+        result = run(TOOL, "--self-test", "--service", "./unsafe")
+        self.assertEqual(result.returncode, 1)
+        self.assertEqual(re.findall("(.*\\S) +no +<-- NOT SAFE", result.stdout.decode()),
+                         ["  no new privileges"])
+
+    def test_exits_with_2_when_there_is_no_service(self):
+        for program in ("/nonexistent/service", "/bin/true"):
+            self.assertEqual(run(TOOL, "--self-test", "--service", program).returncode, 2)
 
 
 if __name__ == "__main__":

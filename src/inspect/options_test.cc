@@ -8,7 +8,7 @@
 namespace ironmoat::inspect {
 namespace {
 
-/// All that differs from the default, or the error.
+/// All options that differ from the default, or the error.
 std::string parsed(const std::vector<const char*>& arguments) {
   try {
     const Options options = parseOptions(arguments);
@@ -29,7 +29,7 @@ std::string parsed(const std::vector<const char*>& arguments) {
   }
 }
 
-TEST(Options, AreParsedOrRejectedByName) {
+TEST(Options, AreParsedOrRejectedWithTheirName) {
   const std::pair<std::vector<const char*>, std::string> rows[] = {
       {{}, "payload [-]"},
       {{"a", "-", "b"}, "payload [a] [-] [b]"},

@@ -11,7 +11,7 @@
 
 namespace ironmoat::inspect {
 
-// A field of each type that records have.
+// Fields of all types that records have.
 
 struct PartArguments {
   Optional<String> name;
@@ -32,7 +32,7 @@ struct WholeArguments {
   Optional<Data> bytes;
   Optional<List<String>> texts;
   Optional<Part> part;
-  List<Whole> listOfWholes;  // a long name, which widens no column while it is left out
+  List<Whole> listOfWholes;  // the longest name: widens the column only when it is shown
 
   using R = WholeArguments;
   using Fields = FieldList<R, &R::command, &R::time, &R::flag, &R::text, &R::bytes, &R::texts,
@@ -66,7 +66,7 @@ std::string view(const Whole& whole, const Style& style = {}) {
   return out;
 }
 
-TEST(TextView, AlignsFieldsAndIndentsNestedOnes) {
+TEST(TextView, AlignsFieldsAndIndentsNestedFields) {
   EXPECT_EQ(view(fullRecord()),
             "  command       32\n"
             "  time          9007199254740993\n"
@@ -91,12 +91,14 @@ TEST(TextView, AlignsFieldsAndIndentsNestedOnes) {
 TEST(TextView, CutsAndWrapsLongValues) {
   Whole whole;
   whole.text = String("0123456789abc\n\xE6\xBC\xA2");
-  whole.bytes = Data("0123456789");
+  whole.bytes = Data(
+      "\x10\xFF\x1F\xA9"
+      "456789");
   EXPECT_EQ(view(whole, {.width = 24}),
             "  command  0\n"
             "  text     \"0123456789ab\n"
             "           c\\n\xE6\xBC\xA2\"\n"
-            "  bytes    30313233\n"
+            "  bytes    10ff1fa9\n"
             "           34353637 3839\n"
             "           (10 bytes)\n");
   const std::string xs(399, 'x');
@@ -109,7 +111,7 @@ TEST(TextView, CutsAndWrapsLongValues) {
                              "... the first 32 of 33 bytes\n");
 }
 
-TEST(TextView, ColoursLabelsAndLetsNoTextEndItsQuotes) {
+TEST(TextView, ColoursLabelsAndEscapesQuotes) {
   Whole whole;
   whole.text = String("\x1B[31m\" (4 bytes)\\");
   EXPECT_EQ(view(whole, {.colours = Colours::muted()}),
@@ -117,7 +119,7 @@ TEST(TextView, ColoursLabelsAndLetsNoTextEndItsQuotes) {
             "  \033[36mtext\033[0m     \"\\u{1b}[31m\\\" (4 bytes)\\\\\"\n");
 }
 
-TEST(JsonWriter, WritesRecordsWithExactIntegers) {
+TEST(JsonWriter, WritesIntegersAsStringsWhenAsked) {
   std::string out;
   JsonWriter(out, Integers::strings).value(fullRecord());
   EXPECT_EQ(out, R"({"command": "32", "time": "9007199254740993", "flag": true, )"
@@ -127,7 +129,7 @@ TEST(JsonWriter, WritesRecordsWithExactIntegers) {
                  R"({"command": "0", "texts": [], "listOfWholes": []}]})");
 }
 
-TEST(Text, IsEscapedWhereItWouldControlATerminal) {
+TEST(Text, IsEscapedWhenItWouldControlATerminal) {
   const struct {
     std::string_view text;
     std::string terminal;
@@ -142,7 +144,7 @@ TEST(Text, IsEscapedWhereItWouldControlATerminal) {
       {"\xC2\x80\xC2\x9B\x32J\xC2\x9F\xC2\xA0", "\\u{80}\\u{9b}2J\\u{9f}\xC2\xA0",
        "\\u0080\\u009b2J\\u009f\xC2\xA0"},
       {"\xE2\x80\xA8\xE2\x80\xA9", R"(\u{2028}\u{2029})", R"(\u2028\u2029)"},
-      // What is invisible or turns the reading direction.
+      // Invisible characters, and changes of the reading direction.
       {"\xE2\x80\xAE\x66\xE2\x80\x8B\xEF\xBB\xBF\xF3\xA0\x81\x81",
        R"(\u{202e}f\u{200b}\u{feff}\u{e0041})",
        "\xE2\x80\xAE\x66\xE2\x80\x8B\xEF\xBB\xBF\xF3\xA0\x81\x81"},
@@ -157,7 +159,7 @@ TEST(Text, IsEscapedWhereItWouldControlATerminal) {
   }
 }
 
-TEST(Text, IsWrappedAtSpacesThatFitTheWidthExactly) {
+TEST(Text, IsWrappedAtLastSpaceThatFits) {
   const struct {
     std::string_view text;
     std::size_t width;
@@ -184,7 +186,7 @@ std::string position(std::string_view message, std::uint64_t offset, std::size_t
   return out;
 }
 
-TEST(Position, IsALineAndAColumnOrAByteAndShowsWhatIsThere) {
+TEST(Position, IsLineAndColumnOrByteAndShowsBytesThere) {
   const struct {
     std::string_view message;
     std::uint64_t offset;
@@ -211,20 +213,19 @@ TEST(Position, IsALineAndAColumnOrAByteAndShowsWhatIsThere) {
       {"\xFF\xFE<\0>\0\n"sv, 4, "line 1, column 2\n  <>\xEF\xBF\xBD\n   ^\n"},
       {"bplist00\xD1\x01\x02QaQb"sv, 9,
        "byte 9 of 15\n  30 30 d1 01 02 51  |00...Q|\n           ^^\n", 30},
-      {"bplist00\xD1\x01"sv, 0,
-       "byte 0 of 10\n  62 70 6c 69 73 74 30 30 d1 01  |bplist00..|\n  ^^\n"},
+      {"bplist00~\x7F"sv, 0, "byte 0 of 10\n  62 70 6c 69 73 74 30 30 7e 7f  |bplist00~.|\n  ^^\n"},
   };
   for (const auto& row : rows) EXPECT_EQ(position(row.message, row.offset, row.width), row.shown);
 }
 
-TEST(Position, ShowsThePartOfALongLineThatFits) {
+TEST(Position, ShowsPartOfLineThatFitsWhenLineIsLong) {
   const std::string line = std::string(1000, 'a') + "!" + std::string(1000, 'b');
   EXPECT_EQ(position(line, 1000, 33),
             "line 1, column 1001\n  ...aaaaaaaaaaaaaaa!bbbbbbbb...\n                    ^\n");
   const std::string fits = "<a>" + std::string(19, 'b') + "<c/></a>";
   EXPECT_EQ(position(fits, 3, 33), "line 1, column 4\n  " + fits + "\n     ^\n");
   std::string marks = "a";
-  for (int i = 0; i < 3000; ++i) marks += "\xCC\x81";  // no columns at all
+  for (int i = 0; i < 3000; ++i) marks += "\xCC\x81";  // takes no column
   for (const std::string& wide : {marks, std::string(3000, '\xF0'), std::string(3000, '\x80')}) {
     EXPECT_LT(position(wide, 2001).size(), 600U);
   }
