@@ -32,7 +32,7 @@ std::string written(Append append) {
   return std::string(out.bytes(), out.size());
 }
 
-/// The error that a reply carries of `error`.
+/// `error` as a reply carries it.
 DecodingError carried(const DecodingError& error) {
   const auto reply = written([&](auto& out) { appendRefusal(out, 1, error); });
   return parseRefusal(parseReply(tightMessage(reply.substr(kLengthBytes))).body);
@@ -43,7 +43,7 @@ const std::string kHelloBody = "IRONMOAT\1\0\5\0\0\0\x08\x07\x06\x05\x04\x03\x02
 const std::string kRequestBody = "\x2A\0\0\0\0\0\0\x80\x05Type1<msg>"s;
 const std::string kRefusalBody = "\x07\0\0\0\0\0\0\0\1\2\x34\x12\0\0\0\0\0\0\x08\0mml[1].Uwhy"s;
 
-TEST(FrameTest, WhatIsParsedIsWhatWasAppended) {
+TEST(Frame, ParsesWhatWasAppended) {
   const Hello hello{5, 0x0102030405060708, 2, 3, 4, 512};
   EXPECT_EQ(written([&](auto& out) { appendHello(out, hello); }), frame(kHelloBody));
   EXPECT_EQ(parseHello(tightMessage(kHelloBody)), hello);
@@ -58,30 +58,30 @@ TEST(FrameTest, WhatIsParsedIsWhatWasAppended) {
             frame(number(1, 8) + "\3why"));
 }
 
-TEST(FrameTest, BrokenBodiesAreRefused) {
-  const auto hello = [](const Data& body) { (void)parseHello(body); };
-  const auto request = [](const Data& body) { (void)parseRequest(body); };
-  const auto reply = [](const Data& body) { (void)parseReply(body); };
-  const auto refusal = [](const Data& body) { (void)parseRefusal(body); };
-  const auto sentence = [](const Data& body) { (void)parseSentence(body); };
+template <auto Parse>
+void parse(const Data& body) {
+  static_cast<void>(Parse(body));
+}
+
+TEST(Frame, RejectsInvalidBodies) {
   const std::string refused = kRefusalBody.substr(9);
   const struct {
     void (*parse)(const Data&);
     std::string body;
-    std::size_t accepted;  // of the beginnings of the body, itself included
+    std::size_t accepted;  // of the prefixes of the body, itself included
   } rows[] = {
-      {hello, kHelloBody, 1},
-      {hello, "IRONMOAX" + kHelloBody.substr(8), 0},
-      {hello, "IRONMOAT\2\0"s + kHelloBody.substr(10), 0},
-      {request, kRequestBody, 1 + 5},
-      {request, number(1, 8) + "\0rest"s, 0},
-      {reply, kRefusalBody, 1 + refused.size()},
-      {reply, number(1, 8) + "\4", 0},
-      {refusal, refused, 1 + 3},
-      {refusal, "\7" + refused.substr(1), 0},
-      {refusal, "\0"s + number(0, 8) + "\1\0\xC3\xA9"s, 0},
-      {refusal, "\0"s + number(0, 8) + "\0\0\xC3"s, 1},
-      {sentence, "zero\0byte"s, 1 + 4},
+      {parse<parseHello>, kHelloBody, 1},
+      {parse<parseHello>, "IRONMOAX" + kHelloBody.substr(8), 0},
+      {parse<parseHello>, "IRONMOAT\2\0"s + kHelloBody.substr(10), 0},
+      {parse<parseRequest>, kRequestBody, 1 + 5},
+      {parse<parseRequest>, number(1, 8) + "\0rest"s, 0},
+      {parse<parseReply>, kRefusalBody, 1 + refused.size()},
+      {parse<parseReply>, number(1, 8) + "\4", 0},
+      {parse<parseRefusal>, refused, 1 + 3},
+      {parse<parseRefusal>, "\7" + refused.substr(1), 0},
+      {parse<parseRefusal>, "\0"s + number(0, 8) + "\1\0\xC3\xA9"s, 0},
+      {parse<parseRefusal>, "\0"s + number(0, 8) + "\0\0\xC3"s, 1},
+      {parse<parseSentence>, "zero\0byte"s, 1 + 4},
   };
   for (const auto& row : rows) {
     std::size_t accepted = 0;
@@ -94,14 +94,14 @@ TEST(FrameTest, BrokenBodiesAreRefused) {
     }
     EXPECT_EQ(accepted, row.accepted) << ::testing::PrintToString(row.body);
   }
-  EXPECT_NO_THROW(sentence(Data(std::string(65535, 'x'))));
-  EXPECT_THROW(sentence(Data(std::string(65536, 'x'))), FrameError);
+  EXPECT_NO_THROW(parse<parseSentence>(Data(std::string(65535, 'x'))));
+  EXPECT_THROW(parse<parseSentence>(Data(std::string(65536, 'x'))), FrameError);
   for (std::size_t i = 0; i < 8 + 1 + 5; ++i) {
     EXPECT_EQ(requestId(tightMessage(kRequestBody.substr(0, i))).has_value(), i >= 8) << i;
   }
 }
 
-TEST(FrameTest, WritersOnlyWriteWhatCanBeRead) {
+TEST(Frame, TruncatesTextAndRejectsWhatNoFrameCanHold) {
   const std::string path(65534, 'p');
   const DecodingError error = carried(DecodingError(Kind::malformed, path + "\xC3\xA9", "a\xFF z"));
   EXPECT_EQ(error.path(), path);
@@ -118,7 +118,7 @@ TEST(FrameTest, WritersOnlyWriteWhatCanBeRead) {
   endReply(out, start);
 }
 
-/// Feeds `stream` in pieces of at most `piece` bytes and takes out every body as soon as it can be.
+/// Feeds `stream` in pieces of at most `piece` bytes; returns each body as soon as it is whole.
 std::vector<Data> assembled(FrameAssembler& assembler, std::string_view stream, std::size_t piece) {
   std::vector<Data> bodies;
   while (!stream.empty()) {
@@ -133,10 +133,10 @@ std::vector<Data> assembled(FrameAssembler& assembler, std::string_view stream, 
   return bodies;
 }
 
-TEST(FrameAssemblerTest, BodiesDoNotDependOnHowTheyArriveAndOutliveTheAssembler) {
+TEST(FrameAssembler, SplitsFramesWhereverReadsEnd) {
   std::vector<Data> expected;
   std::string stream;
-  // Around the buffer's size, and runs of small frames before and behind large ones.
+  // Around the buffer's size, and small frames before and after large ones.
   for (const std::size_t size :
        {0, 1, 5, 65531, 65532, 65533, 3, 65536, 200000, 0, 0, 7, 40000, 40000, 100, 1000000, 1}) {
     const std::string body(size, static_cast<char>('a' + expected.size()));
@@ -157,20 +157,20 @@ TEST(FrameAssemblerTest, BodiesDoNotDependOnHowTheyArriveAndOutliveTheAssembler)
   }
 }
 
-TEST(FrameAssemblerTest, MemoryFollowsWhatCameNotWhatWasAnnounced) {
+TEST(FrameAssembler, AllocatesForBytesReceivedNotAnnounced) {
   FrameAssembler assembler(UINT32_MAX, Sharing::anyThread);
   EXPECT_TRUE(assembled(assembler, "\xFF\xFF\xFF\xFF+++"s, 7).empty());
-  std::size_t came = 3;
+  std::size_t received = 3;
   for (int i = 0; i < 8; ++i) {
     const std::size_t room = assembler.room().size();
-    EXPECT_LE(room, std::max<std::size_t>(65536, came));
+    EXPECT_LE(room, std::max<std::size_t>(65536, received));
     assembler.commit(room);
-    came += room;
+    received += room;
     EXPECT_FALSE(assembler.next().has_value());
   }
 }
 
-TEST(FrameAssemblerTest, AnnouncingTooMuchEndsTheConnection) {
+TEST(FrameAssembler, RejectsFrameThatExceedsLimit) {
   FrameAssembler assembler(10, Sharing::anyThread);
   EXPECT_EQ(assembled(assembler, frame("0123456789") + "\x0B\0\0"s, 100).size(), 1U);
   EXPECT_THROW(assembled(assembler, "\0"s, 100), FrameError);

@@ -30,9 +30,9 @@ std::string encoded(const R& record) {
   return std::string(out.bytes(), out.size());
 }
 
-/// What comes of bytes: nothing, or the sentence that they are refused with.
+/// The description of the error that rejects `body`; empty if it is encoded as it was.
 template <class R>
-std::string refusal(const std::string& body) {
+std::string rejection(const std::string& body) {
   try {
     EXPECT_EQ(encoded(decodeRecord<R>(tightMessage(body))), body);
     return "";
@@ -41,7 +41,7 @@ std::string refusal(const std::string& body) {
   }
 }
 
-TEST(RecordLayoutTest, IsAsDescribed) {
+TEST(RecordCodec, EncodesAsSpecified) {
   VeskCommandWebTunnelResponseArguments arguments;
   arguments.command = INT64_MIN + 42;
   arguments.contentType = String("a\xC3\xA9");
@@ -58,11 +58,11 @@ TEST(RecordLayoutTest, IsAsDescribed) {
   EXPECT_EQ(back.contentType->view().data(), body.view().data() + 14);  // not a copy
 }
 
-TEST(RecordLayoutTest, BytesThatBreakTheRulesAreRefused) {
+TEST(RecordCodec, RejectsInvalidBytes) {
   const std::string command = "\x2A\0\0\0\0\0\0\x80"s;
   const struct {
     std::string body;
-    std::string_view sentence;
+    std::string_view description;
   } rows[] = {
       {"", "unexpected end of record"},
       {"\0\0"s + command, "missing required field"},
@@ -76,11 +76,11 @@ TEST(RecordLayoutTest, BytesThatBreakTheRulesAreRefused) {
       {"\x05\0"s + command + "\3\0\0"s, "unexpected end of record"},
   };
   for (const auto& row : rows) {
-    EXPECT_EQ(refusal<Response>(row.body), row.sentence) << ::testing::PrintToString(row.body);
+    EXPECT_EQ(rejection<Response>(row.body), row.description) << ::testing::PrintToString(row.body);
   }
 }
 
-TEST(RecordLimitsTest, NeitherDepthNorCountsAreTheSenders) {
+TEST(RecordCodec, LimitsNestingAndElements) {
   const auto nested = [](std::uint32_t levels) {
     Payload record = Payload::with({});
     while (--levels > 0) {
@@ -90,38 +90,38 @@ TEST(RecordLimitsTest, NeitherDepthNorCountsAreTheSenders) {
     }
     return encoded(record);
   };
-  EXPECT_EQ(refusal<Payload>(nested(limits::nestedContainers)), "");
+  EXPECT_EQ(rejection<Payload>(nested(limits::nestedContainers)), "");
   EXPECT_THROW(static_cast<void>(nested(limits::nestedContainers + 1)), RecordError);
   const std::string two = nested(2);
   const std::string opening = two.substr(0, two.find(nested(1), 1));
   std::string deep;
   for (std::uint32_t i = 0; i < limits::nestedContainers; ++i) deep += opening;
-  EXPECT_EQ(refusal<Payload>(deep + nested(1)), "nesting exceeds the limit of 512 records");
+  EXPECT_EQ(rejection<Payload>(deep + nested(1)), "nesting exceeds the limit of 512 records");
   std::string announced = two;  // 255 elements, and the bytes of one
   announced.replace(opening.size() - 4, 4, "\xFF\0\0\0"s);
-  EXPECT_EQ(refusal<Payload>(announced), "list exceeds the rest of the record");
+  EXPECT_EQ(rejection<Payload>(announced), "list exceeds the rest of the record");
 }
 
-TEST(RecordLimitsTest, ListsAreBoundedByTheMemoryTheyTake) {
+TEST(RecordCodec, LimitsMemoryOfAllLists) {
   DrelUserPayloadArguments arguments;
-  arguments.dstIdTokenList.push_back(Payload::with({}));  // counts with those of the other list
-  const std::size_t most = limits::recordBytes / sizeof(Payload);
-  while (arguments.corvelMessageList.size() < most - 1) {
+  arguments.dstIdTokenList.push_back(Payload::with({}));  // counts with the other list
+  const std::size_t max = limits::recordBytes / sizeof(Payload);
+  while (arguments.corvelMessageList.size() < max - 1) {
     arguments.corvelMessageList.push_back(Payload::with({}));
   }
-  EXPECT_EQ(refusal<Payload>(encoded(Payload::with(arguments))), "");
+  EXPECT_EQ(rejection<Payload>(encoded(Payload::with(arguments))), "");
   arguments.corvelMessageList.push_back(Payload::with({}));
-  EXPECT_EQ(refusal<Payload>(encoded(Payload::with(std::move(arguments)))),
+  EXPECT_EQ(rejection<Payload>(encoded(Payload::with(std::move(arguments)))),
             "memory of lists exceeds the limit of 67108864 bytes");
 }
 
-TEST(RecordLimitsTest, TextAndDataAreBoundedInAll) {
+TEST(RecordCodec, LimitsTextAndDataOfAllFields) {
   VeskCommandResponseArguments arguments;
   arguments.token = Data(std::string(limits::deliveredBytes - 1, 'x'));
   arguments.applicationId = String("y");
-  EXPECT_EQ(refusal<Response>(encoded(Response::with(arguments))), "");
+  EXPECT_EQ(rejection<Response>(encoded(Response::with(arguments))), "");
   arguments.applicationId = String("yz");
-  EXPECT_NE(refusal<Response>(encoded(Response::with(arguments))), "");
+  EXPECT_NE(rejection<Response>(encoded(Response::with(arguments))), "");
   arguments.messageUUID = arguments.veskSessionId = arguments.token;
   EXPECT_THROW((void)encoded(Response::with(std::move(arguments))), RecordError);
 }
