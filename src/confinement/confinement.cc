@@ -22,23 +22,22 @@ namespace ironmoat::confinement {
 
 namespace {
 
-// A message has room for all that its limits allow, in buffers that double as they grow. Measured:
-// the worst messages known take the process to 256 MiB.
+// Room for everything that the limits allow for one message, in buffers that double as they grow.
 constexpr std::size_t kOneMessage =
     2 * (limits::messageBytes + limits::recordBytes + limits::deliveredBytes + limits::replyBytes);
-constexpr std::size_t kRest = std::size_t{64} << 20;  // programs, stack, free memory in pieces
+constexpr std::size_t kRest = std::size_t{64} << 20;  // program, stack, fragmentation
 static_assert(kOneMessage + kRest <= kAddressSpace);
 
-// Linux 6.3; <sys/prctl.h> may be older.
+// Since Linux 6.3; <sys/prctl.h> may be older.
 constexpr int kSetDenyWriteExecute = 65;
 constexpr int kGetDenyWriteExecute = 66;
 constexpr unsigned long kRefuseExecGain = 1;  // NOLINT(google-runtime-int): as prctl takes it
 
-/// Lowers a limit for good, never above what was given.
-bool limit(__rlimit_resource resource, rlim_t most) noexcept {
+/// Lowers a limit for good, to `max` or to an inherited lower limit.
+bool limit(__rlimit_resource resource, rlim_t max) noexcept {
   rlimit value = {};
   if (::getrlimit(resource, &value) != 0) return false;
-  value.rlim_max = std::min(value.rlim_max, most);
+  value.rlim_max = std::min(value.rlim_max, max);
   value.rlim_cur = value.rlim_max;
   return ::setrlimit(resource, &value) == 0;
 }
@@ -46,7 +45,7 @@ bool limit(__rlimit_resource resource, rlim_t most) noexcept {
 struct Limit {
   Part part;
   __rlimit_resource resource;
-  rlim_t most;
+  rlim_t max;
 };
 constexpr std::array kZeroLimits = {
     Limit{Part::noCoreFile, RLIMIT_CORE, 0},
@@ -55,10 +54,10 @@ constexpr std::array kZeroLimits = {
     Limit{Part::noProcesses, RLIMIT_NPROC, 0},
 };
 
-/// The kernel kills this process once the reading end of its standard error is closed, as the death
-/// of the daemon does: unlike a parent-death signal this does not depend on which thread started
-/// the process, and needs no permission. Only for a pipe in packet mode, by which a client says
-/// that the pipe is for this alone: reading from it kills, too.
+/// Makes the kernel kill this process when the reading end of its standard error is closed, as by
+/// the end of the daemon. Unlike a parent-death signal this does not depend on the thread that
+/// started the process, and needs no permission. Requires a pipe in packet mode, by which a client
+/// marks a pipe that serves this purpose alone: a read from it kills the process, too.
 bool endWithReaderOfStandardError() noexcept {
   struct stat what = {};
   const int flags = ::fcntl(STDERR_FILENO, F_GETFL);
@@ -74,8 +73,8 @@ bool dropCapabilities() noexcept {
   return ::syscall(SYS_capset, &header, none) == 0;
 }
 
-/// The first exception of a process sets up the unwinder, which wakes waiters that there cannot be:
-/// a call that the filter does not allow.
+/// The first exception of a process initialises the unwinder by a futex call, which the filter does
+/// not allow.
 void throwOnce() noexcept {
   try {
     throw std::exception();
@@ -85,7 +84,7 @@ void throwOnce() noexcept {
 
 class Parts {
  public:
-  /// Does `act`, which returns whether it worked, unless a sanitizer is in the way.
+  /// Calls `act`, which returns whether it succeeded, if this build requires the part.
   template <class Act>
   void require(Part part, Act act) {
     if (!isRequired(part)) return;
@@ -115,10 +114,10 @@ std::uint32_t confine() {
   if (::setsid() >= 0 || ::getsid(0) == ::getpid()) parts.inForce(Part::ownSession);
   parts.require(Part::notDumpable, [] { return ::prctl(PR_SET_DUMPABLE, 0) == 0; });
 
-  // A limit does not touch what is open already.
+  // A limit does not close descriptors that are open.
   if (!kSanitizedBuild) ::closefrom(STDERR_FILENO + 1);
   for (const Limit& zero : kZeroLimits) {
-    parts.require(zero.part, [&] { return limit(zero.resource, zero.most); });
+    parts.require(zero.part, [&] { return limit(zero.resource, zero.max); });
   }
   parts.require(Part::addressSpaceLimit, [] { return limit(RLIMIT_AS, kAddressSpace); });
   rlimit memory = {};

@@ -23,7 +23,7 @@ constexpr SystemCall kSystemCalls[] = {
 
 constexpr int kByFilter = 1;  // SYS_SECCOMP, which glibc's headers lack
 
-/// Runs wherever the call was made, with locks held and the heap in any state: it uses neither.
+/// Signal handler: async-signal-safe, uses neither locks nor the heap.
 void nameCallAndEnd(int /*signal*/, siginfo_t* info, void* /*context*/) {
   if (info->si_code != kByFilter) return;
   constexpr std::string_view kWords = "forbidden system call ";
@@ -34,16 +34,16 @@ void nameCallAndEnd(int /*signal*/, siginfo_t* info, void* /*context*/) {
       std::find_if(std::begin(kSystemCalls), std::end(kSystemCalls),
                    [&](const SystemCall& call) { return call.number == info->si_syscall; });
   if (known != std::end(kSystemCalls)) {
-    constexpr std::size_t kLongestName = 32;
+    constexpr std::size_t kMaxName = 32;
     *end++ = ' ';
     *end++ = '(';
-    end = std::copy_n(known->name.begin(), std::min(known->name.size(), kLongestName), end);
+    end = std::copy_n(known->name.begin(), std::min(known->name.size(), kMaxName), end);
     *end++ = ')';
   }
   *end++ = '\n';
   static_cast<void>(!::write(STDERR_FILENO, text, static_cast<std::size_t>(end - text)));
-  // Another forbidden call, and no handler for it any more: the kernel unblocks the signal and
-  // kills the process. Returning would let the first go on as if it had failed.
+  // SA_RESETHAND has removed this handler, so another forbidden call kills the process. To return
+  // would let it continue after the first call.
   for (;;) ::syscall(SYS_getppid);
 }
 
@@ -53,7 +53,7 @@ void nameForbiddenCall() noexcept {
   struct sigaction action = {};
   action.sa_sigaction = &nameCallAndEnd;
   action.sa_flags = SA_SIGINFO | static_cast<int>(SA_RESETHAND);
-  ::sigfillset(&action.sa_mask);  // a closed pipe or a file as standard error is no other death
+  ::sigfillset(&action.sa_mask);  // SIGPIPE and SIGXFSZ must not replace SIGSYS
   ::sigaction(SIGSYS, &action, nullptr);
 }
 

@@ -2,9 +2,9 @@
 
 namespace ironmoat::confinement {
 
-/// From now on the first system call that a filter answers with SIGSYS is named on standard error,
-/// "forbidden system call 41 (socket)", before it kills the process as if nothing had been said. To
-/// be called before such a filter is in force, with SIGSYS as the process was started with it.
+/// Installs a handler that writes the name of the first forbidden system call to standard error, as
+/// in "forbidden system call 41 (socket)", before SIGSYS kills the process. Must be called before
+/// the filter is in force, while SIGSYS has its default action.
 void nameForbiddenCall() noexcept;
 
 }  // namespace ironmoat::confinement

@@ -19,13 +19,13 @@ namespace ironmoat::confinement {
 
 namespace {
 
-// A message of the deepest nesting takes under 1 MiB, several times that with a sanitizer.
+// Bytes; the deepest message takes less than half, except under a sanitizer.
 constexpr std::size_t kStack = std::size_t{2} << 20;
 
 constexpr std::uintptr_t kPage = 4096;
-constexpr int kTopPad = 128 << 10;  // by which the heap grows at least
+constexpr int kTopPad = 128 << 10;  // bytes by which the heap grows at least
 std::uintptr_t pageSize = kPage;
-std::uintptr_t stackEnd = 0;  // the lowest address that belongs to the stack for certain
+std::uintptr_t stackEnd = 0;  // lowest address known to belong to the stack
 
 [[gnu::noinline]] void growStack() noexcept {
   volatile char below[kStack];
@@ -38,8 +38,8 @@ std::uintptr_t stackEnd = 0;  // the lowest address that belongs to the stack fo
   for (volatile char& byte : below) byte = 0;
 }
 
-/// Overwrites what lies just below the caller's frame and releases the pages below that, but for
-/// the frames of the call that releases them.
+/// Overwrites the stack just below the caller's frame and releases the pages below that, except
+/// those with the frames of the releasing call.
 [[gnu::noinline]] void wipeStack() noexcept {
   overwriteStack();
   volatile char here = 0;
@@ -47,18 +47,19 @@ std::uintptr_t stackEnd = 0;  // the lowest address that belongs to the stack fo
   const std::uintptr_t last =
       (reinterpret_cast<std::uintptr_t>(&here) - kPage) / pageSize * pageSize;
   if (stackEnd == 0 || first >= last) return;
-  // NOLINTNEXTLINE(performance-no-int-to-ptr): a page by its number
+  // NOLINTNEXTLINE(performance-no-int-to-ptr): the address of a page
   ::madvise(reinterpret_cast<void*>(first), last - first, MADV_DONTNEED);
 }
 
-/// Where the heap ends. No system call.
+/// The end of the heap. No system call.
 [[maybe_unused]] const void* heapEnd() noexcept { return ::sbrk(0); }
 
 struct Piece {
   Piece* next;
 };
 
-/// Overwrites free pieces of `size` bytes and puts them before `taken`, until the heap would grow.
+/// Takes free pieces of `size` bytes from malloc until the heap grows, overwrites them and prepends
+/// them to the list `taken`.
 [[maybe_unused]] Piece* overwritePieces(std::size_t size, Piece* taken) noexcept {
   for (;;) {
     const void* const end = heapEnd();
@@ -76,9 +77,8 @@ struct Piece {
 }  // namespace
 
 void prepareMemory() noexcept {
-  // One heap that grows and shrinks at its end: lists of megabytes are then neither mapped and
-  // faulted in anew for each message nor copied as they grow. What is kept is released when the
-  // service has nothing to do.
+  // One heap, which grows and shrinks at its end, so that lists of megabytes are neither mapped
+  // anew for each message nor copied as they grow. The idle service releases what malloc keeps.
   ::mallopt(M_MMAP_MAX, 0);
   ::mallopt(M_TRIM_THRESHOLD, 512 << 20);
   rlimit stack = {};
@@ -93,11 +93,11 @@ void prepareMemory() noexcept {
 void releaseMemory() noexcept { ::malloc_trim(0); }
 
 void wipeAndReleaseMemory() noexcept {
-  // Whole free pages go back to the kernel. What is free in pages that are also in use is taken
-  // from malloc piece by piece, from large to small.
+  // The kernel wipes whole free pages. Free memory in pages that are also in use is taken from
+  // malloc piece by piece, from large to small.
   releaseMemory();
   if constexpr (!confinement::kSanitizedBuild) {
-    ::mallopt(M_TOP_PAD, 0);  // so that the heap hardly grows for what does not fit
+    ::mallopt(M_TOP_PAD, 0);  // so that the heap hardly grows for a piece that does not fit
     Piece* taken = nullptr;
     for (std::size_t size = std::size_t{64} << 10; size > 1024; size /= 2) {
       taken = overwritePieces(size, taken);

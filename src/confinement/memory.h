@@ -1,17 +1,17 @@
 #pragma once
 
-/// What the service process does about its memory, all of which belongs to one thread.
+/// The memory of the service process. Not thread-safe: the process has one thread.
 namespace ironmoat::confinement {
 
-/// Sets what malloc keeps, and grows the stack to the size that the deepest message needs. Before
-/// the address space is limited: a stack that has to grow at the limit would be a crash.
+/// Configures malloc and grows the stack to the size that the deepest message needs. Must be called
+/// before the address space is limited: a stack that cannot grow is a crash.
 void prepareMemory() noexcept;
 
-/// Returns what malloc keeps for messages to come to the kernel.
+/// Returns the free memory that malloc keeps to the kernel.
 void releaseMemory() noexcept;
 
-/// The same, and overwrites what is left: no text of an earlier message stays in free memory or
-/// below the caller's stack frame. Takes some tens of microseconds.
+/// Overwrites all free memory and the stack below the caller's frame, so that no part of an earlier
+/// message remains, and returns free memory to the kernel. Takes tens of microseconds.
 void wipeAndReleaseMemory() noexcept;
 
 }  // namespace ironmoat::confinement

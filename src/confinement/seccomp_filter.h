@@ -2,10 +2,9 @@
 
 namespace ironmoat::confinement {
 
-/// Puts the filter in force on the calling thread: from now on a system call that is not on its
-/// list, or has other arguments than the list says, kills the process with SIGSYS; which one is its
-/// last word on standard error. False with errno set when that cannot be had. Needs no_new_privs,
-/// which it sets.
+/// Puts the filter in force on the calling thread: a system call that is not listed, or not with
+/// these arguments, kills the process with SIGSYS after its name is written to standard error. Sets
+/// no_new_privs. False with errno set if the filter is unavailable.
 [[nodiscard]] bool filterSystemCalls() noexcept;
 
 }  // namespace ironmoat::confinement

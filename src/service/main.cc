@@ -1,6 +1,6 @@
-// VeskIronmoatService: seven steps without a branch, then the host has the process. It reads no
-// command line, no environment and no configuration, and writes nothing but frames. When its
-// sandbox or an abort kills it, one line on standard error says why.
+// VeskIronmoatService: seven steps without a branch, then the host takes the process over. Reads no
+// command line, environment or configuration, and writes only frames. If the sandbox or an abort
+// kills the process, one line on standard error says why.
 
 #include "host/server.h"
 #include "service/preferences_store.h"

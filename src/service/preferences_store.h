@@ -2,14 +2,13 @@
 
 namespace ironmoat {
 
-/// The process's preferences. This platform has no store of them, so that what the two switches ask
-/// for holds already: nothing in the process writes preferences, and it depends on no service that
-/// would.
+/// The process's preferences. This platform has no store of them, so both switches are already
+/// satisfied: the process writes no preferences and depends on no preferences service.
 class PreferencesStore {
  public:
   /// The process accesses its preferences itself.
   static void enableDirectMode(bool enabled);
-  /// No write is accepted.
+  /// The store accepts no writes.
   static void enableReadOnlyMode(bool enabled);
 };
 
