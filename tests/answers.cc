@@ -1,5 +1,5 @@
-// Reads requests, whole frames one after the other, and writes a reply for each, on one thread and
-// unconfined: what the service answers, where it cannot be confined, such as in an emulator.
+// Reads request frames and writes the reply to each, without a sandbox: the answers of the service
+// where it cannot sandbox itself, such as in an emulator.
 
 #include <cstddef>
 #include <cstdint>

@@ -1,5 +1,5 @@
-"""Messages that attack: `catalogue(size)` gives (group, name, messages) for messages of up to
-`size` bytes, as payloads. Nothing here needs a property-list library: none would write them."""
+"""Messages that attack: `catalogue(size)` yields (group, name, messages), payloads of at most `size`
+bytes. No property-list library would write them."""
 
 import struct
 
@@ -28,13 +28,13 @@ def array(references, width=3):
 
 
 def dictionary(entries, width=3):
-    """Of pairs of references."""
+    """Of {key, value} pairs of references."""
     return (head(0xD0, len(entries)) + b"".join(number(key, width) for key, _ in entries) +
             b"".join(number(value, width) for _, value in entries))
 
 
 def repeated(kind, count, reference, width):
-    """A container of one reference over and over."""
+    """A container of `count` copies of one reference."""
     return head(kind, count) + number(reference, width) * (count * (2 if kind == 0xD0 else 1))
 
 
@@ -54,11 +54,11 @@ def message(objects, width=3, root=0):
 
 
 ONE = b"\x10\x01"
-OVERHEAD = 400  # of what stands around the part that fills a message
+OVERHEAD = 400  # bytes around the part that fills a message
 
 
 def payload(key, value, further=(), width=3):
-    """{"c": 1, key: value}; the value is object 4, `further` follow."""
+    """{"c": 1, key: value}; `value` is object 4 and `further` are the next ones."""
     return message([dictionary([(1, 2), (3, 4)], width), text(b"c"), ONE, text(key), value,
                     *further], width)
 
@@ -79,24 +79,24 @@ def utf16(content):
     return b"\xff\xfe" + content.decode().encode("utf-16-le")
 
 
-# --- the binary form's graph
+# --- the object graph of the binary format
 
 
 def reference_cycles(size):
-    """Arrays, each the only element of the one before, and the first that of the last."""
+    """Arrays, each the only element of its predecessor, the first that of the last."""
     length = (size - OVERHEAD) // 8
     yield "a long one", [
         payload(b"?", array([5]), [array([5 + (i + 1) % length]) for i in range(length)])]
 
 
 def wide(entries, key):
-    """A payload of that many entries under one key."""
+    """A payload with that many entries under one key."""
     return (head(0xD0, entries + 1) + number(key, 3) * entries + number(1, 3) +
             number(2, 3) * (entries + 1))
 
 
 def doubling(levels):
-    """Payloads, each twice in the list of the one before: 2 ** levels of them."""
+    """Payloads, each twice in the list of its predecessor: 2 ** levels of them."""
     objects = [text(b"c"), ONE, text(b"mml")]
     for level in range(levels):
         place = len(objects)
@@ -127,7 +127,7 @@ def sharing(size):
 
 
 def most_of_everything(size):
-    """As many payloads, bytes and entries as may be, and nodes that nothing refers to behind."""
+    """As many payloads, bytes and entries as the limits allow, then unreferenced objects."""
     times = min(28_140, size // 8)
     objects = [dictionary([(1, 2), (3, 4)]), text(b"c"), ONE, text(b"mml"),
                repeated(0xA0, times, 5, 3),
@@ -137,7 +137,7 @@ def most_of_everything(size):
     return message(objects + [b"\x08"] * (left // 4))
 
 
-# --- the binary form's offsets and counts
+# --- offsets and counts of the binary format
 
 def overlapping(size):
     big = text(b"a" * (size // 2))

@@ -1,12 +1,12 @@
-"""Attacks the service as a process, and shows what each comes to.
+"""Attacks the service as a process, and prints the outcome of each attack.
 
-    attacks.py SERVICE [--size BYTES] [--seconds S] [--mebibytes M] [--refused N] [--table]
+    attacks.py SERVICE [--size BYTES] [--seconds S] [--mebibytes M] [--rejected N] [--table]
 
-Each attack of attack_messages.py meets a fresh service, one message at a time: each must be
-answered within the seconds of processor time, and the service's memory must stay below the
-mebibytes (0: as it likes). Then the heaviest of all come at once, several times over, and again
-where addresses are short: each must get what it got alone, or a refusal for want of memory. Last, N
-refused messages must leave no memory behind. --table prints the rows of doc/attacks.md.
+Each attack of attack_messages.py has a service of its own and sends one message at a time. The
+service must answer each within S seconds of processor time, and its memory must stay below M
+mebibytes (0: no limit). Then the heaviest messages are sent at once, several times, and again with
+less address space: each must have the outcome that it had alone, or a rejection for lack of memory.
+Last, N rejected messages must leave no memory behind. --table prints the rows of doc/attacks.md.
 (S1, S3, S4, S5, S6)
 """
 
@@ -54,7 +54,7 @@ class Service:
         self.socket.sendall(message)
 
     def ask(self, message):
-        """The verdict, and the seconds that it took of the processor, and of the clock."""
+        """The verdict, and its seconds of processor time and of wall-clock time."""
         begun, worked = time.monotonic(), self.worked()
         sender = threading.Thread(target=self.send, args=(1, message))
         sender.start()
@@ -69,12 +69,12 @@ class Service:
         return sum(map(int, times)) / os.sysconf("SC_CLK_TCK")
 
     def memory(self, what):
-        """VmHWM (the most there was) or VmRSS (what there is), in MiB."""
+        """VmHWM (peak) or VmRSS (now), in MiB."""
         with open(f"/proc/{self.process.pid}/status", encoding="ascii") as status:
             for line in status:
                 if line.startswith(what):
                     return int(line.split()[1]) / 1024
-        raise EOFError("the service is gone")
+        raise EOFError("the service has ended")
 
     def end(self):
         self.socket.shutdown(socket.SHUT_WR)
@@ -95,7 +95,7 @@ def verdict(reply):
 
 
 def short(verdicts):
-    """What a group of verdicts has in common."""
+    """A summary of verdicts."""
     counts = collections.Counter(
         v.partition(" at offset")[0].replace("limitExceeded: ", "limit: ").replace("malformed: ", "")
         for v in verdicts)
@@ -142,7 +142,7 @@ class Run:
         print("| " + " | ".join(row) + " |" if self.options.table else " - ".join(row), flush=True)
 
     def pipelined(self, service, messages):
-        """Numbers and verdicts as they come, of messages sent without waiting."""
+        """Numbers and verdicts, in the order of the replies, of messages sent without waiting."""
         def send():
             for number, message in enumerate(messages):
                 service.send(number, message)
@@ -166,13 +166,13 @@ class Run:
         rest = service.memory("VmRSS")
         service.end()
         if self.options.mebibytes:
-            self.check(rest < 16, f"{rest:.0f} MiB are kept at rest")
-        limit = f" in {address_space >> 20} MiB of addresses" if address_space else ""
+            self.check(rest < 16, f"{rest:.0f} MiB are kept when idle")
+        limit = f" in {address_space >> 20} MiB of address space" if address_space else ""
         print(f"the heaviest, {len(asked)} at once{limit}: {dict(counts)}, "
-              f"{seconds:.1f} s, {peak:.0f} MiB, {rest:.0f} MiB at rest", flush=True)
+              f"{seconds:.1f} s, {peak:.0f} MiB, {rest:.0f} MiB idle", flush=True)
 
-    def refusals_leave_nothing(self, count):
-        """All refused attacks in the small, over and over."""
+    def rejections_leave_no_memory(self, count):
+        """All rejected attacks of 64 KiB, again and again."""
         service = Service(self.options.service)
         messages = [attack for _, _, attacks in attack_messages.catalogue(1 << 16)
                     for attack in attacks if service.ask(attack)[0] != "record"]
@@ -180,16 +180,16 @@ class Run:
         def memory_after(count):
             asked = (messages * (count // len(messages) + 1))[:count]
             for _, outcome in self.pipelined(service, asked):
-                self.check(outcome != "record", "refused before, now a record")
+                self.check(outcome != "record", "rejected before, now a record")
             return service.memory("VmRSS")
-        # What malloc keeps for later depends on which messages meet: that settles first.
+        # The memory that malloc keeps depends on the order of the messages: let it settle first.
         before = memory_after(max(count // 5, 3 * len(messages)))
         grown = memory_after(count) - before
         service.end()
-        print(f"{count} messages refused, of {len(messages)} sorts: {before:.1f} MiB before, "
+        print(f"{count} messages rejected, of {len(messages)} kinds: {before:.1f} MiB before, "
               f"{grown:+.1f} MiB after", flush=True)
         if self.options.mebibytes:
-            self.check(grown < 4, f"refusals left {grown:.1f} MiB")
+            self.check(grown < 4, f"rejections left {grown:.1f} MiB")
 
 
 def main():
@@ -199,7 +199,7 @@ def main():
     parser.add_argument("--seconds", type=float, default=1)
     parser.add_argument("--mebibytes", type=float, default=320)
     parser.add_argument("--rounds", type=int, default=6)
-    parser.add_argument("--refused", type=int, default=100_000)
+    parser.add_argument("--rejected", type=int, default=100_000)
     parser.add_argument("--only", default="", help="attacks with this in their group or name")
     parser.add_argument("--table", action="store_true")
     run = Run(parser.parse_args())
@@ -210,8 +210,8 @@ def main():
     if run.options.mebibytes:  # not where a sanitizer maps terabytes
         for mebibytes in (150, 250):
             run.all_at_once(mebibytes << 20)
-    if run.options.refused:
-        run.refusals_leave_nothing(run.options.refused)
+    if run.options.rejected:
+        run.rejections_leave_no_memory(run.options.rejected)
     return 1 if run.wrong else 0
 
 

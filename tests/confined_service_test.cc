@@ -1,5 +1,6 @@
 // The sandboxed service from outside: what it reports, what the kernel says of it, what it does
 // without a part of its sandbox, with invalid frames, with a slow peer and without memory.
+// (S1, S4, S6, S12)
 
 #include <grp.h>
 #include <gtest/gtest.h>

@@ -1,4 +1,4 @@
-// The sandbox from inside: children that sandbox themselves and then do one thing.
+// The sandbox from inside: children that sandbox themselves and then do one thing. (S12)
 
 #include "confinement/confinement.h"
 

@@ -1,5 +1,6 @@
-// Prints how what daemons share with the client library lies in memory: a line for each type, and
-// for each field of a record. packaging/check-layout compares it with what the soname promises.
+// Prints the memory layout that daemons share with the client library: a line for each type, and
+// for each field of a record. packaging/check-layout compares it with the layout recorded for the
+// soname.
 
 #include <cstddef>
 #include <cstdlib>

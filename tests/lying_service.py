@@ -1,6 +1,5 @@
 #!/usr/bin/python3
-"""Answers each request with its message: a status and what follows it, as whoever sent it wants to
-have lied to. Its hello is as it should be."""
+"""A service that answers each request with its message as status and body. Its hello is valid."""
 
 import struct
 import sys

@@ -1,7 +1,7 @@
-// Linked into programs that throw errors from one thread to another, for ThreadSanitizer alone.
+// Suppressions for ThreadSanitizer, linked into programs that pass exceptions between threads.
 //
-// The count of references to an exception is kept by libstdc++.so, which is not instrumented: the
-// sanitizer sees the last owner free what another one read, and not the atomic count between them.
+// libstdc++.so counts the references to an exception and is not instrumented: the sanitizer sees
+// that the last owner frees what another one has read, but not the atomic count between the two.
 
 extern "C" [[gnu::visibility("default")]] const char* __tsan_default_suppressions();
 extern "C" const char* __tsan_default_suppressions() {

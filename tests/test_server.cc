@@ -1,7 +1,7 @@
-// A confined server whose one unpacker does what each message says, a verb and perhaps a number:
-// `hold N` takes N MiB for a moment, `crash` and `stall` do so, `forbidden` makes a
-// system call that is; everything else is answered with the message as the token. The number comes
-// back as the command.
+// A sandboxed server whose unpacker obeys the message, a verb and an optional number: `hold N`
+// allocates N MiB for a moment, `crash` aborts, `stall` never returns, and `forbidden` makes a
+// forbidden system call. It answers any other message with the message as the token. The command is
+// the number.
 
 #include <unistd.h>
 

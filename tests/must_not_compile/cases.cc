@@ -1,4 +1,4 @@
-// One small record, right when no CASE_ is defined and wrong in one way with each.
+// One small record: valid without a CASE_, and invalid in one way with each.
 
 #include <string_view>
 #include <utility>

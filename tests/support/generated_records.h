@@ -9,10 +9,10 @@
 
 #include "ironmoat/values.h"
 
-/// Records made by their lists of fields alone.
+/// Random records, generated from their lists of fields.
 namespace ironmoat::testing {
 
-/// Where a record's FieldList is: an output record has its own, others say it by specialising this.
+/// The FieldList of a record. Specialised for records that are not output records.
 template <class R>
 struct FieldsOf {};
 template <class R>
@@ -25,15 +25,15 @@ concept Record = requires {
   typename FieldsOf<T>::List;
 };
 
-/// `Random` gives numbers of 64 bits.
+/// `Random` returns numbers of 64 bits.
 template <class Random>
 class BasicRecordGenerator {
  public:
-  /// `presence` of 0 makes every optional field absent, of 1 present.
+  /// `presence` is the probability of an optional field.
   BasicRecordGenerator(Random random, double presence)
       : random_(std::move(random)), presence_(presence) {}
 
-  /// Lists inside one another end after `depth` of them.
+  /// Lists nest at most `depth` deep.
   template <Record R>
   R make(int depth) {
     const auto filled = [&](auto parts) {
@@ -82,10 +82,10 @@ class BasicRecordGenerator {
     }
   }
 
-  /// Never for all zeros, unless it is to be always.
+  /// False when `random_` returns 0, unless the probability is 1.
   bool present() { return presence_ >= 1 - static_cast<double>(random_() >> 11) * 0x1p-53; }
   std::uint64_t below(std::uint64_t bound) { return random_() % bound; }
-  /// The least, the most, or up to any number of bits, of either sign.
+  /// The minimum, the maximum, or a number of up to 64 bits and either sign.
   std::int64_t integer() {
     using Limits = std::numeric_limits<std::int64_t>;
     const auto pick = below(66);
