@@ -51,6 +51,13 @@ std::string processFile(pid_t pid, const char* name) {
   return {std::istreambuf_iterator(in), {}};
 }
 
+std::string request(std::uint64_t id, std::string_view type = VeskCommandResponse::schemaName) {
+  BlockBuilder out;
+  frames::appendRequest(out, id, type,
+                        "<plist><dict><key>c</key><integer>1</integer></dict></plist>");
+  return {out.bytes(), out.size()};
+}
+
 class SandboxedService : public ::testing::Test {
  protected:
   void SetUp() override {
@@ -198,6 +205,8 @@ TEST_F(SandboxedService, WipesMessagesFromItsMemoryWhenIdle) {
       ASSERT_TRUE(service.receive());
     }
   }
+  service.send(request(2, mark) + '\x10');  // leaves a part of a frame in the buffer
+  ASSERT_TRUE(service.receive());
   EXPECT_GT(occurrences(service.pid(), mark), 0U) << "the search works";
   std::this_thread::sleep_for(1300ms);
   EXPECT_EQ(occurrences(service.pid(), mark), 0U);
@@ -217,13 +226,6 @@ std::map<std::uint64_t, frames::Reply> replies(std::string_view input) {
   EXPECT_FALSE(service.midFrame());
   EXPECT_EQ(service.end(), 0);
   return all;
-}
-
-std::string request(std::uint64_t id, std::string_view type = VeskCommandResponse::schemaName) {
-  BlockBuilder out;
-  frames::appendRequest(out, id, type,
-                        "<plist><dict><key>c</key><integer>1</integer></dict></plist>");
-  return {out.bytes(), out.size()};
 }
 
 TEST(Service, AnswersInvalidRequestWithErrorAndServesTheNext) {
@@ -248,11 +250,16 @@ TEST(Service, EndsInOrderWhenAFrameIsTooLongOrTruncated) {
   }
 }
 
-TEST(Service, EndsInOrderWhenItsPeerStopsReading) {
-  ChildServer service(runService);
-  service.endOutput();
-  service.send(request(1));
-  EXPECT_EQ(service.end(), 0);
+TEST(Service, EndsInOrderWhenItCannotWrite) {
+  ChildServer unread(runService);
+  unread.endOutput();
+  unread.send(request(1));
+  EXPECT_EQ(unread.end(), 0);
+  ChildServer toFile([] {
+    dup2(open("/tmp", O_TMPFILE | O_WRONLY, 0600), STDOUT_FILENO);
+    runService();
+  });
+  EXPECT_EQ(toFile.end(), 0);
 }
 
 TEST(Service, ServesThroughNonBlockingPipesWhileItIsStoppedAndContinued) {

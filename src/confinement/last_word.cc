@@ -1,6 +1,6 @@
 #include "confinement/last_word.h"
 
-#include <sys/syscall.h>
+#include <sys/syscall.h>  // for system_call_names.inc
 #include <unistd.h>
 
 #include <algorithm>
@@ -24,7 +24,7 @@ constexpr SystemCall kSystemCalls[] = {
 constexpr int kByFilter = 1;  // SYS_SECCOMP, which glibc's headers lack
 
 /// Signal handler: async-signal-safe, uses neither locks nor the heap.
-void nameCallAndEnd(int /*signal*/, siginfo_t* info, void* /*context*/) {
+void nameCall(int /*signal*/, siginfo_t* info, void* /*context*/) {
   if (info->si_code != kByFilter) return;
   constexpr std::string_view kWords = "forbidden system call ";
   char text[80];
@@ -42,16 +42,15 @@ void nameCallAndEnd(int /*signal*/, siginfo_t* info, void* /*context*/) {
   }
   *end++ = '\n';
   static_cast<void>(!::write(STDERR_FILENO, text, static_cast<std::size_t>(end - text)));
-  // SA_RESETHAND has removed this handler, so another forbidden call kills the process. To return
-  // would let it continue after the first call.
-  for (;;) ::syscall(SYS_getppid);
+  // To return is another forbidden call, rt_sigreturn. SA_RESETHAND has removed this handler, so
+  // that call kills the process.
 }
 
 }  // namespace
 
 void nameForbiddenCall() noexcept {
   struct sigaction action = {};
-  action.sa_sigaction = &nameCallAndEnd;
+  action.sa_sigaction = &nameCall;
   action.sa_flags = SA_SIGINFO | static_cast<int>(SA_RESETHAND);
   ::sigfillset(&action.sa_mask);  // SIGPIPE and SIGXFSZ must not replace SIGSYS
   ::sigaction(SIGSYS, &action, nullptr);

@@ -70,7 +70,7 @@ TEST(Frame, RejectsInvalidBodies) {
     std::string body;
     std::size_t accepted;  // of the prefixes of the body, itself included
   } rows[] = {
-      {parse<parseHello>, kHelloBody, 1},
+      {parse<parseHello>, kHelloBody + "x", 1},
       {parse<parseHello>, "IRONMOAX" + kHelloBody.substr(8), 0},
       {parse<parseHello>, "IRONMOAT\2\0"s + kHelloBody.substr(10), 0},
       {parse<parseRequest>, kRequestBody, 1 + 5},

@@ -97,8 +97,8 @@ TEST(RecordCodec, LimitsNestingAndElements) {
   std::string deep;
   for (std::uint32_t i = 0; i < limits::nestedContainers; ++i) deep += opening;
   EXPECT_EQ(rejection<Payload>(deep + nested(1)), "nesting exceeds the limit of 512 records");
-  std::string announced = two;  // 255 elements, and the bytes of one
-  announced.replace(opening.size() - 4, 4, "\xFF\0\0\0"s);
+  std::string announced = two;  // two elements, and the bytes of one
+  announced.replace(opening.size() - 4, 4, "\2\0\0\0"s);
   EXPECT_EQ(rejection<Payload>(announced), "list exceeds the rest of the record");
 }
 
