@@ -122,8 +122,17 @@ TEST(RecordCodec, LimitsTextAndDataOfAllFields) {
   EXPECT_EQ(rejection<Response>(encoded(Response::with(arguments))), "");
   arguments.applicationId = String("yz");
   EXPECT_NE(rejection<Response>(encoded(Response::with(arguments))), "");
-  arguments.messageUUID = arguments.veskSessionId = arguments.token;
-  EXPECT_THROW((void)encoded(Response::with(std::move(arguments))), RecordError);
+}
+
+TEST(RecordCodec, LimitsBytesOfReply) {
+  constexpr std::size_t kRest = 2 + 8 + 3 * 4;  // presence, command, lengths
+  VeskCommandResponseArguments arguments;
+  arguments.token = arguments.messageUUID = Data(std::string(limits::deliveredBytes, 'x'));
+  const std::size_t last = limits::replyBytes - kRest - 2 * limits::deliveredBytes;
+  arguments.veskSessionId = Data(std::string(last, 'x'));
+  EXPECT_EQ(encoded(Response::with(arguments)).size(), limits::replyBytes);
+  arguments.veskSessionId = Data(std::string(last + 1, 'x'));
+  EXPECT_THROW(encoded(Response::with(arguments)), RecordError);
 }
 
 }  // namespace

@@ -114,9 +114,11 @@ TEST(TextView, CutsAndWrapsLongValues) {
 TEST(TextView, ColoursLabelsAndEscapesQuotes) {
   Whole whole;
   whole.text = String("\x1B[31m\" (4 bytes)\\");
+  whole.bytes = Data("x");
   EXPECT_EQ(view(whole, {.colours = Colours::muted()}),
             "  \033[36mcommand\033[0m  0\n"
-            "  \033[36mtext\033[0m     \"\\u{1b}[31m\\\" (4 bytes)\\\\\"\n");
+            "  \033[36mtext\033[0m     \"\\u{1b}[31m\\\" (4 bytes)\\\\\"\n"
+            "  \033[36mbytes\033[0m    78 \033[2m(1 byte)\033[0m\n");
 }
 
 TEST(JsonWriter, WritesIntegersAsStringsWhenAsked) {
@@ -224,6 +226,8 @@ TEST(Position, ShowsPartOfLineThatFitsWhenLineIsLong) {
             "line 1, column 1001\n  ...aaaaaaaaaaaaaaa!bbbbbbbb...\n                    ^\n");
   const std::string fits = "<a>" + std::string(19, 'b') + "<c/></a>";
   EXPECT_EQ(position(fits, 3, 33), "line 1, column 4\n  " + fits + "\n     ^\n");
+  EXPECT_EQ(position(fits + "d", 3, 33),
+            "line 1, column 4\n  " + fits.substr(0, 27) + "...\n     ^\n");
   std::string marks = "a";
   for (int i = 0; i < 3000; ++i) marks += "\xCC\x81";  // takes no column
   for (const std::string& wide : {marks, std::string(3000, '\xF0'), std::string(3000, '\x80')}) {
