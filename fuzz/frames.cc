@@ -88,13 +88,14 @@ void parse(const Data& body) {
     const auto inside = [&](const auto& parse) {
       return [&](const Data&) { return parse(reply.body); };
     };
-    if (reply.status == Status::refused) {
-      expectSame(body, inside(parseRefusal), [&](BlockBuilder& again, const DecodingError& error) {
-        appendRefusal(again, reply.id, error);
-      });
+    if (reply.status == Status::rejected) {
+      expectSame(body, inside(parseRejection),
+                 [&](BlockBuilder& again, const DecodingError& error) {
+                   appendRejection(again, reply.id, error);
+                 });
     } else if (reply.status != Status::record) {
-      expectSame(body, inside(parseSentence), [&](BlockBuilder& again, const std::string& text) {
-        appendSentence(again, reply.id, reply.status, text);
+      expectSame(body, inside(parseDescription), [&](BlockBuilder& again, const std::string& text) {
+        appendDescription(again, reply.id, reply.status, text);
       });
     }
   });

@@ -197,7 +197,7 @@ TYPED_TEST(Allocation, UnpackingAndServingSurviveEveryFailure) {
     });
     const Data request(std::string_view(frame).substr(frames::kLengthBytes));
     const std::string ranOut = testing::written([&](BlockBuilder& out) {
-      frames::appendRefusal(
+      frames::appendRejection(
           out, 7,
           {DecodingError::Kind::notEnoughMemory, "", "not enough memory to decode this message"});
     });

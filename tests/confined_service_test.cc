@@ -148,9 +148,9 @@ TEST_F(SandboxedService, RejectsMessageThatExceedsItsMemoryAndServesTheNext) {
     const auto body = server.receive();
     ASSERT_TRUE(body) << id;
     const frames::Reply reply = frames::parseReply(*body);
-    ASSERT_EQ(reply.status, fits ? Status::record : Status::refused) << id;
+    ASSERT_EQ(reply.status, fits ? Status::record : Status::rejected) << id;
     if (fits) continue;
-    EXPECT_EQ(frames::parseRefusal(reply.body).kind(), DecodingError::Kind::notEnoughMemory);
+    EXPECT_EQ(frames::parseRejection(reply.body).kind(), DecodingError::Kind::notEnoughMemory);
   }
   server.endInput();
   EXPECT_EQ(server.end(), 0);
@@ -235,7 +235,7 @@ TEST(Service, AnswersInvalidRequestWithErrorAndServesTheNext) {
   const auto all = replies(request(5, "NoSuchType") + lyingName + tiny + request(9));
   ASSERT_EQ(all.size(), 4U);
   for (const std::uint64_t id : {5, 8, 0}) EXPECT_EQ(all.at(id).status, Status::notServed) << id;
-  EXPECT_EQ(frames::parseSentence(all.at(5).body), "not a served output type");
+  EXPECT_EQ(frames::parseDescription(all.at(5).body), "not a served output type");
   EXPECT_EQ(all.at(9).status, Status::record);
 }
 

@@ -92,9 +92,9 @@ void serve(const frames::Request& request) {
     answer(id, number);
   } else if (verb == "refuse") {
     const DecodingError error(DecodingError::Kind::typeMismatch, "a[1].b", "expected data");
-    frames::appendRefusal(out, id, error);
+    frames::appendRejection(out, id, error);
   } else if (verb == "notServed") {
-    frames::appendSentence(out, id, frames::Status::notServed, "nobody unpacks this");
+    frames::appendDescription(out, id, frames::Status::notServed, "nobody unpacks this");
   } else if (verb == "slow") {  // so many milliseconds
     std::this_thread::sleep_for(std::chrono::milliseconds(number));
     answer(id, number);

@@ -42,10 +42,10 @@ class RecordRequest final : public Request {
         withHostRejections([&] {
           outcome_.emplace(std::in_place, [&] { return frames::decodeRecord<R>(reply.body); });
         });
-      } else if (reply.status == Status::refused) {
-        set(frames::parseRefusal(reply.body));
+      } else if (reply.status == Status::rejected) {
+        set(frames::parseRejection(reply.body));
       } else {  // notServed, failed
-        set(ServiceError(ServiceError::Kind::unavailable, frames::parseSentence(reply.body)));
+        set(ServiceError(ServiceError::Kind::unavailable, frames::parseDescription(reply.body)));
       }
     } catch (const DecodingError& rejection) {  // by the record's initialiser
       set(rejection);

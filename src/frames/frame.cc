@@ -76,7 +76,7 @@ class Parser {
     return taken;
   }
 
-  [[nodiscard]] std::string sentence(std::size_t length) {
+  [[nodiscard]] std::string description(std::size_t length) {
     const std::string_view taken = text(length);
     if (carried(taken).size() != length) throw FrameError("not a valid text in a frame");
     return std::string(taken);
@@ -155,14 +155,15 @@ void endReply(BlockBuilder& out, std::size_t start) noexcept {
   store(out.bytes() + start, static_cast<std::uint32_t>(out.size() - start - kLengthBytes));
 }
 
-void appendRefusal(BlockBuilder& out, std::uint64_t id, const DecodingError& error) {
+void appendRejection(BlockBuilder& out, std::uint64_t id, const DecodingError& error) {
   const std::string_view path = carried(error.path());
-  appendFrame(out, 0, id, Status::refused, error.kind(), error.offset().value_or(kNoOffset),
+  appendFrame(out, 0, id, Status::rejected, error.kind(), error.offset().value_or(kNoOffset),
               static_cast<std::uint16_t>(path.size()), path, carried(error.what()));
 }
 
-void appendSentence(BlockBuilder& out, std::uint64_t id, Status status, std::string_view sentence) {
-  appendFrame(out, 0, id, status, carried(sentence));
+void appendDescription(BlockBuilder& out, std::uint64_t id, Status status,
+                       std::string_view description) {
+  appendFrame(out, 0, id, status, carried(description));
 }
 
 Reply parseReply(const Data& body) {
@@ -174,18 +175,18 @@ Reply parseReply(const Data& body) {
   return reply;
 }
 
-DecodingError parseRefusal(const Data& body) {
+DecodingError parseRejection(const Data& body) {
   Parser parser(body);
   const auto kind = parser.enumerator(DecodingError::Kind::notEnoughMemory, "kind of rejection");
   const auto offset = parser.number<std::uint64_t>();
-  std::string path = parser.sentence(parser.number<std::uint16_t>());
-  return {kind, std::move(path), parser.sentence(parser.left()),
+  std::string path = parser.description(parser.number<std::uint16_t>());
+  return {kind, std::move(path), parser.description(parser.left()),
           offset == kNoOffset ? std::nullopt : std::optional(offset)};
 }
 
-std::string parseSentence(const Data& body) {
+std::string parseDescription(const Data& body) {
   Parser parser(body);
-  return parser.sentence(parser.left());
+  return parser.description(parser.left());
 }
 
 }  // namespace ironmoat::frames

@@ -56,7 +56,7 @@ struct Request {
 
 enum class Status : std::uint8_t {
   record = 0,     ///< the body is the encoded record
-  refused = 1,    ///< a DecodingError
+  rejected = 1,   ///< a DecodingError
   notServed = 2,  ///< unknown output type, or a bad request; the body is a description
   failed = 3,     ///< the service failed in another way; the body is a description
 };
@@ -68,7 +68,7 @@ struct Reply {
 };
 
 // Each `append` function appends one whole frame, length included, or throws and leaves `out` as it
-// was: FrameError if no frame can hold the arguments, std::bad_alloc. Paths and sentences are
+// was: FrameError if no frame can hold the arguments, std::bad_alloc. Paths and descriptions are
 // truncated to what a frame can carry.
 
 void appendHello(BlockBuilder& out, const Hello& hello);
@@ -79,8 +79,9 @@ void appendRequestHead(BlockBuilder& out, std::uint64_t id, std::string_view out
 [[nodiscard]] inline std::size_t requestHeadBytes(std::string_view outputType) noexcept {
   return kMaxRequestHead - kMaxName + outputType.size();
 }
-void appendRefusal(BlockBuilder& out, std::uint64_t id, const DecodingError& error);
-void appendSentence(BlockBuilder& out, std::uint64_t id, Status status, std::string_view sentence);
+void appendRejection(BlockBuilder& out, std::uint64_t id, const DecodingError& error);
+void appendDescription(BlockBuilder& out, std::uint64_t id, Status status,
+                       std::string_view description);
 
 /// The caller appends the body of a reply between the two. `begin` returns the start of the frame
 /// in `out`, to which the caller truncates it to give the reply up. `end` does not check the
@@ -94,10 +95,10 @@ void endReply(BlockBuilder& out, std::size_t start) noexcept;
 Hello parseHello(const Data& body);
 Request parseRequest(const Data& body);
 Reply parseReply(const Data& body);
-/// The error inside a reply of status `refused`.
-DecodingError parseRefusal(const Data& body);
+/// The error inside a reply of status `rejected`.
+DecodingError parseRejection(const Data& body);
 /// The text inside a reply of status `notServed` or `failed`.
-std::string parseSentence(const Data& body);
+std::string parseDescription(const Data& body);
 
 /// The id of a request that may be invalid; none if the body is too short for one.
 std::optional<std::uint64_t> requestId(const Data& body) noexcept;

@@ -34,14 +34,14 @@ std::string written(Append append) {
 
 /// `error` as a reply carries it.
 DecodingError carried(const DecodingError& error) {
-  const auto reply = written([&](auto& out) { appendRefusal(out, 1, error); });
-  return parseRefusal(parseReply(tightMessage(reply.substr(kLengthBytes))).body);
+  const auto reply = written([&](auto& out) { appendRejection(out, 1, error); });
+  return parseRejection(parseReply(tightMessage(reply.substr(kLengthBytes))).body);
 }
 
 const std::string kHelloBody = "IRONMOAT\1\0\5\0\0\0\x08\x07\x06\x05\x04\x03\x02\x01"s +
                                number(2, 8) + number(3, 8) + number(4, 8) + number(512, 4);
 const std::string kRequestBody = "\x2A\0\0\0\0\0\0\x80\x05Type1<msg>"s;
-const std::string kRefusalBody = "\x07\0\0\0\0\0\0\0\1\2\x34\x12\0\0\0\0\0\0\x08\0mml[1].Uwhy"s;
+const std::string kRejectionBody = "\x07\0\0\0\0\0\0\0\1\2\x34\x12\0\0\0\0\0\0\x08\0mml[1].Uwhy"s;
 
 TEST(Frame, ParsesWhatWasAppended) {
   const Hello hello{5, 0x0102030405060708, 2, 3, 4, 512};
@@ -50,11 +50,11 @@ TEST(Frame, ParsesWhatWasAppended) {
   const Data body = tightMessage(kRequestBody);
   EXPECT_EQ(parseRequest(body).message.slice().block(), body.slice().block());  // not a copy
 
-  const DecodingError refusal(Kind::typeMismatch, "mml[1].U", "why", 0x1234);
-  EXPECT_EQ(written([&](auto& out) { appendRefusal(out, 7, refusal); }), frame(kRefusalBody));
-  EXPECT_EQ(carried(refusal).offset(), 0x1234U);
+  const DecodingError rejection(Kind::typeMismatch, "mml[1].U", "why", 0x1234);
+  EXPECT_EQ(written([&](auto& out) { appendRejection(out, 7, rejection); }), frame(kRejectionBody));
+  EXPECT_EQ(carried(rejection).offset(), 0x1234U);
   EXPECT_FALSE(carried(DecodingError(Kind::keyNotFound, "", "")).offset().has_value());
-  EXPECT_EQ(written([](auto& out) { appendSentence(out, 1, Status::failed, "why"); }),
+  EXPECT_EQ(written([](auto& out) { appendDescription(out, 1, Status::failed, "why"); }),
             frame(number(1, 8) + "\3why"));
 }
 
@@ -64,7 +64,7 @@ void parse(const Data& body) {
 }
 
 TEST(Frame, RejectsInvalidBodies) {
-  const std::string refused = kRefusalBody.substr(9);
+  const std::string rejected = kRejectionBody.substr(9);
   const struct {
     void (*parse)(const Data&);
     std::string body;
@@ -75,13 +75,13 @@ TEST(Frame, RejectsInvalidBodies) {
       {parse<parseHello>, "IRONMOAT\2\0"s + kHelloBody.substr(10), 0},
       {parse<parseRequest>, kRequestBody, 1 + 5},
       {parse<parseRequest>, number(1, 8) + "\0rest"s, 0},
-      {parse<parseReply>, kRefusalBody, 1 + refused.size()},
+      {parse<parseReply>, kRejectionBody, 1 + rejected.size()},
       {parse<parseReply>, number(1, 8) + "\4", 0},
-      {parse<parseRefusal>, refused, 1 + 3},
-      {parse<parseRefusal>, "\7" + refused.substr(1), 0},
-      {parse<parseRefusal>, "\0"s + number(0, 8) + "\1\0\xC3\xA9"s, 0},
-      {parse<parseRefusal>, "\0"s + number(0, 8) + "\0\0\xC3"s, 1},
-      {parse<parseSentence>, "zero\0byte"s, 1 + 4},
+      {parse<parseRejection>, rejected, 1 + 3},
+      {parse<parseRejection>, "\7" + rejected.substr(1), 0},
+      {parse<parseRejection>, "\0"s + number(0, 8) + "\1\0\xC3\xA9"s, 0},
+      {parse<parseRejection>, "\0"s + number(0, 8) + "\0\0\xC3"s, 1},
+      {parse<parseDescription>, "zero\0byte"s, 1 + 4},
   };
   for (const auto& row : rows) {
     std::size_t accepted = 0;
@@ -94,8 +94,8 @@ TEST(Frame, RejectsInvalidBodies) {
     }
     EXPECT_EQ(accepted, row.accepted) << ::testing::PrintToString(row.body);
   }
-  EXPECT_NO_THROW(parse<parseSentence>(Data(std::string(65535, 'x'))));
-  EXPECT_THROW(parse<parseSentence>(Data(std::string(65536, 'x'))), FrameError);
+  EXPECT_NO_THROW(parse<parseDescription>(Data(std::string(65535, 'x'))));
+  EXPECT_THROW(parse<parseDescription>(Data(std::string(65536, 'x'))), FrameError);
   for (std::size_t i = 0; i < 8 + 1 + 5; ++i) {
     EXPECT_EQ(requestId(tightMessage(kRequestBody.substr(0, i))).has_value(), i >= 8) << i;
   }

@@ -54,7 +54,7 @@ void RequestLoop::run(const frames::Hello& hello) {
       }
     }
   } catch (const frames::FrameError& error) {
-    frames::appendSentence(replies_, 0, frames::Status::notServed, error.what());
+    frames::appendDescription(replies_, 0, frames::Status::notServed, error.what());
     flush();
   } catch (const std::bad_alloc&) {
     // No memory to read a request: end in order, so that the peer can start another service.

@@ -41,22 +41,22 @@ void IronmoatServer::answer(const Data& request, BlockBuilder& reply) const {
         registrations_.begin(), registrations_.end(),
         [&](const Registration& known) { return known.outputType == parsed.outputType; });
     if (found == registrations_.end()) {
-      return frames::appendSentence(reply, id, Status::notServed, "not a served output type");
+      return frames::appendDescription(reply, id, Status::notServed, "not a served output type");
     }
     frames::beginReply(reply, id, Status::record);
     withHostRejections([&] { found->handler(parsed.message, reply); });
     frames::endReply(reply, start);
   } catch (const DecodingError& rejection) {
-    frames::appendRefusal(withoutRecord(), id, rejection);
+    frames::appendRejection(withoutRecord(), id, rejection);
   } catch (const std::bad_alloc&) {
     withoutRecord();
     throw;
   } catch (const frames::FrameError& error) {
-    frames::appendSentence(withoutRecord(), id, Status::notServed, error.what());
+    frames::appendDescription(withoutRecord(), id, Status::notServed, error.what());
   } catch (const std::exception& error) {
-    frames::appendSentence(withoutRecord(), id, Status::failed, error.what());
+    frames::appendDescription(withoutRecord(), id, Status::failed, error.what());
   } catch (...) {
-    frames::appendSentence(withoutRecord(), id, Status::failed, "the unpacker failed");
+    frames::appendDescription(withoutRecord(), id, Status::failed, "the unpacker failed");
   }
 }
 
@@ -64,7 +64,7 @@ void IronmoatServer::serve(const Data& request, BlockBuilder& reply) const {
   try {
     answer(request, reply);
   } catch (const std::bad_alloc&) {
-    frames::appendRefusal(
+    frames::appendRejection(
         reply, frames::requestId(request).value_or(0),
         {DecodingError::Kind::notEnoughMemory, "", "not enough memory to decode this message"});
   }

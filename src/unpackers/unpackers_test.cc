@@ -168,8 +168,8 @@ TEST_F(Unpackers, ReplyRejectedByHostWhateverTheInitialiserThrows) {
     reject = row.reject;
     const frames::Reply reply = served();
     EXPECT_EQ(reply.id, 5U);
-    ASSERT_EQ(reply.status, frames::Status::refused) << row.description;
-    const DecodingError rejection = frames::parseRefusal(reply.body);
+    ASSERT_EQ(reply.status, frames::Status::rejected) << row.description;
+    const DecodingError rejection = frames::parseRejection(reply.body);
     EXPECT_EQ(testing::inWords(rejection), "rejectedByHost: " + row.description);
     EXPECT_FALSE(rejection.offset().has_value());
   }
