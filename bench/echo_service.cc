@@ -1,4 +1,4 @@
-// What the service would be if unpacking were free: as confined, waits as it does, reads requests
+// What the service would be if unpacking were free: as sandboxed, waits as it does, reads requests
 // through the same assembler and answers each with the reply that a typical message gets.
 
 #include <fcntl.h>
@@ -14,20 +14,20 @@
 #include <span>
 #include <string>
 
-#include "confinement/confinement.h"
-#include "confinement/memory.h"
 #include "frames/frame.h"
 #include "frames/frame_assembler.h"
 #include "frames/record_codec.h"
 #include "frames/spin.h"
 #include "messages.h"
+#include "sandbox/memory.h"
+#include "sandbox/sandbox.h"
 #include "unpackers/corvel_payload_unpacker.h"
 
 namespace {
 
 using namespace ironmoat;
 
-// Calls that confinement allows, on a socket that does not block.
+// Calls that sandbox allows, on a socket that does not block.
 void waitFor(int descriptor, bool toRead) {
   fd_set only;
   FD_ZERO(&only);
@@ -66,7 +66,7 @@ ssize_t readSome(std::span<char> room) {
 int main() {
   std::signal(SIGPIPE, SIG_IGN);
   ::fcntl(STDIN_FILENO, F_SETFL, O_NONBLOCK);
-  confinement::prepareMemory();
+  sandbox::prepareMemory();
   BlockBuilder body;
   frames::encodeRecord(VeskCorvelPayloadUnpacker().unpack(
                            bench::messageOf(bench::typicalPayload(0), plist::Format::binary)),
@@ -74,7 +74,7 @@ int main() {
   BlockBuilder out;
   frames::FrameAssembler assembler(frames::kMaxRequestBody, Sharing::oneThread);
   frames::Hello hello = frames::Hello::ours();
-  hello.confinement = confinement::confine();  // its filter is part of what a call costs
+  hello.sandbox = sandbox::enter();  // its filter is part of what a call costs
   frames::appendHello(out, hello);
   while (writeAll({out.bytes(), out.size()})) {
     out.truncate(0);

@@ -14,9 +14,9 @@
 #include <span>
 #include <string_view>
 
-#include "confinement/memory.h"
 #include "heap_count.h"
 #include "messages.h"
+#include "sandbox/memory.h"
 #include "shapes.h"
 #include "streams.h"
 #include "unpackers/corvel_payload_unpacker.h"
@@ -120,7 +120,7 @@ void run(std::size_t smallest, std::size_t largest, bool timed) {
 
 int main(int argc, char** argv) {
   if (argc < 3) return EXIT_FAILURE;
-  ironmoat::confinement::prepareMemory();  // as the service does
+  ironmoat::sandbox::prepareMemory();  // as the service does
   const auto number = [](const char* text) { return std::strtoull(text, nullptr, 10); };
   ironmoat::bench::run(number(argv[1]), number(argv[2]),
                        argc > 3 && std::string_view(argv[3]) == "time");

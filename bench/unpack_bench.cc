@@ -6,11 +6,11 @@
 #include <string>
 #include <vector>
 
-#include "confinement/memory.h"
 #include "messages.h"
 #include "plist/property_list_decoder.h"
 #include "protobuf_peer.h"
 #include "records/message_payload.h"
+#include "sandbox/memory.h"
 #include "streams.h"
 #include "unpackers/corvel_payload_unpacker.h"
 #include "xml_peers.h"
@@ -88,7 +88,7 @@ void addStream(const Stream& stream) {
 
 int main(int argc, char** argv) {
   // For everyone alike: large blocks are kept, not given back to the kernel after each message.
-  ironmoat::confinement::prepareMemory();
+  ironmoat::sandbox::prepareMemory();
   constexpr std::size_t kStream = 2048;
   for (const auto& sample : ironmoat::bench::samples()) ironmoat::bench::addSample(sample);
   for (const auto& stream : ironmoat::bench::streams(kStream)) ironmoat::bench::addStream(stream);

@@ -1,5 +1,5 @@
-# The client library as it is installed: all that the room `client` reaches in one archive and in
-# one shared library, both from the rooms' own objects. To CMake they are Ironmoat::client_static
+# The client library as it is installed: all that the module `client` reaches in one archive and in
+# one shared library, both from the modules' own objects. To CMake they are Ironmoat::client_static
 # and Ironmoat::client, for who installs them and for who adds this folder to his build.
 
 # Before 1.0 any minor version may change what daemons are compiled against.

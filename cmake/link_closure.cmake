@@ -1,6 +1,6 @@
-# Fails the configuration when a room reaches another one over any number of links.
+# Fails the configuration when a module reaches another one over any number of links.
 #
-#   ironmoat_assert_unreachable(<room> FROM <room>)
+#   ironmoat_assert_unreachable(<module> FROM <module>)
 
 function(ironmoat_link_closure target result)
   set(seen)
@@ -23,10 +23,10 @@ function(ironmoat_link_closure target result)
   set(${result} ${seen} PARENT_SCOPE)
 endfunction()
 
-function(ironmoat_assert_unreachable room)
+function(ironmoat_assert_unreachable module)
   cmake_parse_arguments(ASSERT "" "FROM" "" ${ARGN})
   ironmoat_link_closure(ironmoat_${ASSERT_FROM} closure)
-  if(ironmoat_${room} IN_LIST closure)
-    message(FATAL_ERROR "room '${ASSERT_FROM}' must not reach room '${room}': ${closure}")
+  if(ironmoat_${module} IN_LIST closure)
+    message(FATAL_ERROR "module '${ASSERT_FROM}' must not reach module '${module}': ${closure}")
   endif()
 endfunction()

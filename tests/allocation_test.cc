@@ -187,7 +187,7 @@ TYPED_TEST_SUITE(Allocation, Kinds);
 
 TYPED_TEST(Allocation, UnpackingAndServingSurviveEveryFailure) {
   using Output = typename TypeParam::Output;
-  IronmoatServer server(IronmoatServer::Confine::no);
+  IronmoatServer server(IronmoatServer::Sandboxed::no);
   server.registerUnpacker<Output>(typename TypeParam::Unpacker());
   long allocations = 0;
   for (const Data& message : messages<typename TypeParam::Wire>()) {

@@ -18,7 +18,7 @@
 
 int main() {
   using namespace ironmoat;
-  IronmoatServer server(IronmoatServer::Confine::no);
+  IronmoatServer server(IronmoatServer::Sandboxed::no);
   server.registerUnpacker<DrelUserPayload>(VeskCorvelPayloadUnpacker());
   server.registerUnpacker<VeskCommandResponse>(VeskCommandResponseUnpacker());
   server.registerUnpacker<VeskCommandWebTunnelResponse>(VeskCommandWebTunnelResponseUnpacker());

@@ -17,11 +17,11 @@
 #include <thread>
 #include <utility>
 
-#include "confinement_parts/confinement_parts.h"
 #include "frames/frame.h"
 #include "frames/frame_assembler.h"
 #include "frames/record_codec.h"
 #include "ironmoat/command_response.h"
+#include "sandbox_parts/sandbox_parts.h"
 
 namespace {
 
@@ -168,10 +168,10 @@ int main(int, char** arguments) {
   const std::string name = std::filesystem::path(arguments[0]).filename();
   if (name == "silent") hang();
   if (name == "leaves") return 5;
-  if (name == "fails_to_confine") return 65;
+  if (name == "lacks_a_part") return 65;
   if (name == "late") std::this_thread::sleep_for(50ms);
   frames::Hello hello = frames::Hello::ours();
-  if (name != "unconfined") hello.confinement = confinement::kRequiredParts;
+  if (name != "unsandboxed") hello.sandbox = sandbox::kRequiredParts;
   if (name == "other_limits") hello.recordBytes /= 2;
   BlockBuilder greeting;
   frames::appendHello(greeting, hello);

@@ -1,4 +1,4 @@
-// A client and a confined service through everything that can happen to the service. By default in
+// A client and a sandboxed service through everything that can happen to the service. By default in
 // seconds; `faults_test --full` takes the sizes and prints the figures of doc/attacks.md. (S15,
 // S16)
 
@@ -148,7 +148,7 @@ std::string outcomeOf(Pending& pending) {
 }
 
 TEST_F(FaultsTest, PoisonFailsAloneAmongAThousand) {
-  constexpr auto kDeadline = confinement::kSanitizedBuild ? 2000ms : 1000ms;
+  constexpr auto kDeadline = sandbox::kSanitizedBuild ? 2000ms : 1000ms;
   const Poison crash = {"crash", "crashed: the service was killed by SIGABRT over this message"};
   const Poison stall = {"stall", "timedOut: no reply within " + std::to_string(kDeadline.count())};
   const Poison forbidden = {"forbidden",
@@ -163,7 +163,7 @@ TEST_F(FaultsTest, PoisonFailsAloneAmongAThousand) {
   int failed = 0;
   const int count = sized(3, 100);
   for (int round = 0; round < count; ++round) {
-    const auto& poisons = rounds[round % (confinement::kSanitizedBuild ? 2 : 3)];
+    const auto& poisons = rounds[round % (sandbox::kSanitizedBuild ? 2 : 3)];
     std::map<int, Poison> at;
     for (const Poison& poison : poisons) {
       while (!at.try_emplace(static_cast<int>(random() % kRequests), poison).second) {

@@ -33,7 +33,7 @@ def provoked(folder):
     yield message("--service", "/nonexistent")
     yield message("--service", "/etc/passwd")
     yield message(preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_NOFILE, (7, 7)))
-    for kind in ("other_limits", "fails_to_confine"):
+    for kind in ("other_limits", "lacks_a_part"):
         program = folder / kind
         program.symlink_to(FAKE_START)
         yield message("--service", program)

@@ -16,8 +16,8 @@ import (
 	"time"
 )
 
-// Confined has the bits of confinement that a service as it should be has on any kernel.
-const Confined = 0b110_1111_1111
+// Sandboxed has the bits of sandbox that a service as it should be has on any kernel.
+const Sandboxed = 0b110_1111_1111
 
 var kinds = []string{
 	"malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound", "rejectedByHost",
@@ -50,7 +50,7 @@ type schema[T any] interface {
 type Client struct {
 	Program  string        // path of the service
 	Deadline time.Duration // for one message
-	Confined uint32        // bits without which it goes no further
+	Sandboxed uint32        // bits without which it goes no further
 
 	mutex   sync.Mutex
 	service *service // guarded by mutex
@@ -89,7 +89,7 @@ func (client *Client) exchange(outputType string, message []byte, read func(*rea
 	for fresh := false; !fresh; {
 		if fresh = client.service == nil; fresh {
 			deadline := time.Now().Add(client.Deadline)
-			if client.service, err = start(client.Program, client.Confined, deadline); err != nil {
+			if client.service, err = start(client.Program, client.Sandboxed, deadline); err != nil {
 				return nil, err
 			}
 		}
@@ -111,14 +111,14 @@ type service struct {
 	hello   struct {
 		Name                                                  [8]byte
 		Version                                               uint16
-		Confinement                                           uint32
+		Sandbox                                           uint32
 		MessageBytes, RecordBytes, DeliveredBytes, ReplyBytes uint64
 		NestedContainers                                      uint32
 	}
 }
 
 // start relies on Go's threads: they do not end while the program runs, and with them no service.
-func start(program string, confined uint32, deadline time.Time) (*service, error) {
+func start(program string, sandboxed uint32, deadline time.Time) (*service, error) {
 	pair, err := syscall.Socketpair(syscall.AF_UNIX, syscall.SOCK_STREAM|syscall.SOCK_CLOEXEC, 0)
 	if err != nil {
 		return nil, err
@@ -137,7 +137,7 @@ func start(program string, confined uint32, deadline time.Time) (*service, error
 	}
 	theirs.Close() // so that the end of the process is the end of what can be read
 	s.socket.SetDeadline(deadline)
-	if err = s.greet(confined); err != nil {
+	if err = s.greet(sandboxed); err != nil {
 		s.kill()
 		return nil, err
 	}
@@ -150,7 +150,7 @@ func (s *service) kill() {
 	s.socket.Close()
 }
 
-func (s *service) greet(confined uint32) error {
+func (s *service) greet(sandboxed uint32) error {
 	body, err := s.frame(50)
 	if err != nil {
 		return err
@@ -159,8 +159,8 @@ func (s *service) greet(confined uint32) error {
 	if err != nil || string(s.hello.Name[:]) != "IRONMOAT" || s.hello.Version != version {
 		return fmt.Errorf("not a service of version %d", version)
 	}
-	if s.hello.Confinement&confined != confined {
-		return fmt.Errorf("not confined: %#x", s.hello.Confinement)
+	if s.hello.Sandbox&sandboxed != sandboxed {
+		return fmt.Errorf("not sandboxed: %#x", s.hello.Sandbox)
 	}
 	return nil
 }

@@ -14,7 +14,7 @@ import time
 
 KINDS = ["malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound",
          "rejectedByHost", "notEnoughMemory"]
-CONFINED = 0b110_1111_1111  # the bits that a client insists on
+SANDBOXED = 0b110_1111_1111  # the bits that a client insists on
 LIMITS = ["message", "memory", "delivered", "reply", "nesting"]  # in bytes, but for the last
 
 
@@ -108,9 +108,9 @@ class Client:
     """Keeps a service process, which ends with the thread that first needs it. `patience`: seconds
     from one reply to the next."""
 
-    def __init__(self, program, records, patience=2.0, confined=CONFINED):
+    def __init__(self, program, records, patience=2.0, sandboxed=SANDBOXED):
         self.program, self.records, self.process = program, records, None
-        self.patience, self.confined = patience, confined
+        self.patience, self.sandboxed = patience, sandboxed
 
     def unpack(self, requests):
         """The outcomes of the requests, (output type, message), in their order: a record as a dict,
@@ -144,7 +144,7 @@ class Client:
             self.move(b"", deadline)
         require(len(hello) == 50 and hello[:10] == b"IRONMOAT\1\0", "not a service of version 1")
         in_force, *limits = struct.unpack("<IQQQQI", hello[10:])
-        require(in_force & self.confined == self.confined, f"not confined: {in_force:#x}")
+        require(in_force & self.sandboxed == self.sandboxed, f"not sandboxed: {in_force:#x}")
         self.limits = dict(zip(LIMITS, limits))
 
     def exchange(self, requests, outcomes):

@@ -7,8 +7,8 @@ use std::os::unix::{io::OwnedFd, net::UnixStream};
 use std::process::{Child, Command, Stdio};
 use std::time::{Duration, Instant};
 
-/// The bits of confinement that a service as it should be has on any kernel.
-pub const CONFINED: u32 = 0b110_1111_1111;
+/// The bits of sandbox that a service as it should be has on any kernel.
+pub const SANDBOXED: u32 = 0b110_1111_1111;
 
 const KINDS: [&str; 7] =
     ["malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound", "rejectedByHost",
@@ -31,14 +31,14 @@ pub trait Schema: Value {
 pub struct Client {
     program: String,
     deadline: Duration,
-    confined: u32,
+    sandboxed: u32,
     service: Option<Service>,
 }
 
 impl Client {
-    /// `deadline` is for one message; without a bit of `confined` it goes no further.
-    pub fn new(program: &str, deadline: Duration, confined: u32) -> Self {
-        Client { program: program.to_string(), deadline, confined, service: None }
+    /// `deadline` is for one message; without a bit of `sandboxed` it goes no further.
+    pub fn new(program: &str, deadline: Duration, sandboxed: u32) -> Self {
+        Client { program: program.to_string(), deadline, sandboxed, service: None }
     }
 
     /// Tries a second time when the process was an old one: that may have ended for a reason of its
@@ -72,7 +72,7 @@ impl Client {
             .spawn()
             .map_err(text)?;
         let mut service = Service { process, socket, last_id: 0, limits: Limits::default() };
-        service.greet(self.confined, Instant::now() + self.deadline)?;
+        service.greet(self.sandboxed, Instant::now() + self.deadline)?;
         Ok(service)
     }
 }
@@ -103,13 +103,13 @@ impl Drop for Service {
 }
 
 impl Service {
-    fn greet(&mut self, confined: u32, deadline: Instant) -> Result<(), Broken> {
+    fn greet(&mut self, sandboxed: u32, deadline: Instant) -> Result<(), Broken> {
         let body = self.frame(50, deadline)?;
         let mut hello = Reader { rest: &body, memory: 0, delivered: 0, depth: 0 };
         let named = hello.take(8)? == b"IRONMOAT";
         require(named && hello.number(2)? == u64::from(VERSION), "not a service of this version")?;
         let in_force = hello.number(4)? as u32;
-        require(in_force & confined == confined, "not confined")?;
+        require(in_force & sandboxed == sandboxed, "not sandboxed")?;
         self.limits = Limits {
             message: hello.number(8)?,
             record: hello.number(8)?,

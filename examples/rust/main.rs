@@ -1,5 +1,5 @@
-//! unpack SERVICE [CONFINED]: reads lines "OUTPUT_TYPE FILE" and prints a line of JSON for each:
-//! {"record": ...}, {"error": ...} or {"failure": ...}. CONFINED: the bits to insist on.
+//! unpack SERVICE [SANDBOXED]: reads lines "OUTPUT_TYPE FILE" and prints a line of JSON for each:
+//! {"record": ...}, {"error": ...} or {"failure": ...}. SANDBOXED: the bits to insist on.
 
 mod client;
 mod json;
@@ -12,7 +12,7 @@ mod types {
     include!(concat!(env!("IRONMOAT_TYPES"), "/types.rs"));
 }
 
-use client::{Client, Error, Schema, CONFINED};
+use client::{Client, Error, Schema, SANDBOXED};
 use json::{Json, Object};
 use std::io::BufRead;
 
@@ -45,9 +45,9 @@ fn line<R: Schema + Json>(outcome: Result<R, Error>) -> String {
 
 fn main() {
     let arguments: Vec<String> = std::env::args().collect();
-    let confined = arguments.get(2).map_or(CONFINED, |bits| bits.parse().expect("a number"));
+    let sandboxed = arguments.get(2).map_or(SANDBOXED, |bits| bits.parse().expect("a number"));
     let deadline = std::time::Duration::from_secs(2);
-    let mut client = Client::new(&arguments[1], deadline, confined);
+    let mut client = Client::new(&arguments[1], deadline, sandboxed);
     for request in std::io::stdin().lock().lines() {
         let request = request.expect("a line of text");
         let (output_type, file) = request.split_once(' ').expect("a type and a file");

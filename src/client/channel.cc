@@ -6,8 +6,8 @@
 #include <iterator>
 #include <utility>
 
-#include "confinement_parts/confinement_parts.h"
 #include "frames/frame.h"
+#include "sandbox_parts/sandbox_parts.h"
 
 namespace ironmoat::client {
 
@@ -23,8 +23,8 @@ constexpr unsigned kMaxDoublings = 4;
 constexpr std::size_t kBatch = std::size_t{64} << 10;
 constexpr std::size_t kMaxCopied = std::size_t{16} << 10;
 
-bool has(const frames::Hello& hello, confinement::Part part) noexcept {
-  return (hello.confinement & static_cast<std::uint32_t>(part)) != 0;
+bool has(const frames::Hello& hello, sandbox::Part part) noexcept {
+  return (hello.sandbox & static_cast<std::uint32_t>(part)) != 0;
 }
 
 }  // namespace
@@ -32,9 +32,9 @@ bool has(const frames::Hello& hello, confinement::Part part) noexcept {
 frames::Hello usableHello(const Data& body) {
   const frames::Hello hello = frames::parseHello(body);
   frames::Hello expected = frames::Hello::ours();
-  expected.confinement = hello.confinement;
+  expected.sandbox = hello.sandbox;
   if (hello != expected) throw frames::FrameError("its limits differ from this library's");
-  for (const auto& [part, name, need] : confinement::kParts) {
+  for (const auto& [part, name, need] : sandbox::kParts) {
     if (isRequired(part) && !has(hello, part)) {
       throw frames::FrameError("its sandbox lacks: " + std::string(name));
     }
@@ -116,7 +116,7 @@ void Channel::startFailed(std::string_view why, bool lasting, TimePoint now) noe
 void Channel::receive(const Data& body, TimePoint now) {
   if (state_ == State::greeting) {
     const frames::Hello hello = usableHello(body);
-    if (!has(hello, confinement::Part::fullMemory)) counters_.add(&Stats::limitedMemory);
+    if (!has(hello, sandbox::Part::fullMemory)) counters_.add(&Stats::limitedMemory);
     state_ = State::ready;
     return startClock(now);
   }

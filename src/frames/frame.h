@@ -33,7 +33,7 @@ class FrameError : public std::runtime_error {
 
 /// The service's first frame: its sandbox and its limits, by default those of this build.
 struct Hello {
-  std::uint32_t confinement = 0;  ///< bits of confinement::Part
+  std::uint32_t sandbox = 0;  ///< bits of sandbox::Part
   std::uint64_t messageBytes = limits::messageBytes;
   std::uint64_t recordBytes = limits::recordBytes;
   std::uint64_t deliveredBytes = limits::deliveredBytes;
@@ -44,8 +44,8 @@ struct Hello {
   friend bool operator==(const Hello&, const Hello&) = default;
 
   using H = Hello;
-  using Fields = FieldList<H, &H::confinement, &H::messageBytes, &H::recordBytes,
-                           &H::deliveredBytes, &H::replyBytes, &H::nestedContainers>;
+  using Fields = FieldList<H, &H::sandbox, &H::messageBytes, &H::recordBytes, &H::deliveredBytes,
+                           &H::replyBytes, &H::nestedContainers>;
 };
 
 struct Request {

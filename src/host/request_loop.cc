@@ -10,7 +10,7 @@
 #include <new>
 #include <span>
 
-#include "confinement/memory.h"
+#include "sandbox/memory.h"
 
 namespace ironmoat::host {
 
@@ -99,13 +99,13 @@ bool RequestLoop::receive() {
 void RequestLoop::rest() {
   static_cast<void>(replies_.finish());
   assembler_.wipeSpare();
-  confinement::wipeAndReleaseMemory();
+  sandbox::wipeAndReleaseMemory();
 }
 
 void RequestLoop::release() {
   flush();
   static_cast<void>(replies_.finish());
-  confinement::releaseMemory();
+  sandbox::releaseMemory();
 }
 
 bool RequestLoop::flush() {

@@ -8,11 +8,11 @@
 #include <exception>
 #include <new>
 
-#include "confinement/confinement.h"
-#include "confinement/memory.h"
 #include "frames/frame.h"
 #include "host/request_loop.h"
 #include "ironmoat/errors.h"
+#include "sandbox/memory.h"
+#include "sandbox/sandbox.h"
 #include "values/host_rejection.h"
 
 namespace ironmoat {
@@ -74,12 +74,12 @@ void IronmoatServer::run() {
   // When the peer stops reading, or the output is a file, the service ends in order.
   static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
   static_cast<void>(std::signal(SIGXFSZ, SIG_IGN));
-  confinement::prepareMemory();
+  sandbox::prepareMemory();
   host::RequestLoop loop(*this, STDIN_FILENO, STDOUT_FILENO);
   frames::Hello hello = frames::Hello::ours();
   try {
-    if (confine_ == Confine::yes) hello.confinement = confinement::confine();
-  } catch (const confinement::CannotConfine& error) {
+    if (sandboxed_ == Sandboxed::yes) hello.sandbox = sandbox::enter();
+  } catch (const sandbox::Unavailable& error) {
     std::_Exit(error.exitStatus());
   }
   loop.run(hello);

@@ -25,10 +25,10 @@ class IronmoatServer {
   /// The shared instance. It lives as long as the process.
   static IronmoatServer& service();
 
-  enum class Confine : std::uint8_t { yes, no };
+  enum class Sandboxed : std::uint8_t { yes, no };
 
-  /// An unconfined server is for tests and measurements; clients reject it.
-  explicit IronmoatServer(Confine confine = Confine::yes) noexcept : confine_(confine) {}
+  /// An unsandboxed server is for tests and measurements; clients reject it.
+  explicit IronmoatServer(Sandboxed sandboxed = Sandboxed::yes) noexcept : sandboxed_(sandboxed) {}
   IronmoatServer(const IronmoatServer&) = delete;
   IronmoatServer& operator=(const IronmoatServer&) = delete;
   virtual ~IronmoatServer() = default;
@@ -45,7 +45,7 @@ class IronmoatServer {
   /// Sandboxes the process for good, then serves on the calling thread until the end of input.
   /// Also returns if the peer violates the protocol or stops reading. If a required part of the
   /// sandbox is unavailable, the process ends before it has read or written anything, with the exit
-  /// status of that part (confinement::statusWithout).
+  /// status of that part (sandbox::statusWithout).
   virtual void run();
 
   /// Appends the whole reply frame to the frame body of a request. Throws nothing that a request
@@ -65,7 +65,7 @@ class IronmoatServer {
   /// As `serve`, but throws std::bad_alloc if memory runs out and leaves `reply` as it was.
   void answer(const Data& request, BlockBuilder& reply) const;
 
-  Confine confine_;
+  Sandboxed sandboxed_;
   std::vector<Registration> registrations_;
 };
 

@@ -18,10 +18,10 @@
 #include <iomanip>
 #include <string_view>
 
-#include "confinement/confinement.h"
 #include "frames/frame.h"
 #include "frames/frame_assembler.h"
 #include "process/service_process.h"
+#include "sandbox/sandbox.h"
 
 namespace ironmoat::inspect {
 
@@ -83,7 +83,7 @@ constexpr ForbiddenAction kForbidden[] = {
      }},
     {"take more memory than the limit", kNoMemory,
      [] {
-       void* const memory = ::mmap(nullptr, confinement::kAddressSpace, PROT_READ | PROT_WRITE,
+       void* const memory = ::mmap(nullptr, sandbox::kAddressSpace, PROT_READ | PROT_WRITE,
                                    MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
        return memory == MAP_FAILED ? -1L : 0L;
      }},
@@ -97,8 +97,8 @@ std::string resultOf(Action perform) {
     ::alarm(kActionTimeout);
     ::dup2(::open("/dev/null", O_WRONLY), STDERR_FILENO);  // the filter's own line
     try {
-      confinement::confine();
-    } catch (const confinement::CannotConfine&) {
+      sandbox::enter();
+    } catch (const sandbox::Unavailable&) {
       ::_exit(kNoSandbox);
     }
     ::_exit(perform() < 0 ? errno : 0);
@@ -140,7 +140,7 @@ int selfTest(std::ostream& out, const std::string& serviceProgram) {
   std::uint32_t bits = 0;
   try {
     process::ServiceProcess process = process::ServiceProcess::start(serviceProgram);
-    bits = helloOf(process).confinement;
+    bits = helloOf(process).sandbox;
   } catch (const std::exception& error) {
     out << "cannot use " << serviceProgram << ": " << error.what() << '\n';
     return 2;
@@ -153,11 +153,11 @@ int selfTest(std::ostream& out, const std::string& serviceProgram) {
     if (!safe) status = 1;
   };
   out << "In force in " << serviceProgram << ":\n";
-  for (const confinement::PartDescription& known : confinement::kParts) {
+  for (const sandbox::PartDescription& known : sandbox::kParts) {
     const bool inForce = (bits & static_cast<std::uint32_t>(known.part)) != 0;
     line(known.name, inForce ? "yes" : "no", inForce || !isRequired(known.part));
   }
-  if (confinement::kSanitizedBuild) {
+  if (sandbox::kSanitizedBuild) {
     out << "Nothing tried: a build with a sanitizer has no filter.\n";
     return status;
   }

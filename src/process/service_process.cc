@@ -14,7 +14,7 @@
 #include <system_error>
 #include <utility>
 
-#include "confinement_parts/confinement_parts.h"
+#include "sandbox_parts/sandbox_parts.h"
 
 namespace ironmoat::process {
 
@@ -62,7 +62,7 @@ struct SpawnSettings {
 
 std::string exitWord(int status) {
   std::string word = "exited with status " + std::to_string(status);
-  if (const auto* const lack = confinement::lackToldBy(status)) {
+  if (const auto* const lack = sandbox::lackToldBy(status)) {
     word += " (unavailable part of its sandbox: " + std::string(lack->name) + ")";
   }
   return word;

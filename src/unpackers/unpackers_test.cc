@@ -138,7 +138,7 @@ TEST_F(Unpackers, InitialiseTheHeadersOfAResponseFirst) {
 }
 
 TEST_F(Unpackers, ReplyRejectedByHostWhateverTheInitialiserThrows) {
-  IronmoatServer server(IronmoatServer::Confine::no);
+  IronmoatServer server(IronmoatServer::Sandboxed::no);
   server.registerUnpacker<VeskCommandResponse>(VeskCommandResponseUnpacker());
   const auto served = [&] {
     const Data bytes = message(payload(9));

@@ -13,8 +13,8 @@
 #include <vector>
 
 #include "client/channel.h"
-#include "confinement_parts/confinement_parts.h"
 #include "frames/frame_assembler.h"
+#include "sandbox_parts/sandbox_parts.h"
 
 namespace ironmoat::testing {
 
@@ -194,7 +194,7 @@ class ChannelGame {
   void sayHello() {
     if (channel_.state() != client::Channel::State::greeting) return;
     frames::Hello hello = frames::Hello::ours();
-    hello.confinement = confinement::kRequiredParts;
+    hello.sandbox = sandbox::kRequiredParts;
     BlockBuilder frame;
     frames::appendHello(frame, hello);
     channel_.receive(Data(std::string_view(frame.bytes(), frame.size()).substr(4)), now_);

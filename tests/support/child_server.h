@@ -107,7 +107,7 @@ class ChildServer {
   /// The bits of its hello; 0 without one.
   std::uint32_t reportedParts() {
     const auto body = receive();
-    return body ? frames::parseHello(*body).confinement : 0;
+    return body ? frames::parseHello(*body).sandbox : 0;
   }
   /// Waits for the process; its status as waitpid gives it.
   int end() {

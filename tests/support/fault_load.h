@@ -19,9 +19,9 @@
 #include <utility>
 #include <vector>
 
-#include "confinement_parts/confinement_parts.h"
 #include "ironmoat/client.h"
 #include "ironmoat/command_response.h"
+#include "sandbox_parts/sandbox_parts.h"
 #include "support/client_outcome.h"
 #include "support/leak_check.h"
 
@@ -34,7 +34,7 @@ using Clock = std::chrono::steady_clock;
 /// `--full` was given: minutes by hand instead of seconds in CI.
 inline bool fullSize = false;
 inline int sized(int usual, int full) {
-  return fullSize ? full : confinement::kSanitizedBuild ? std::max(usual / 5, 2) : usual;
+  return fullSize ? full : sandbox::kSanitizedBuild ? std::max(usual / 5, 2) : usual;
 }
 
 using FaultsTest = LeakCheck;

@@ -1,5 +1,5 @@
-// unpack SERVICE [CONFINED]: reads lines "OUTPUT_TYPE FILE" and prints a line of JSON for each:
-// {"record": ...}, {"error": ...} or {"failure": ...}. CONFINED: the bits to insist on.
+// unpack SERVICE [SANDBOXED]: reads lines "OUTPUT_TYPE FILE" and prints a line of JSON for each:
+// {"record": ...}, {"error": ...} or {"failure": ...}. SANDBOXED: the bits to insist on.
 package main
 
 import (
@@ -38,11 +38,11 @@ func unpack(client *ironmoat.Client, outputType string, message []byte) map[stri
 
 func main() {
 	client := &ironmoat.Client{
-		Program: os.Args[1], Deadline: 2 * time.Second, Confined: ironmoat.Confined}
+		Program: os.Args[1], Deadline: 2 * time.Second, Sandboxed: ironmoat.Sandboxed}
 	defer client.Close()
 	if len(os.Args) > 2 {
 		bits, _ := strconv.ParseUint(os.Args[2], 0, 32)
-		client.Confined = uint32(bits)
+		client.Sandboxed = uint32(bits)
 	}
 	for lines := bufio.NewScanner(os.Stdin); lines.Scan(); {
 		outputType, file, _ := strings.Cut(lines.Text(), " ")

@@ -1,9 +1,9 @@
-#include "confinement_parts/confinement_parts.h"
+#include "sandbox_parts/sandbox_parts.h"
 
 #include <algorithm>
 #include <iterator>
 
-namespace ironmoat::confinement {
+namespace ironmoat::sandbox {
 
 const PartDescription* lackToldBy(int exitStatus) noexcept {
   const auto* const found = std::find_if(
@@ -12,4 +12,4 @@ const PartDescription* lackToldBy(int exitStatus) noexcept {
   return found == std::end(kParts) ? nullptr : found;
 }
 
-}  // namespace ironmoat::confinement
+}  // namespace ironmoat::sandbox

@@ -6,7 +6,7 @@
 
 /// What a sandboxed service tells about its sandbox, and what a client requires of it. Apart from
 /// the sandbox itself, which no client may contain.
-namespace ironmoat::confinement {
+namespace ironmoat::sandbox {
 
 /// A restriction on every thread of a service. The value is its bit in a hello.
 enum class Part : std::uint32_t {
@@ -17,7 +17,7 @@ enum class Part : std::uint32_t {
   noFileGrowth = 1U << 4U,       ///< file size limit 0
   noOpenFiles = 1U << 5U,        ///< the standard three descriptors and, limit 0, no other
   noProcesses = 1U << 6U,        ///< process limit 0, threads included
-  addressSpaceLimit = 1U << 7U,  ///< of confinement/confinement.h, or an inherited lower one
+  addressSpaceLimit = 1U << 7U,  ///< of sandbox/sandbox.h, or an inherited lower one
   noNewCode = 1U << 8U,          ///< memory once writable never becomes executable; Linux 6.3
   endsWithParent = 1U << 9U,     ///< killed when the process that started it ends
   noCapabilities = 1U << 10U,    ///< none of root's privileges, also when started by root
@@ -86,4 +86,4 @@ inline constexpr std::uint32_t kRequiredParts = [] {
   return (kRequiredParts & static_cast<std::uint32_t>(part)) != 0;
 }
 
-}  // namespace ironmoat::confinement
+}  // namespace ironmoat::sandbox

@@ -1,4 +1,4 @@
-#include "confinement/seccomp_filter.h"
+#include "sandbox/seccomp_filter.h"
 
 #include <seccomp.h>
 #include <sys/mman.h>
@@ -10,9 +10,9 @@
 #include <ctime>
 #include <initializer_list>
 
-#include "confinement/last_word.h"
+#include "sandbox/last_word.h"
 
-namespace ironmoat::confinement {
+namespace ironmoat::sandbox {
 
 namespace {
 
@@ -111,4 +111,4 @@ bool filterSystemCalls() noexcept {
   return errno == 0;
 }
 
-}  // namespace ironmoat::confinement
+}  // namespace ironmoat::sandbox

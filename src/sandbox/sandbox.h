@@ -4,19 +4,19 @@
 #include <cstdint>
 #include <system_error>
 
-#include "confinement_parts/confinement_parts.h"
+#include "sandbox_parts/sandbox_parts.h"
 
 /// Takes from a process all rights that unpacking does not need, before the process reads the first
 /// byte of a request. Needs no privilege, no file and no namespace; cannot be undone.
-namespace ironmoat::confinement {
+namespace ironmoat::sandbox {
 
 /// Bytes of address space for the whole process.
 inline constexpr std::size_t kAddressSpace = std::size_t{1} << 30;
 
 /// A required part of the sandbox is unavailable; `code()` says why.
-class CannotConfine : public std::system_error {
+class Unavailable : public std::system_error {
  public:
-  CannotConfine(Part part, int error);
+  Unavailable(Part part, int error);
   /// The exit status of a process that does not run without the part: see lackToldBy().
   [[nodiscard]] int exitStatus() const noexcept { return exitStatus_; }
 
@@ -26,7 +26,7 @@ class CannotConfine : public std::system_error {
 
 /// Sandboxes the process, which must have a single thread, for good. Returns the bits of the Parts
 /// in force: all but those that this kernel, this processor or a sanitizer does not allow. Throws
-/// CannotConfine; then some of the parts are in force.
-std::uint32_t confine();
+/// Unavailable; then some of the parts are in force.
+std::uint32_t enter();
 
-}  // namespace ironmoat::confinement
+}  // namespace ironmoat::sandbox

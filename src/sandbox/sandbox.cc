@@ -1,4 +1,4 @@
-#include "confinement/confinement.h"
+#include "sandbox/sandbox.h"
 
 #include <fcntl.h>
 #include <linux/capability.h>
@@ -15,10 +15,10 @@
 #include <exception>
 #include <string>
 
-#include "confinement/seccomp_filter.h"
 #include "ironmoat/limits.h"
+#include "sandbox/seccomp_filter.h"
 
-namespace ironmoat::confinement {
+namespace ironmoat::sandbox {
 
 namespace {
 
@@ -88,7 +88,7 @@ class Parts {
   template <class Act>
   void require(Part part, Act act) {
     if (!isRequired(part)) return;
-    if (!act()) throw CannotConfine(part, errno);
+    if (!act()) throw Unavailable(part, errno);
     inForce(part);
   }
   void inForce(Part part) noexcept { bits_ |= static_cast<std::uint32_t>(part); }
@@ -100,12 +100,12 @@ class Parts {
 
 }  // namespace
 
-CannotConfine::CannotConfine(Part part, int error)
+Unavailable::Unavailable(Part part, int error)
     : std::system_error(error, std::generic_category(),
                         "unavailable: " + std::string(lackToldBy(statusWithout(part))->name)),
       exitStatus_(statusWithout(part)) {}
 
-std::uint32_t confine() {
+std::uint32_t enter() {
   throwOnce();
   Parts parts;
   parts.require(Part::endsWithParent, [] {
@@ -140,4 +140,4 @@ std::uint32_t confine() {
   return parts.bits();
 }
 
-}  // namespace ironmoat::confinement
+}  // namespace ironmoat::sandbox

@@ -1,6 +1,6 @@
 // The sandbox from inside: children that sandbox themselves and then do one thing. (S12)
 
-#include "confinement/confinement.h"
+#include "sandbox/sandbox.h"
 
 #include <alloca.h>
 #include <fcntl.h>
@@ -21,9 +21,9 @@
 #include <set>
 #include <string>
 
-#include "confinement/memory.h"
+#include "sandbox/memory.h"
 
-namespace ironmoat::confinement {
+namespace ironmoat::sandbox {
 namespace {
 
 using Arguments = std::array<long, 6>;
@@ -49,12 +49,12 @@ std::string outcomeOf(const std::function<long()>& act, int words = open("/dev/n
   return WEXITSTATUS(status) == 0 ? "returned" : strerrorname_np(WEXITSTATUS(status));
 }
 
-std::string confinedOutcomeOf(const std::function<long()>& act) {
-  return outcomeOf([&] { return confine(), act(); });
+std::string sandboxedOutcomeOf(const std::function<long()>& act) {
+  return outcomeOf([&] { return enter(), act(); });
 }
-std::string confinedOutcomeOf(const Call& call) {
+std::string sandboxedOutcomeOf(const Call& call) {
   const Arguments& a = call.arguments;
-  return confinedOutcomeOf(
+  return sandboxedOutcomeOf(
       [&] { return syscall(call.number, a[0], a[1], a[2], a[3], a[4], a[5]); });
 }
 
@@ -114,25 +114,25 @@ TEST_F(SandboxTest, AllowsListedCallsWithListedArgumentsOnly) {
   };
   std::set<long> listed = {SYS_openat, SYS_tgkill};
   for (const Call& call : allowed) {
-    EXPECT_NE(confinedOutcomeOf(call), "SIGSYS") << "row " << &call - allowed;
+    EXPECT_NE(sandboxedOutcomeOf(call), "SIGSYS") << "row " << &call - allowed;
     listed.insert(call.number);
   }
   for (const Call& call : forbidden) {
-    EXPECT_EQ(confinedOutcomeOf(call), "SIGSYS") << "row " << &call - forbidden;
+    EXPECT_EQ(sandboxedOutcomeOf(call), "SIGSYS") << "row " << &call - forbidden;
   }
   // Newer kernels ask no filter about uretprobe and uprobe, which fail outside of a trace.
   for (long number = 0; number < 512; ++number) {
     if (number == 335 || number == 336) {
-      EXPECT_NE(confinedOutcomeOf({number}), "returned");
+      EXPECT_NE(sandboxedOutcomeOf({number}), "returned");
     } else if (!listed.contains(number)) {
-      EXPECT_EQ(confinedOutcomeOf({number}), "SIGSYS") << "system call " << number;
+      EXPECT_EQ(sandboxedOutcomeOf({number}), "SIGSYS") << "system call " << number;
     }
   }
   for (const long flags : {O_RDONLY, O_CREAT | O_WRONLY}) {
-    EXPECT_EQ(confinedOutcomeOf({SYS_openat, {AT_FDCWD, path, flags, 0600}}), "ENOENT");
+    EXPECT_EQ(sandboxedOutcomeOf({SYS_openat, {AT_FDCWD, path, flags, 0600}}), "ENOENT");
   }
   for (const long signal : {0, 1, SIGABRT - 1, SIGABRT, SIGABRT + 1, 64}) {
-    EXPECT_EQ(confinedOutcomeOf([&] { return syscall(SYS_tgkill, getpid(), gettid(), signal); }),
+    EXPECT_EQ(sandboxedOutcomeOf([&] { return syscall(SYS_tgkill, getpid(), gettid(), signal); }),
               signal == SIGABRT ? "SIGABRT" : "SIGSYS");
   }
 }
@@ -145,7 +145,7 @@ TEST_F(SandboxTest, FiltersCallsByThe32BitGate) {
     return result;
   };
   if (outcomeOf(getpidByTheGate) == "SIGSEGV") GTEST_SKIP() << "this kernel has no such gate";
-  EXPECT_EQ(confinedOutcomeOf(getpidByTheGate), "SIGSYS");
+  EXPECT_EQ(sandboxedOutcomeOf(getpidByTheGate), "SIGSYS");
 }
 #endif
 
@@ -154,7 +154,7 @@ TEST_F(SandboxTest, NamesForbiddenCallOnStandardError) {
   for (const auto& [number, name] : rows) {
     int ends[2];
     ASSERT_EQ(pipe(ends), 0);
-    const auto call = [forbidden = number] { return confine(), syscall(forbidden); };
+    const auto call = [forbidden = number] { return enter(), syscall(forbidden); };
     EXPECT_EQ(outcomeOf(call, ends[1]), "SIGSYS");
     char words[100] = {};
     EXPECT_GT(read(ends[0], words, sizeof words - 1), 0);
@@ -162,29 +162,29 @@ TEST_F(SandboxTest, NamesForbiddenCallOnStandardError) {
     close(ends[0]);
   }
   const int file = open("/tmp", O_TMPFILE | O_WRONLY, 0600);
-  EXPECT_EQ(outcomeOf([] { return confine(), syscall(SYS_socket); }, file), "SIGSYS");
+  EXPECT_EQ(outcomeOf([] { return enter(), syscall(SYS_socket); }, file), "SIGSYS");
   EXPECT_EQ(outcomeOf([] {
               sigset_t all;
               sigfillset(&all);
               pthread_sigmask(SIG_SETMASK, &all, nullptr);
-              return confine(), syscall(SYS_socket);
+              return enter(), syscall(SYS_socket);
             }),
             "SIGSYS");
 }
 
 /// A child that runs `prepare`, sandboxes itself, and computes until it is killed.
-class ConfinedChild {
+class SandboxedChild {
  public:
-  explicit ConfinedChild(const std::function<void()>& prepare) : pid_(fork()) {
+  explicit SandboxedChild(const std::function<void()>& prepare) : pid_(fork()) {
     if (pid_ != 0) return;
     prepare();
-    confine();
+    enter();
     for (volatile bool forever = true; forever;) {
     }
   }
-  ConfinedChild(const ConfinedChild&) = delete;
-  ConfinedChild& operator=(const ConfinedChild&) = delete;
-  ~ConfinedChild() {
+  SandboxedChild(const SandboxedChild&) = delete;
+  SandboxedChild& operator=(const SandboxedChild&) = delete;
+  ~SandboxedChild() {
     kill(pid_, SIGKILL);
     waitpid(pid_, nullptr, 0);
   }
@@ -204,7 +204,7 @@ class ConfinedChild {
 TEST_F(SandboxTest, ClosesDescriptorsThatWereOpen) {
   int ends[2];
   ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, ends), 0);
-  const ConfinedChild child([] {});
+  const SandboxedChild child([] {});
   close(ends[1]);
   pollfd closed = {ends[0], POLLIN, 0};
   EXPECT_EQ(poll(&closed, 1, 5000), 1) << "the child still holds the other end";
@@ -215,7 +215,7 @@ TEST_F(SandboxTest, EndsWithReaderOfStandardErrorWhenThatIsAPipeInPacketMode) {
   for (const int mode : {O_DIRECT, 0}) {
     int ends[2];
     ASSERT_EQ(pipe2(ends, mode), 0);
-    const ConfinedChild child([&] {
+    const SandboxedChild child([&] {
       close(ends[0]);
       dup2(ends[1], STDERR_FILENO);
     });
@@ -241,4 +241,4 @@ TEST(WipeMemory, LeavesStackInUseWhereverItEndsInAPage) {
 }
 
 }  // namespace
-}  // namespace ironmoat::confinement
+}  // namespace ironmoat::sandbox

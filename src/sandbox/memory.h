@@ -1,7 +1,7 @@
 #pragma once
 
 /// The memory of the service process. Not thread-safe: the process has one thread.
-namespace ironmoat::confinement {
+namespace ironmoat::sandbox {
 
 /// Configures malloc and grows the stack to the size that the deepest message needs. Must be called
 /// before the address space is limited: a stack that cannot grow is a crash.
@@ -14,4 +14,4 @@ void releaseMemory() noexcept;
 /// message remains, and returns free memory to the kernel. Takes tens of microseconds.
 void wipeAndReleaseMemory() noexcept;
 
-}  // namespace ironmoat::confinement
+}  // namespace ironmoat::sandbox

@@ -1,4 +1,4 @@
-#include "confinement/memory.h"
+#include "sandbox/memory.h"
 
 #include <malloc.h>
 #include <sys/mman.h>
@@ -13,9 +13,9 @@
 #include <new>
 #include <utility>
 
-#include "confinement_parts/confinement_parts.h"
+#include "sandbox_parts/sandbox_parts.h"
 
-namespace ironmoat::confinement {
+namespace ironmoat::sandbox {
 
 namespace {
 
@@ -96,7 +96,7 @@ void wipeAndReleaseMemory() noexcept {
   // The kernel wipes whole free pages. Free memory in pages that are also in use is taken from
   // malloc piece by piece, from large to small.
   releaseMemory();
-  if constexpr (!confinement::kSanitizedBuild) {
+  if constexpr (!sandbox::kSanitizedBuild) {
     ::mallopt(M_TOP_PAD, 0);  // so that the heap hardly grows for a piece that does not fit
     Piece* taken = nullptr;
     for (std::size_t size = std::size_t{64} << 10; size > 1024; size /= 2) {
@@ -112,4 +112,4 @@ void wipeAndReleaseMemory() noexcept {
   wipeStack();
 }
 
-}  // namespace ironmoat::confinement
+}  // namespace ironmoat::sandbox

@@ -20,17 +20,17 @@
 #include <string>
 #include <thread>
 
-#include "confinement/confinement.h"
 #include "frames/record_codec.h"
 #include "ironmoat/limits.h"
+#include "sandbox/sandbox.h"
 #include "support/child_server.h"
 
 namespace ironmoat {
 namespace {
 
 using namespace std::chrono_literals;
-using confinement::Part;
 using frames::Status;
+using sandbox::Part;
 using testing::ChildServer;
 
 /// By its descriptor, for a user who has no access to its folder.
@@ -43,7 +43,7 @@ void runTestServer() { run(TEST_SERVER); }
 
 bool isIn(std::uint32_t bits, Part part) { return (bits & static_cast<std::uint32_t>(part)) != 0; }
 bool hasRequiredParts(std::uint32_t bits) {
-  return (bits & confinement::kRequiredParts) == confinement::kRequiredParts;
+  return (bits & sandbox::kRequiredParts) == sandbox::kRequiredParts;
 }
 
 std::string processFile(pid_t pid, const char* name) {
@@ -61,7 +61,7 @@ std::string request(std::uint64_t id, std::string_view type = VeskCommandRespons
 class SandboxedService : public ::testing::Test {
  protected:
   void SetUp() override {
-    if (confinement::kSanitizedBuild) GTEST_SKIP() << "a sanitizer needs what the sandbox forbids";
+    if (sandbox::kSanitizedBuild) GTEST_SKIP() << "a sanitizer needs what the sandbox forbids";
   }
 };
 
@@ -73,7 +73,7 @@ TEST_F(SandboxedService, HasItsSandboxInTheKernelToo) {
                                            {RLIMIT_FSIZE, 0},
                                            {RLIMIT_NOFILE, 0},
                                            {RLIMIT_NPROC, 0},
-                                           {RLIMIT_AS, confinement::kAddressSpace}}) {
+                                           {RLIMIT_AS, sandbox::kAddressSpace}}) {
     rlimit value = {};
     EXPECT_EQ(prlimit(service.pid(), resource, nullptr, &value), 0);
     EXPECT_EQ(value.rlim_max, expected) << resource;
@@ -158,7 +158,7 @@ TEST_F(SandboxedService, RejectsMessageThatExceedsItsMemoryAndServesTheNext) {
 
 TEST_F(SandboxedService, ReportsThatItInheritedALowerLimitOnMemory) {
   ChildServer server([] {
-    const rlimit half = {confinement::kAddressSpace / 2, confinement::kAddressSpace / 2};
+    const rlimit half = {sandbox::kAddressSpace / 2, sandbox::kAddressSpace / 2};
     setrlimit(RLIMIT_AS, &half);
     runTestServer();
   });
@@ -288,7 +288,7 @@ TEST(Service, ServesThroughNonBlockingPipesWhileItIsStoppedAndContinued) {
 /// Both directions of the connection are full, and stay so for most of the replies.
 TEST(Service, NeitherGrowsNorGivesUpWhenItsPeerHardlyReads) {
   constexpr int kRequests = 48;
-  constexpr std::size_t kMaxPeak = confinement::kSanitizedBuild ? 4096 : 256;  // MiB
+  constexpr std::size_t kMaxPeak = sandbox::kSanitizedBuild ? 4096 : 256;  // MiB
   ChildServer server(runTestServer);
   BlockBuilder requests;
   for (int id = 0; id < kRequests; ++id) {

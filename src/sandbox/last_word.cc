@@ -1,4 +1,4 @@
-#include "confinement/last_word.h"
+#include "sandbox/last_word.h"
 
 #include <sys/syscall.h>  // for system_call_names.inc
 #include <unistd.h>
@@ -9,7 +9,7 @@
 #include <iterator>
 #include <string_view>
 
-namespace ironmoat::confinement {
+namespace ironmoat::sandbox {
 
 namespace {
 
@@ -56,4 +56,4 @@ void nameForbiddenCall() noexcept {
   ::sigaction(SIGSYS, &action, nullptr);
 }
 
-}  // namespace ironmoat::confinement
+}  // namespace ironmoat::sandbox
