@@ -128,7 +128,7 @@ class Answers(unittest.TestCase):
 class FramesPage(unittest.TestCase):
     def test_shows_an_exchange_that_the_service_repeats(self):
         """Apart from the bits of the sandbox, which depend on the machine."""
-        page = (ROOT / "doc/frames.md").read_text()
+        page = (ROOT / "doc/protocol.md").read_text()
         lines = re.findall(r"^([<>]) ((?:[0-9a-f]{2} )+)", page, re.MULTILINE)
         sent, received = (bytes.fromhex("".join(line for sign, line in lines if sign == wanted))
                           for wanted in "><")

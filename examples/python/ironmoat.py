@@ -1,4 +1,4 @@
-"""A client of VeskIronmoatService in plain Python; doc/frames.md is all that one needs to know.
+"""A client of VeskIronmoatService in plain Python; doc/protocol.md is all that one needs to know.
 
     ironmoat.py PROGRAM RECORDS.JSON OUTPUT_TYPE FILE...
 

@@ -12,7 +12,7 @@ INTRODUCTION = """\
 # Records
 
 The fields of all records, in the order in which they are decoded, in which the initialisers take
-them, and in which they lie in a reply ([frames.md](frames.md)). Printed from the tables in the code
+them, and in which they lie in a reply ([protocol.md](protocol.md)). Printed from the tables in the code
 by `scripts/refresh`; [records.json](records.json) holds the same for programs.
 
 - *key*: under which the message's dictionary has it. Keys are compared byte by byte. An entry under

@@ -13,7 +13,7 @@
 #include "ironmoat/values.h"
 #include "values/block_builder.h"
 
-/// The frames between a client and a service; doc/frames.md specifies every byte.
+/// The frames between a client and a service; doc/protocol.md specifies every byte.
 namespace ironmoat::frames {
 
 inline constexpr std::uint16_t kVersion = 1;

@@ -8,7 +8,7 @@
 
 namespace ironmoat::frames {
 
-/// Bytes or a record violate what doc/frames.md specifies for records of the type.
+/// Bytes or a record violate what doc/protocol.md specifies for records of the type.
 class RecordError : public std::runtime_error {
  public:
   using std::runtime_error::runtime_error;

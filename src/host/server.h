@@ -19,7 +19,7 @@ class RequestLoop;
 }
 
 /// Serves unpack requests over the process's standard input and output: one connected stream
-/// socket, or two pipes. doc/frames.md specifies the protocol.
+/// socket, or two pipes. doc/protocol.md specifies the protocol.
 class IronmoatServer {
  public:
   /// The shared instance. It lives as long as the process.
