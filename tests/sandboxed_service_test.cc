@@ -259,6 +259,7 @@ TEST(Service, EndsInOrderWhenItCannotWrite) {
     dup2(open("/tmp", O_TMPFILE | O_WRONLY, 0600), STDOUT_FILENO);
     runService();
   });
+  toFile.endInput();
   EXPECT_EQ(toFile.end(), 0);
 }
 
