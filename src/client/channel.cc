@@ -150,6 +150,7 @@ bool Channel::blame(RequestList& suspects, const Loss& loss) noexcept {
   } else {
     return false;
   }
+  if (front.isRetried() && startFailures_ > 0) --startFailures_;  // its first loss was none
   finished_.splice(finished_.end(), suspects, suspects.begin());
   return true;
 }

@@ -76,7 +76,8 @@ class RequestIds {
 ///
 /// Invariants: requests are in the order of `add`, but for retries, which come first; an id that
 /// was not drawn for the front is never accepted; a process that is lost before its first reply and
-/// blamed on no request counts as a failed start. Not thread-safe.
+/// blamed on no request counts as a failed start, until a request that was in it is blamed for
+/// another one. Not thread-safe.
 class Channel {
  public:
   enum class State : std::uint8_t { absent, greeting, ready };

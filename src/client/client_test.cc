@@ -186,6 +186,21 @@ TEST_F(ClientTest, FailsTheCulpritAndNotItsNeighbours) {
   }
 }
 
+TEST_F(ClientTest, BlamesEachOfManyCulpritsInARow) {
+  Client::Options all = fake();
+  all.processes = 1;
+  Client client(all);
+  for (int i = 0; i < 6; ++i) {
+    EXPECT_EQ(outcome(client, "exit 3").substr(0, 8), "crashed:") << i;
+    Pending culprit = submit(client, "exit 3");
+    Pending neighbour = i < 4 ? Pending() : submit(client, "echo 1");
+    EXPECT_EQ(outcome(culprit).substr(0, 8), "crashed:") << i;
+    if (neighbour.valid()) {
+      EXPECT_EQ(outcome(neighbour), "1") << "after " << i;
+    }
+  }
+}
+
 TEST_F(ClientTest, IgnoresUnsolicitedReplies) {
   for (const char* first : {"takeOver 1", "twice 1", "unasked 1", "foresee 1"}) {
     Client client(fake(300ms));
@@ -205,7 +220,7 @@ TEST_F(ClientTest, StopsStartingAServiceThatNeverAnswers) {
       const std::string got = outcome(client, "echo 1");
       EXPECT_TRUE(got.starts_with("unavailable: ") || got.starts_with("crashed: ")) << got;
     }
-    EXPECT_LE(client.stats().started, 7U) << name;
+    EXPECT_LE(client.stats().started, 9U) << name;
   }
 }
 
