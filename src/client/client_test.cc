@@ -633,10 +633,13 @@ TEST_F(ClientTest, AForkedChildNeitherUsesNorKeepsTheService) {
   auto client = std::make_unique<Client>(fake());
   EXPECT_EQ(outcome(*client, "echo 1"), "1");
   Pending begun = submit(*client, "slow 200");
+  Loop loop(fake());
+  loop.submit("echo 1");  // never sent
   const pid_t child = ::fork();
   if (child == 0) {
     const bool refused = outcome(*client, "echo 2").starts_with("unavailable: ") &&
-                         outcome(begun).starts_with("unavailable: ");
+                         outcome(begun).starts_with("unavailable: ") &&
+                         loop.client().timeout() == -1;
     client.reset();
     char byte = 0;
     // Lives on with copies of the client's descriptors until the parent's client is gone.

@@ -32,7 +32,8 @@ EventLoopClient::~EventLoopClient() {
 int EventLoopClient::fd() const noexcept { return core_->engine.fd(); }
 
 int EventLoopClient::timeout() const noexcept {
-  return core_->finished.empty() ? client::millisecondsUntil(core_->engine.wakeAt()) : 0;
+  if (!core_->finished.empty()) return 0;
+  return core_->forkMark.isCopy() ? -1 : client::millisecondsUntil(core_->engine.wakeAt());
 }
 
 void EventLoopClient::dispatch() {
