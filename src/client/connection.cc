@@ -52,6 +52,7 @@ void Connection::push() noexcept {
 }
 
 std::unique_ptr<Connection::Process> Connection::startProcess() const {
+  // NOLINTNEXTLINE(modernize-make-unique): of an aggregate it does not compile with clang 14
   return std::unique_ptr<Process>(
       new Process{process::ServiceProcess::start(context_.settings.program), Clock::now()});
 }

@@ -136,6 +136,7 @@ inline void failAll(RequestList& requests, RequestList& finished, std::string_vi
 }
 
 /// Calls the completions; these may change the list that the requests were taken from.
+// NOLINTNEXTLINE(performance-unnecessary-value-param): it must own them
 inline void deliverAll(RequestList requests) noexcept {
   for (const auto& request : requests) request->deliver();
 }
