@@ -56,7 +56,7 @@ MESSAGES = [
     (b'<!DOCTYPE plist [<!ENTITY a "aaaa"><!ENTITY b "&a;&a;">]>' + xml(COMMAND),
      "refused: malformed at ''"),
     (xml(COMMAND + "<key>x</key>" + "<array>" * 9000 + "</array>" * 9000), "refused: limitExceeded"),
-    (xml(COMMAND + "<key>mml</key><array>" + "<dict/>" * 29_000 + "</array>"),
+    (xml(COMMAND + "<key>mml</key><array>" + "<dict/>" * 160_000 + "</array>"),
      "refused: limitExceeded at 'mml'"),
     (binary(b"\xd1\x01\x02", b"\x51x", b"\xa1\x00"), "refused: malformed at ''"),
     (bytes(300_000), "refused: a datagram of 300000 bytes"),
