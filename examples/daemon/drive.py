@@ -56,7 +56,9 @@ MESSAGES = [
     (b'<!DOCTYPE plist [<!ENTITY a "aaaa"><!ENTITY b "&a;&a;">]>' + xml(COMMAND),
      "refused: malformed at ''"),
     (xml(COMMAND + "<key>x</key>" + "<array>" * 9000 + "</array>" * 9000), "refused: limitExceeded"),
-    (xml(COMMAND + "<key>mml</key><array>" + "<dict/>" * 160_000 + "</array>"),
+    # An array of 160,000 empty payloads.
+    (binary(b"\xd2\1\2\3\5", b"\x51c", b"\x53mml", b"\x10\7", b"\xd0",
+            b"\xaf\x12" + (160_000).to_bytes(4, "big") + b"\4" * 160_000),
      "refused: limitExceeded at 'mml'"),
     (binary(b"\xd1\x01\x02", b"\x51x", b"\xa1\x00"), "refused: malformed at ''"),
     (bytes(300_000), "refused: a datagram of 300000 bytes"),
