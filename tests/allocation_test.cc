@@ -83,6 +83,8 @@ void* operator new(std::size_t size) {
   if (memory == nullptr) throw std::bad_alloc();
   return memory;
 }
+void* operator new[](std::size_t size) { return operator new(size); }
+void* operator new(std::size_t size, const std::nothrow_t&) noexcept { return __wrap_malloc(size); }
 void operator delete(void* memory) noexcept { __wrap_free(memory); }
 void operator delete[](void* memory) noexcept { __wrap_free(memory); }
 void operator delete(void* memory, std::size_t) noexcept { __wrap_free(memory); }
