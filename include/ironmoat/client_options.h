@@ -20,25 +20,26 @@ struct ClientOptions {
   /// sent again, alone, with a deadline of its own. Waiting for a process does not count.
   std::chrono::milliseconds deadline{2000};
 
-  /// Service processes at most, each of which works on one message at a time. 0: one for each
-  /// processor, 4 at most. The first is started with the first message, another only while all are
-  /// busy. A `Client` whose `unpack` and `submit` are both used has so many for each.
+  /// The largest number of service processes, each of which works on one message at a time. 0: one
+  /// for each processor, at most 4. The client starts the first one with the first message, another
+  /// only while all are busy. If `unpack` and `submit` of one Client are both used, each has so
+  /// many.
   std::size_t processes = 0;
 
-  /// A process that has been idle for so long is ended, but for the last one. Looked at whenever a
-  /// call ends: a client that is not used does nothing.
+  /// The client ends a process that has been idle for so long, except the last one. It checks this
+  /// when a call ends: a client that is not used does nothing.
   std::chrono::milliseconds idleTime{30'000};
 
-  /// A process is replaced between two requests once it has answered so many or has lived so long:
-  /// a process that a message has taken over does not see messages forever. A start takes 2 ms, so
-  /// that these values cost less than a thousandth of a processor.
+  /// The client replaces a process between two requests once it has answered so many, or has run
+  /// for so long, so that a compromised process does not see messages forever. A start takes about
+  /// 2 ms: the defaults cost less than a thousandth of a processor.
   std::uint64_t requestsPerProcess = 1'000'000;
   std::chrono::seconds processLifetime{600};
 
-  /// Bytes of submitted messages without an outcome, with some 500 more for each. `submit` waits
-  /// for room, in the order of the calls; a message that is larger goes alone. Records are not
-  /// counted: a message of 28 KB can become one of 64 MiB (limits.h), so that it is the number of
-  /// outcomes held that bounds the daemon's memory.
+  /// The largest total size in bytes of submitted messages without an outcome, about 500 bytes
+  /// added for each. `submit` blocks while its message would exceed it, first come first served; a
+  /// message that is larger by itself goes alone. Records are not counted: a message of 155 KB can
+  /// become a record of 64 MiB (limits.h), so bound the number of outcomes that you keep.
   std::size_t maxBytesInFlight = std::size_t{64} << 20;
 };
 

@@ -15,7 +15,7 @@ namespace ironmoat {
 /// The one exception is `notEnoughMemory`, which also depends on the machine.
 ///
 /// `what()` is a description for people. A service never repeats the sender's text in it or in
-/// `path()`, but one that was taken over may say anything: escape both for a terminal or a log.
+/// `path()`, but a compromised one may send anything: escape both for a terminal or a log.
 class IRONMOAT_API DecodingError : public std::runtime_error {
  public:
   enum class Kind : std::uint8_t {

@@ -14,7 +14,7 @@ record, or why and where the service rejected the message. Without FILE, or for
 
   --type TYPE        decode messages as payload (default), command-response or
                      web-tunnel-response; or auto, which tries all types and
-                     takes the record that got most of the message
+                     shows the record with the most fields of the message
   --format FORMAT    text (default), for people: records on standard output,
                      rejections on standard error, long values cut; or
                      json, for programs: one line for each FILE, in order,
