@@ -42,7 +42,7 @@ def svg(title, found, column):
         yield f'<text x="{LEFT - 8}" y="{top + 13}" text-anchor="end">{message}</text>'
         yield (f'<rect x="{LEFT}" y="{top}" width="{across(ratio) - LEFT:.1f}" height="{ROW - 6}" '
                f'fill="{colour}"/>')
-        yield f'<text x="{across(ratio) + 6:.1f}" y="{top + 13}">{ratio:.2f}</text>'
+        yield f'<text x="{LEFT + WIDTH + 10}" y="{top + 13}">{ratio:.2f}</text>'
         if limit:
             yield line(limit, top - 2, top + ROW - 4, "black", 2)
     yield line(1, ROW + 2, height - ROW / 2, "gray", 1)
