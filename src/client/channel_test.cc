@@ -4,10 +4,16 @@
 
 #include <gtest/gtest.h>
 
+#include <chrono>
+#include <cstdint>
+#include <cstring>
+#include <memory>
 #include <stdexcept>
 #include <string>
 #include <string_view>
 
+#include "client/record_request.h"
+#include "ironmoat/command_response.h"
 #include "support/channel_game.h"
 
 namespace ironmoat {
@@ -113,6 +119,38 @@ TEST(Channel, FailsExactlyTheCulprits) {
       EXPECT_EQ(game.outcomes(), expected);
     }
   }
+}
+
+/// A long message is sent from where it is: completing its request would release it.
+TEST(Channel, RejectsAReplyToARequestThatIsNotWhollySent) {
+  const auto now = client::Clock::now();
+  client::Counters counters;
+  client::Channel channel(std::chrono::seconds(2), counters);
+  const auto request = std::make_shared<client::RecordRequest<VeskCommandResponse>>(
+      counters, Data(std::string(100'000, 'x')), std::chrono::seconds(1));
+  const auto body = [](BlockBuilder& frame) {
+    return Data(std::string_view(frame.bytes(), frame.size()).substr(frames::kLengthBytes));
+  };
+  channel.add({request}, now);
+  channel.started(now);
+  frames::Hello hello = frames::Hello::ours();
+  hello.sandbox = sandbox::kRequiredParts;
+  BlockBuilder greeting;
+  frames::appendHello(greeting, hello);
+  channel.receive(body(greeting), now);
+
+  const auto parts = channel.output();
+  ASSERT_GT(parts[1].iov_len, 0U);
+  std::uint64_t id = 0;
+  std::memcpy(&id, static_cast<const char*>(parts[0].iov_base) + frames::kLengthBytes, sizeof id);
+  BlockBuilder reply;
+  frames::appendDescription(reply, id, frames::Status::notServed, "too early");
+  channel.sent(parts[0].iov_len);
+  EXPECT_THROW(channel.receive(body(reply), now), frames::FrameError);
+  EXPECT_FALSE(request->isDone());
+  channel.sent(parts[1].iov_len);
+  channel.receive(body(reply), now);
+  EXPECT_TRUE(request->isDone());
 }
 
 }  // namespace
