@@ -3,7 +3,9 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <string>
+#include <string_view>
 
 namespace ironmoat {
 
@@ -38,9 +40,18 @@ struct ClientOptions {
 
   /// The largest total size in bytes of submitted messages without an outcome, about 500 bytes
   /// added for each. `submit` blocks while its message would exceed it, first come first served; a
-  /// message that is larger by itself goes alone. Records are not counted: a message of 155 KB can
-  /// become a record of 64 MiB (limits.h), so bound the number of outcomes that you keep.
+  /// message that is larger by itself goes alone.
   std::size_t maxBytesInFlight = std::size_t{64} << 20;
+
+  /// The largest total size in bytes of records that were received and not yet taken: from their
+  /// Pending, or by their completion. A message of 155 KB can become a record of 64 MiB (limits.h).
+  /// A record that would exceed it becomes std::bad_alloc, unless it is the only one.
+  std::size_t maxBytesHeld = std::size_t{1} << 30;
+
+  /// Called with the reason when a process is lost, such as "was killed by SIGSEGV", on the thread
+  /// that noticed it: for a log. The requests that it had are sent again or fail. Must not throw,
+  /// block or use the client.
+  std::function<void(std::string_view)> onProcessLost;
 };
 
 }  // namespace ironmoat

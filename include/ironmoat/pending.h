@@ -26,7 +26,12 @@ class IRONMOAT_API Pending {
  public:
   Pending() noexcept = default;
   Pending(Pending&&) noexcept = default;
-  Pending& operator=(Pending&&) noexcept = default;
+  Pending& operator=(Pending&& other) noexcept {
+    Pending before = std::move(other);
+    request_.swap(before.request_);
+    core_.swap(before.core_);
+    return *this;
+  }
 
   /// Stands for a request whose outcome was not taken: required by everything below.
   [[nodiscard]] bool valid() const noexcept { return request_ != nullptr; }
@@ -59,11 +64,11 @@ class IRONMOAT_API Pending {
   using Seconds = std::chrono::duration<long double>;  // no time overflows it
 
   Pending(std::shared_ptr<client::Request> request, std::shared_ptr<client::Core> core)
-      : request_(std::move(request)), core_(std::move(core)) {}
+      : core_(std::move(core)), request_(std::move(request)) {}
   std::future_status waitUntil(Clock::time_point until) const;
 
+  std::shared_ptr<client::Core> core_;  // outlives the request
   std::shared_ptr<client::Request> request_;
-  std::shared_ptr<client::Core> core_;
 };
 
 }  // namespace ironmoat

@@ -29,6 +29,7 @@ struct Stats {
   std::uint64_t inFlight =
       0;  ///< requests without an outcome, or whose completion was not called yet
   std::uint64_t bytesInFlight = 0;  ///< bytes of their messages
+  std::uint64_t bytesHeld = 0;      ///< bytes of records that were not taken yet
 };
 
 }  // namespace ironmoat

@@ -532,8 +532,27 @@ TEST_F(ClientTest, CompletionsAreNeverCalledBySubmit) {
   }
 }
 
+TEST_F(ClientTest, HoldsRecordsUpToALimit) {
+  Client::Options options = fake();
+  options.maxBytesHeld = 1;
+  Client client(options);
+  auto all = submitEchoes(client, 2);
+  all[1].wait();
+  EXPECT_GT(client.stats().bytesHeld, 1U) << "the only one";
+  EXPECT_EQ(outcome(all[1]), "out of memory");
+  EXPECT_EQ(outcome(all[0]), "0");
+  EXPECT_EQ(client.stats().bytesHeld, 0U);
+  all = submitEchoes(client, 1);
+  all[0].wait();
+  all.clear();
+  EXPECT_EQ(outcome(client, "echo 2"), "2");
+}
+
 TEST_F(ClientTest, CountsWhatItDoes) {
-  Client client(fake(200ms));
+  Client::Options options = fake(200ms);
+  std::vector<std::string> losses;
+  options.onProcessLost = [&](std::string_view why) { losses.emplace_back(why); };
+  Client client(options);
   for (const char* message : {"echo 1", "echo 2", "refuse", "exit 1", "hang", "notServed"}) {
     outcome(client, message);
   }
@@ -550,6 +569,8 @@ TEST_F(ClientTest, CountsWhatItDoes) {
   EXPECT_EQ(stats.retried, 1U);
   EXPECT_EQ(stats.started - stats.ended, 2U);
   EXPECT_EQ(stats.inFlight, 0U);
+  EXPECT_EQ(losses, (std::vector<std::string>{"exited with status 1", "exited with status 1",
+                                              "no reply within 200 ms"}));
 
   Loop loop(fake());
   loop.submit(std::string(limits::messageBytes + 1, 'x'));

@@ -135,6 +135,7 @@ void Connection::lose(Loss loss) noexcept {
   static_cast<void>(watch(0));
   process_.reset();  // gone before anyone hears of it
   channel_.lost(loss, Clock::now());
+  if (context_.settings.onProcessLost) context_.settings.onProcessLost(loss.what);
 }
 
 void Connection::dismiss() noexcept {

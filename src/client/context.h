@@ -36,7 +36,7 @@ struct Context {
   explicit Context(ClientOptions options) : settings(settingsFrom(std::move(options))) {}
 
   const ClientOptions settings;
-  Counters counters;
+  Counters counters{settings.maxBytesHeld};
   const ForkMark forkMark;
 
   [[nodiscard]] Clock::duration deadline(

@@ -5,6 +5,7 @@
 #include <bit>
 #include <cstddef>
 #include <cstdint>
+#include <limits>
 #include <new>
 #include <type_traits>
 #include <variant>
@@ -22,8 +23,19 @@ class Counters {
  public:
   using Number = std::uint64_t Stats::*;
 
+  explicit Counters(std::uint64_t maxBytesHeld = std::numeric_limits<std::uint64_t>::max()) noexcept
+      : maxBytesHeld_(maxBytesHeld) {}
+
   void add(Number number, std::uint64_t n = 1) noexcept { add(stats_.*number, n); }
   void subtract(Number number, std::uint64_t n = 1) noexcept { add(stats_.*number, 0 - n); }
+
+  /// Adds a record to those that are held, until `release`; false if they would exceed the limit.
+  bool hold(std::uint64_t bytes) noexcept {
+    std::atomic_ref held(stats_.bytesHeld);
+    const std::uint64_t others = held.fetch_add(bytes, std::memory_order_relaxed);
+    return others == 0 || others + bytes <= maxBytesHeld_;
+  }
+  void release(std::uint64_t bytes) noexcept { subtract(&Stats::bytesHeld, bytes); }
 
   /// An outcome; null for a record.
   void count(const Failure* failure) noexcept {
@@ -54,6 +66,7 @@ class Counters {
     std::atomic_ref(number).fetch_add(n, std::memory_order_relaxed);
   }
 
+  const std::uint64_t maxBytesHeld_;
   Stats stats_;
 };
 

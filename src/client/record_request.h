@@ -21,11 +21,18 @@ class RecordRequest final : public Request {
   RecordRequest(Counters& counters, const Data& message, Clock::duration deadline,
                 Completion completion = {})
       : Request(counters, R::schemaName, message, deadline), completion_(std::move(completion)) {}
+  ~RecordRequest() override { release(); }
 
   /// The outcome, once; requires that there is one.
-  Outcome<R> take() { return *std::move(outcome_); }
+  Outcome<R> take() {
+    release();
+    return *std::move(outcome_);
+  }
   /// Its record; throws the error if that is the outcome.
-  R takeRecord() { return (*std::move(outcome_)).value(); }
+  R takeRecord() {
+    release();
+    return (*std::move(outcome_)).value();
+  }
 
   /// Releases the completion at once.
   void cancel() noexcept override {
@@ -39,9 +46,16 @@ class RecordRequest final : public Request {
     using Status = frames::Status;
     try {
       if (reply.status == Status::record) {
+        std::size_t bytes = 0;
         withHostRejections([&] {
-          outcome_.emplace(std::in_place, [&] { return frames::decodeRecord<R>(reply.body); });
+          outcome_.emplace(std::in_place,
+                           [&] { return frames::decodeRecord<R>(reply.body, &bytes); });
         });
+        held_ = bytes;
+        if (!counters().hold(bytes)) {
+          set(std::bad_alloc());
+          release();
+        }
       } else if (reply.status == Status::rejected) {
         set(frames::parseRejection(reply.body));
       } else {  // notServed, failed
@@ -58,8 +72,10 @@ class RecordRequest final : public Request {
     if (const Completion completion = std::exchange(completion_, nullptr)) completion(take());
   }
   void set(Failure failure) noexcept override { outcome_.emplace(std::move(failure)); }
+  void release() noexcept { counters().release(std::exchange(held_, 0)); }
 
   std::optional<Outcome<R>> outcome_;
+  std::size_t held_ = 0;  // the record's bytes in the counters
   Completion completion_;
 };
 

@@ -88,6 +88,9 @@ class Request {
     callCompletion();
   }
 
+ protected:
+  [[nodiscard]] Counters& counters() const noexcept { return counters_; }
+
  private:
   friend class Channel;
 

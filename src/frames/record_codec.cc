@@ -16,19 +16,20 @@ void encodeRecord(const R& record, BlockBuilder& out) {
 }
 
 template <MessageSchema R>
-R decodeRecord(const Data& body) {
+R decodeRecord(const Data& body, std::size_t* memory) {
   return R([&] {
     Reader reader(body);
     typename R::Arguments arguments{};
     reader.record<R>(arguments);
     reader.finish();
+    if (memory != nullptr) *memory = body.size() + reader.recordBytes();
     return arguments;
   });
 }
 
 #define IRONMOAT_CODEC_OF(R)                              \
   template void encodeRecord<R>(const R&, BlockBuilder&); \
-  template R decodeRecord<R>(const Data&)
+  template R decodeRecord<R>(const Data&, std::size_t*)
 
 IRONMOAT_CODEC_OF(VeskCommandResponse);
 IRONMOAT_CODEC_OF(VeskCommandWebTunnelResponse);

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstddef>
 #include <stdexcept>
 
 #include "ironmoat/message_schema.h"
@@ -21,8 +22,9 @@ void encodeRecord(const R& record, BlockBuilder& out);
 
 /// The record that `body` encodes. Untrusted input: checks every length, count, bit and text, and
 /// holds lists, text and nesting to ironmoat/limits.h. Text and data are slices of `body`. Throws
-/// RecordError, and what the record's initialiser throws.
+/// RecordError, and what the record's initialiser throws. `memory` becomes the bytes that the
+/// record keeps besides itself: `body`, lists and values.
 template <MessageSchema R>
-R decodeRecord(const Data& body);
+R decodeRecord(const Data& body, std::size_t* memory = nullptr);
 
 }  // namespace ironmoat::frames

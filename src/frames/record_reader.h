@@ -33,6 +33,10 @@ class Reader {
   void finish() const {
     if (at_ != end_) reject("unexpected bytes after the record");
   }
+  /// As limits::recordBytes counts them.
+  [[nodiscard]] std::size_t recordBytes() const noexcept {
+    return limits::recordBytes - recordBytes_;
+  }
 
  private:
   template <class L>
