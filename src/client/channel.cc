@@ -15,8 +15,8 @@ using namespace std::chrono_literals;
 
 namespace {
 
-constexpr auto kFirstBackOff = 10ms;  // doubled four times: five starts take 150 ms
-constexpr unsigned kMaxDoublings = 4;
+// After each failed start in a row. The first pause is short: a process may be lost by chance.
+constexpr std::array kBackOff = {1ms, 5ms, 25ms, 125ms};
 
 // Messages up to kMaxCopied bytes are copied into one piece with their neighbours, as long as that
 // has less than kBatch.
@@ -108,7 +108,7 @@ void Channel::started(TimePoint now) noexcept {
 }
 
 void Channel::startFailed(std::string_view why, bool lasting, TimePoint now) noexcept {
-  nextStart_ = now + kFirstBackOff * (1U << std::min(startFailures_, kMaxDoublings));
+  nextStart_ = now + kBackOff[std::min<std::size_t>(startFailures_, kBackOff.size() - 1)];
   ++startFailures_;
   if (lasting || startFailures_ >= kStartAttempts) failAll(why);
 }
