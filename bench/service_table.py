@@ -61,6 +61,12 @@ def of_one_build(runs):
         ("pipelined rate / rate in process of one thread of two", 2 * alone / one / processors, ""),
     ], processors >= 1.8)
 
+    if "rpc/service" in runs.found:
+        table_of("round trip / that of another way to parse in a process of its own", [
+            (f"{name}, without a sandbox", time("rpc/service") / time(f"rpc/{peer}"), "≤ 1")
+            for name, peer in [("protobuf over pipes", "protobufOverPipes"),
+                               ("gRPC over a Unix socket", "grpcOverUnixSocket")]])
+
     # Means, since what a wait beside others costs is rare and large.
     waits = []
     for busy in (0, 1, 2, 4):
