@@ -35,7 +35,7 @@ def svg(title, found, column):
     yield (f'<svg xmlns="http://www.w3.org/2000/svg" width="{LEFT + WIDTH + 60}" height="{height}" '
            'font-family="sans-serif" font-size="13">')
     yield '<rect width="100%" height="100%" fill="white"/>'
-    yield f'<text x="8" y="16">{title}; a line marks the limit</text>'
+    yield f'<text x="8" y="16">{title} (black line: limit)</text>'
     for place, (message, ratio, limit) in enumerate(rows, 1):
         top = ROW * place + 6
         colour = "#c0504d" if limit and ratio > limit else "#4f81bd"
@@ -52,7 +52,7 @@ def svg(title, found, column):
 def main():
     found = table.times(sys.argv[1])
     for name, column in CHARTS.items():
-        text = "\n".join(svg(f"Time of unpacking: {column}", found, column)) + "\n"
+        text = "\n".join(svg(f"Time to unpack: {column}", found, column)) + "\n"
         (pathlib.Path(sys.argv[2]) / name).write_text(text, encoding="utf-8")
 
 

@@ -34,7 +34,7 @@ def curves(lines):
 
 def main():
     lines = read(sys.argv[1])
-    print("| shape | form | bytes | slope of time | slope of memory | ns per byte, smallest "
+    print("| shape | format | bytes | slope of time | slope of memory | ns per byte, smallest "
           "and largest | peak heap per byte of the largest |\n|---|---|---|---|---|---|---|")
     for (name, form), points in curves(lines).items():
         first, last = points[0], points[-1]
@@ -42,7 +42,7 @@ def main():
         memory = slope([(p["bytes"], p["bytes"] + p["peak"]) for p in points])
         time = slope([(p["bytes"], p["nanoseconds"]) for p in points])
         mark = " **over**" if max(time, memory) > STEEPEST else ""
-        print(f"| {name} | {form} | {first['bytes']:,} – {last['bytes']:,} | {time:.2f}{mark} "
+        print(f"| {name} | {form.replace('xml', 'XML')} | {first['bytes']:,} – {last['bytes']:,} | {time:.2f}{mark} "
               f"| {memory:.2f} | {first['nanoseconds'] / first['bytes']:.2f}, "
               f"{last['nanoseconds'] / last['bytes']:.2f} | {last['peak'] / last['bytes']:.2f} |")
 

@@ -77,7 +77,7 @@ def count(program):
                            check=True)
         found = growth_table.read(lines_file)
         if not counted:
-            print("No valgrind: only allocations are counted.")
+            print("valgrind not found: counting allocations only")
             return found
         for number, line in enumerate(found, 1):
             dump = pathlib.Path(f"{out}.{number}").read_text(encoding="utf-8")
@@ -103,25 +103,25 @@ def faults(lines):
             decoded = line["instructions"] - THROWN
             ratio = decoded / accepted[line["name"], line["form"]]["instructions"]
             if ratio > REFUSED_AT_MOST:
-                yield (f"{line['name']}, {line['form']}, {line['kind']} at its end: {decoded:,} "
-                       f"instructions before it throws, {ratio:.2f} times what accepting takes")
+                yield (f"{line['name']}, {line['form']}, {line['kind']}: rejecting takes {decoded:,} "
+                       f"instructions without the exception, {ratio:.2f} times as many as accepting")
     for line in accepted.values():
         for what, most in zip(COUNTS, GRANTED[line["name"], line["form"]]):
             if line.get(what, 0) > most:
-                yield f"{line['name']}, {line['form']}: {number(line[what])} {what}, granted {most:,}"
+                yield f"{line['name']}, {line['form']}: {number(line[what])} {what} exceed the limit of {most:,}"
     for (name, form), points in growth_table.curves(lines).items():
         for what in ("instructions", "peak"):
             if what not in points[0]:
                 continue
             steep = growth_table.slope([(p["bytes"], p["bytes"] + p[what]) for p in points])
             if steep > growth_table.STEEPEST:
-                yield f"{name}, {form}: {what} grow with the message to the power of {steep:.2f}"
+                yield f"{name}, {form}: {what}: slope {steep:.2f} exceeds the limit of {growth_table.STEEPEST}"
         for point in points:
             most = AT_FIRST + PER_DOUBLING * math.log2(point["bytes"] / 1024)
             most += PER_PAYLOAD.get(name, 0) * point["bytes"] / PAYLOAD_BYTES
             if point["allocations"] > most:
                 yield (f"{name}, {form}: {point['allocations']} allocations for "
-                       f"{point['bytes']:,} bytes, granted {most:.0f}")
+                       f"{point['bytes']:,} bytes exceed the limit of {most:.0f}")
 
 
 def grants(lines):
@@ -142,15 +142,15 @@ def main():
     lines = count(sys.argv[1])
     if sys.argv[2:] == ["grant"]:
         return grants(lines)
-    print(f"| one message | form | bytes | {' | '.join(COUNTS)} | most heap, bytes |")
+    print(f"| message | format | bytes | {' | '.join(COUNTS)} | peak heap, bytes |")
     print("|---" * (len(COUNTS) + 4) + "|")
     for line in lines:
         if line["kind"] in ("sample", "stream"):
             cells = [number(line.get(what, 0)) for what in ("bytes", *COUNTS, "peak")]
-            print(f"| {line['name']} | {line['form']} | {' | '.join(cells)} |")
+            print(f"| {line['name']} | {line['form'].replace('xml', 'XML')} | {' | '.join(cells)} |")
     found = list(faults(lines))
     for fault in found:
-        print(f"FAULT {fault}", file=sys.stderr)
+        print(f"fault: {fault}", file=sys.stderr)
     sys.exit(1 if found else 0)
 
 

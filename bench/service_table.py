@@ -27,10 +27,10 @@ class Runs:
         return statistics.median(self.all(name))
 
 
-def table_of(title, rows, judged=True):
-    """Rows are of a name, a ratio and its limit, like "≤ 2", or none."""
-    print(f"| {title} | ratio | to be |\n|---|---|---|")
-    miss = " **missed**" if judged else " (not judged: the processors were shared)"
+def table_of(title, rows, judged=True, unit="ratio"):
+    """Prints rows of a name, a value and its limit, which is like "≤ 2", or empty."""
+    print(f"| {title} | {unit} | limit |\n|---|---|---|")
+    miss = " **missed**" if judged else " (not compared: other programs used the processors)"
     for name, ratio, limit in rows:
         holds = True
         if limit:
@@ -51,7 +51,7 @@ def of_one_build(runs):
     # Below, the two sides waited for each other's processor.
     table_of("through the service", [
         ("round trip / (echo + unpacking)", service / (echo + alone), "≤ 1.15"),
-        ("refused / accepted, round trip", time("refused") / service, "≤ 2"),
+        ("rejected / accepted, round trip", time("refused") / service, "≤ 2"),
         ("pipelined rate / rate in process", alone / one, "≥ 0.4"),
         ("pipelined rate / that of the echo", time("pipelined/echo/64") / one, ""),
         ("pipelined rate, two client threads / one", one / two, ""),
@@ -72,15 +72,16 @@ def of_one_build(runs):
     for busy in (0, 1, 2, 4):
         trips = runs.all(f"neighbours/service/{busy}")
         blocking = statistics.mean(runs.all(f"neighbours/blocking/{busy}"))
-        waits += [(f"mean, {busy} neighbours", statistics.mean(trips) / blocking, "≤ 5"),
-                  (f"largest mean of a repetition, {busy} neighbours", max(trips) / blocking, "")]
+        beside = f"{busy} busy process{'es' * (busy != 1)}"
+        waits += [(f"mean, {beside}", statistics.mean(trips) / blocking, "≤ 5"),
+                  (f"largest mean of a repetition, {beside}", max(trips) / blocking, "")]
     table_of("round trip / that of a blocking echo, beside busy processes", waits)
 
     idle = [max(runs.all("idle/iterations:1/repeats:1", field)) / 1e6
             for field in ("at_rest", "going_to_rest")]
-    table_of("milliseconds of processor time, client and services", [
-        ("nothing in flight, in 10 s", idle[0], "≤ 1"),
-        ("once, a second after the last reply", idle[1], "")])
+    table_of("processor time of client and services", [
+        ("in 10 s with nothing in flight", idle[0], "≤ 1"),
+        ("once, a second after the last reply, to clear memory", idle[1], "")], unit="ms")
 
     print("| wall time | |\n|---|---|")
     for name, value in [
@@ -91,7 +92,7 @@ def of_one_build(runs):
         ("per message, 64 in flight, service", one),
         ("per message, 256 in flight, service", time("pipelined/service/256")),
         ("per message, 64 in flight for each of two client threads", two),
-        ("spawn of a process of the service's size until it is gone", time("spawnAndWait")),
+        ("spawn a process of the service's size and wait until it has ended", time("spawnAndWait")),
         ("start to first reply, echo", time("startToFirstReply/echo")),
         ("start to first reply, service", time("startToFirstReply/service")),
     ]:
@@ -103,19 +104,19 @@ def beside_another(ours, theirs):
         return ours.time(name) / theirs.time(name)
 
     print()
-    table_of("this build / the other", [
-        ("round trip", ratio(SERVICE + "1"), "≤ 1"),
-        ("rate, two calling threads", 1 / ratio(SERVICE + "2"), "≥ 1.3"),
-        ("rate, four calling threads", 1 / ratio(SERVICE + "4"), "≥ 1.3"),
-        ("per message, 64 in flight", ratio("pipelined/service/64"), "≤ 1"),
-        ("per message, 256 in flight", ratio("pipelined/service/256"), "≤ 1"),
-        ("round trip, 1 MiB", ratio("large/1"), "≤ 1"),
-        ("round trip, 16 MiB", ratio("large/16"), "≤ 1"),
+    table_of("this build / the older one", [
+        ("round trip of one thread", ratio(SERVICE + "1"), "≤ 1"),
+        ("rate of two calling threads", 1 / ratio(SERVICE + "2"), "≥ 1.3"),
+        ("rate of four calling threads", 1 / ratio(SERVICE + "4"), "≥ 1.3"),
+        ("pipelined, 64 in flight, time per message", ratio("pipelined/service/64"), "≤ 1"),
+        ("pipelined, 256 in flight, time per message", ratio("pipelined/service/256"), "≤ 1"),
+        ("round trip of 1 MiB", ratio("large/1"), "≤ 1"),
+        ("round trip of 16 MiB", ratio("large/16"), "≤ 1"),
         ("start to first reply", ratio("startToFirstReply/service"), "≤ 1"),
-        ("refused", ratio("refused"), ""),
-        ("unpacking, in process: how alike the two were treated", ratio("inProcess/threads:1"), ""),
+        ("rejected message, round trip", ratio("refused"), ""),
+        ("unpacking, in process (1 if both ran under the same conditions)", ratio("inProcess/threads:1"), ""),
     ])
-    print("| wall time | this build | the other |\n|---|---|---|")
+    print("| wall time | this build | the older one |\n|---|---|---|")
     for name in sorted(name for name in ours.found if not name.startswith("idle")):
         print(f"| {name} | {table.human(ours.time(name))} | {table.human(theirs.time(name))} |")
 

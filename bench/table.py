@@ -83,7 +83,7 @@ def rows(found, messages, columns):
 def main():
     found = times(sys.argv[1])
     judged = rows(found, MESSAGES, COLUMNS)
-    print("\nMessages that are never twice the same, 2,048 of each sort:\n")
+    print("\nThe streams of 2,048 different messages, then `deep` and `unknown`:\n")
     judged += rows(found, STREAMS, STREAM_COLUMNS)
 
     kinds = ["binary/unpack", "binary/copy_and_unpack", "xml/unpack", "xml/copy_and_unpack",
@@ -95,7 +95,7 @@ def main():
                  for kind in ("binary/unpack", "xml/unpack", "protobuf")]
         cells = [human(median(found[f"{message}/{kind}"])) for kind in kinds]
         print(f"| {message} | {', '.join(f'{size:,}' for size in sizes)} | {' | '.join(cells)} |")
-    print(f"\n{judged[0] + judged[2]} of the {judged[1] + judged[3]} ratios with a limit are over it.")
+    print(f"\n{judged[0] + judged[2]} of the {judged[1] + judged[3]} ratios with a limit exceed it.")
 
 
 if __name__ == "__main__":
