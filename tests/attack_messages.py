@@ -85,7 +85,7 @@ def utf16(content):
 def reference_cycles(size):
     """Arrays, each the only element of its predecessor, the first that of the last."""
     length = (size - OVERHEAD) // 8
-    yield "a long one", [
+    yield "one cycle of two million arrays", [
         payload(b"?", array([5]), [array([5 + (i + 1) % length]) for i in range(length)])]
 
 
@@ -105,25 +105,25 @@ def doubling(levels):
 
 
 def sharing(size):
-    yield "doubling at each of 250 levels", [doubling(250)]
-    yield "255 levels of unknown lists, thousands of references in each", [
+    yield "250 levels, each twice in its parent", [doubling(250)]
+    yield "255 levels of arrays, thousands of references to each", [
         payload(b"?", array([5]), [repeated(0xA0, (size - OVERHEAD) // 255 // 3 - 9, 6 + level, 3)
                                    for level in range(254)] + [b"\xa0"])]
     count = size // 2 - OVERHEAD
-    yield "one text as all elements of a list", [
+    yield "one text as every element of a list", [
         payload(b"dal", repeated(0xA0, min(count, 4_000_000), 5, 1), [text(b"y" * 15)], 1)]
-    yield "one empty payload as all elements of a list", [
+    yield "one empty payload as every element of a list", [
         payload(b"mml", repeated(0xA0, min(count, times), 5, 3), [dictionary([(1, 2)])])
         for times in (28_000, 400_000)]
     blob = b"\xaa" * (1 << 20 if size > 1 << 22 else 1 << 14)
-    yield "a megabyte 64 and 4,000 times", [
+    yield "1 MiB of data, referenced 63 and 4,000 times", [
         payload(b"mml", repeated(0xA0, times, 5, 3),
                 [dictionary([(1, 2), (6, 7)]), text(b"P"), head(0x40, len(blob)) + blob])
         for times in (63, 4_000)]
     yield "a dictionary of unknown keys, or of keys like known ones, 10,000 times", [
         payload(b"mml", repeated(0xA0, 10_000, 5, 3), [wide(size // 8, 6), text(key)])
         for key in (b"unknown", b"strict-transport-securitY")]
-    yield "the most of everything", [most_of_everything(size)]
+    yield "nearly every limit at once", [most_of_everything(size)]
 
 
 def most_of_everything(size):
@@ -142,22 +142,22 @@ def most_of_everything(size):
 def overlapping(size):
     big = text(b"a" * (size // 2))
     count = (size - len(big) - OVERHEAD) // 3
-    yield "one text of megabytes from millions of offsets", [
+    yield "millions of offsets in one long text", [
         HEAD + big + number(8, 3) * count + trailer(3, 1, count, 0, 8 + len(big))]
     starts = size // 12
     area = HEAD + b"\x5f\x12\x00\x00\xff\xff" * starts
-    yield "texts that begin inside one another", [
+    yield "texts that overlap", [
         area + b"".join(number(8 + 6 * i, 3) for i in range(starts)) +
         trailer(3, 1, starts, 0, len(area))]
 
 
 def many_objects(size):
-    yield "as many objects as bytes", [
+    yield "millions of objects at one offset", [
         HEAD + b"\x08" * (size // 2 - 40) + b"\x08" * (size // 2 - 40) +
         trailer(1, 1, size // 2 - 40, 0, 8 + size // 2 - 40)]
     count = (size - OVERHEAD) // 4
-    yield "millions of empty lists that nothing refers to", [payload(b"?", ONE, [b"\xa0"] * count)]
-    yield "one list of millions of elements", [
+    yield "millions of unreferenced empty arrays", [payload(b"?", ONE, [b"\xa0"] * count)]
+    yield "one array of millions of elements", [
         payload(b"?", repeated(0xA0, size - OVERHEAD, 2, 1), width=1)]
     yield "one dictionary of millions of entries", [
         payload(b"?", repeated(0xD0, (size - OVERHEAD) // 2, 1, 1), width=1)]
@@ -173,25 +173,25 @@ def many_objects(size):
 
 def nesting(size):
     lists = (size - OVERHEAD) // 8
-    yield "2 million containers inside one another, parents first or last", [
+    yield "two million nested arrays, outermost first or last", [
         payload(b"?", array([5]), [array([6 + i]) for i in range(lists - 1)] + [b"\xa0"]),
         message([b"\xa0"] + [array([i]) for i in range(lists - 1)] +
                 [dictionary([(lists + 1, lists + 2), (lists + 3, lists - 1)]), text(b"c"), ONE,
                  text(b"?")], root=lists)]
-    yield "XML: lists or dictionaries opened by the megabyte", [
+    yield "XML: megabytes of unclosed arrays or dictionaries", [
         filled(size, b"<array>", b"<plist>"), filled(size, b"<dict><key/>", b"<plist>")]
 
 
 def tiny_records(size):
-    for what, most in (("400,000 payloads", 400_000), ("all payloads that fit", 28_000)):
+    for what, most in (("400,000 payloads", 400_000), ("28,000 payloads", 28_000)):
         count = min(most, (size - OVERHEAD) // 50)
         yield what + ", binary", [
             payload(b"mml", array(range(5, 5 + count)),
                     [b"\xd1" + number(1, 3) + number(2, 3)] * count)]
-    yield "millions of relay records", [
+    yield "a million relay records", [
         payload(b"qplr", repeated(0xA0, min(size // 2, 1_100_000), 5, 3), [b"\xd0"])]
     one = b"<dict><key>c</key><integer>1</integer></dict>"
-    yield "XML: empty dictionaries by the megabyte", [
+    yield "XML: megabytes of empty dictionaries, 28,000 payloads", [
         xml_payload(b"mml", filled(size, b"<dict/>", b"<array>", b"</array>")),
         xml_payload(b"mml", b"<array>" + one * min(size // 50, 28_000) + b"</array>")]
 
@@ -200,13 +200,13 @@ def tiny_records(size):
 
 
 def texts(size):
-    yield "UTF-16 that grows by half", [
+    yield "UTF-16 that grows by half as UTF-8", [
         payload(b"u", head(0x60, (size - OVERHEAD) // 2) + b"\x4e\x2d" * ((size - OVERHEAD) // 2)),
         utf16(xml_payload(b"u", b"<string>" + "中".encode() * ((size - OVERHEAD) // 2)
                           + b"</string>"))]
     yield "millions of texts of one UTF-16 unit", [
         payload(b"?", ONE, [b"\x61\x4e\x2d"] * ((size - OVERHEAD) // 6))]
-    yield "NUL everywhere", [
+    yield "NUL bytes", [
         bytes(size), HEAD + bytes(size - 8), b"<plist>" + bytes(size // 2),
         payload(b"u", text(bytes(size // 2)))]
 
@@ -219,7 +219,7 @@ def entities(size):
     yield "entity bomb, internal subset", [
         b'<!DOCTYPE plist [<!ENTITY l0 "ha">' + levels + b"]><plist><string>&l11;</string></plist>",
         b"<!DOCTYPE plist [" + filled(size, b'<!ATTLIST dict a CDATA "x">') + b"]>" + xml(b"<true/>")]
-    yield "references by the megabyte", [
+    yield "megabytes of references", [
         xml_payload(b"u", filled(size, piece, b"<string>", b"</string>"))
         for piece in (b"&amp;", b"&#65;", b"&#x10FFFF;", b"&")]
 
@@ -237,23 +237,23 @@ def unclosed(size):
     yield "a million attributes", [
         filled(size, b" a=''", start, b">") for start in
         (b"<plist", b"<plist><dict", b"<?xml version='1.0'")]
-    yield "comments and sections by the million", [
+    yield "millions of comments, CDATA sections, instructions", [
         xml(filled(size, b"<!---->", b"<array>", b"</array>")),
         xml(filled(size, b"<![CDATA[]]>", b"<string>", b"</string>")),
         xml(filled(size, b"<?a?>", b"<string>", b"</string>"))]
-    yield "line ends by the megabyte", [xml(filled(size, piece, b"<string>", b"</string>"))
+    yield "megabytes of line ends", [xml(filled(size, piece, b"<string>", b"</string>"))
                                         for piece in (b"\r", b"\rx", b"<![CDATA[\r\r\r\r]]>")]
 
 
 def numbers(size):
-    yield "digits by the megabyte", [
+    yield "megabytes of digits", [
         xml_payload(b"?", filled(size, piece, b"<" + tag + b">" + before, after + b"</" + tag + b">"))
         for tag, piece, before, after in (
             (b"integer", b"1", b"", b""), (b"integer", b"0", b"", b"7"),
             (b"integer", b"f", b"0x", b""), (b"integer", b"0", b"-0x", b"7"),
             (b"integer", b" ", b"", b"7"), (b"integer", b"<![CDATA[ ]]>", b"", b"7"),
             (b"real", b"1", b"1.", b""), (b"real", b"9", b"1e", b""), (b"date", b"2", b"", b""))]
-    yield "digits of a character reference by the megabyte", [
+    yield "megabytes of digits in a character reference", [
         xml_payload(b"u", filled(size, b"0", b"<string>&#", b"65;</string>")),
         xml_payload(b"u", filled(size, b"9", b"<string>&#", b";</string>"))]
 
@@ -264,20 +264,20 @@ def data(size):
         for piece, after in ((b"AAAA", b""), (b"A A A A ", b""), (b"\n", b""),
                              (b"AAAA<!---->", b""), (b"<![CDATA[AAAA]]>", b""), (b"AAAA", b"!"),
                              (b"=", b""), (b"AAAA", b"<!---->"))]
-    yield "empty elements by the million", [
+    yield "millions of small elements", [
         xml_payload(b"?", filled(size, piece, b"<array>", b"</array>"))
         for piece in (b"<true/>", b"<dict/>", b"<string/>", b"<data/>", b"<string>&lt;</string>",
                       b"<integer>1</integer>")]
 
 
 def encodings(size):
-    yield "declarations of megabytes", [
+    yield "XML declarations of megabytes", [
         filled(size, piece, start, b'"?>') + xml(b"<true/>") for piece, start in (
             (b"U", b'<?xml version="1.0" encoding="'), (b"1", b'<?xml version="1.'))]
 
 
 def too_long(size):
-    yield "by one byte", [b" " * (size + 1)]
+    yield "one byte over the limit", [b" " * (size + 1)]
 
 
 def catalogue(size):

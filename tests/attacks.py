@@ -110,6 +110,7 @@ class Run:
         self.options = options
         self.wrong = []
         self.heaviest = []  # (mebibytes, verdict, message)
+        self.group = ""  # of the last row
 
     def check(self, holds, what):
         if not holds:
@@ -131,15 +132,19 @@ class Run:
         verdicts, seconds, waits = zip(*outcomes)
         longest = max(seconds)
         self.check(not any(v.startswith("status") for v in verdicts), f"{name}: {short(verdicts)}")
-        self.check(longest < self.options.seconds, f"{name}: {longest:.2f} s")
+        self.check(longest < self.options.seconds, f"{name}: {longest:.2f} s of CPU time")
         if self.options.mebibytes:
-            self.check(peak < self.options.mebibytes, f"{name}: {peak:.0f} MiB")
+            self.check(peak < self.options.mebibytes, f"{name}: peak {peak:.0f} MiB")
         largest = max(range(len(messages)), key=lambda i: len(messages[i]))
         self.heaviest.append((peak, verdicts[largest], messages[largest]))
         self.heaviest = sorted(self.heaviest, key=lambda heavy: -heavy[0])[:6]
-        row = (group, name, f"{max(map(len, messages)):,}", short(verdicts),
-               f"{longest * 1000:.0f} ms", f"{max(waits) * 1000:.0f} ms", f"{peak:.0f} MiB")
-        print("| " + " | ".join(row) + " |" if self.options.table else " - ".join(row), flush=True)
+        shown = "" if self.options.table and group == self.group else group + " "
+        self.group = group
+        row = (shown, name, f"{max(map(len, messages)):,}", short(verdicts),
+               f"{longest * 1000:.0f}", f"{max(waits) * 1000:.0f}", f"{peak:.0f}")
+        print(("| {}| {} | {} | {} | {} | {} | {} |" if self.options.table else
+               "{}- {}: {} bytes: {}; {} ms of CPU time, answered in {} ms, peak {} MiB").format(*row),
+              flush=True)
 
     def pipelined(self, service, messages):
         """Numbers and verdicts, in the order of the replies, of messages sent without waiting."""
@@ -157,19 +162,19 @@ class Run:
         begun, counts = time.monotonic(), collections.Counter()
         for number, outcome in self.pipelined(service, [message for _, _, message in asked]):
             no_memory = outcome.startswith("notEnoughMemory: ")
-            counts["without memory" if no_memory else outcome.partition(":")[0]] += 1
+            counts["notEnoughMemory" if no_memory else outcome.partition(":")[0]] += 1
             self.check(no_memory or outcome == asked[number][1],
-                       f"at once: {outcome}, alone: {asked[number][1]}")
+                       f"outcome at once: {outcome}; alone: {asked[number][1]}")
         seconds = time.monotonic() - begun
         peak = service.memory("VmHWM")
         time.sleep(1.5)  # a second without a request
         rest = service.memory("VmRSS")
         service.end()
         if self.options.mebibytes:
-            self.check(rest < 16, f"{rest:.0f} MiB are kept when idle")
+            self.check(rest < 16, f"an idle service keeps {rest:.0f} MiB")
         limit = f" in {address_space >> 20} MiB of address space" if address_space else ""
-        print(f"the heaviest, {len(asked)} at once{limit}: {dict(counts)}, "
-              f"{seconds:.1f} s, {peak:.0f} MiB, {rest:.0f} MiB idle", flush=True)
+        print(f"{len(asked)} messages at once{limit}: {dict(counts)}, "
+              f"{seconds:.1f} s, peak {peak:.0f} MiB, idle {rest:.0f} MiB", flush=True)
 
     def rejections_leave_no_memory(self, count):
         """All rejected attacks of 64 KiB, again and again."""
@@ -180,16 +185,16 @@ class Run:
         def memory_after(count):
             asked = (messages * (count // len(messages) + 1))[:count]
             for _, outcome in self.pipelined(service, asked):
-                self.check(outcome != "record", "rejected before, now a record")
+                self.check(outcome != "record", "a message that was rejected before gives a record")
             return service.memory("VmRSS")
         # The memory that malloc keeps depends on the order of the messages: let it settle first.
         before = memory_after(max(count // 5, 3 * len(messages)))
         grown = memory_after(count) - before
         service.end()
-        print(f"{count} messages rejected, of {len(messages)} kinds: {before:.1f} MiB before, "
+        print(f"{count} rejected messages, of {len(messages)} kinds: {before:.1f} MiB before, "
               f"{grown:+.1f} MiB after", flush=True)
         if self.options.mebibytes:
-            self.check(grown < 4, f"rejections left {grown:.1f} MiB")
+            self.check(grown < 4, f"rejections leave {grown:.1f} MiB in use")
 
 
 def main():
