@@ -9,8 +9,8 @@ namespace ironmoat {
 /// What VeskCommandResponse is made with, in label order; `command` is labelled `with`.
 struct VeskCommandResponseArguments {
   Int command = 0;
-  Optional<Int64> messageId;
-  Optional<Data> messageUUID;
+  Optional<Int64> messageId;   ///< of the message that this answers
+  Optional<Data> messageUUID;  ///< of the message that this answers
   Optional<Int> responseStatus;
   Optional<Int> failReason;
   Optional<Data> token;

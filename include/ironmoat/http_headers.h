@@ -9,8 +9,8 @@ namespace ironmoat {
 struct DrelUserPayloadHttpHeadersArguments {
   Optional<String> adhocServiceOverride;
   Optional<String> responseIdentifierString;
-  Optional<String> strictTransportSecurity;
-  Optional<String> traceId;
+  Optional<String> strictTransportSecurity;  ///< header strict-transport-security
+  Optional<String> traceId;                  ///< header x-b3-traceid
   Optional<String> splunkHint;
   Optional<String> asHttpHeader;
 

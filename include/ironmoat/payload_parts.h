@@ -60,8 +60,8 @@ struct DrelHoplineAllocationStatus
 
 /// What DrelHoplineSelfAllocToken is made with, in label order; `relayIp` is labelled `with`.
 struct DrelHoplineSelfAllocTokenArguments {
-  Optional<Data> relayIp;
-  Optional<Data> relayIpv6;
+  Optional<Data> relayIp;    ///< address as bytes
+  Optional<Data> relayIpv6;  ///< address as bytes
   Optional<Int> relayPort;
   Optional<Data> relaySessionKey;
   Optional<Data> relaySessionId;

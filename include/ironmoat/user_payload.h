@@ -13,7 +13,23 @@ namespace ironmoat {
 struct DrelUserPayload;
 
 /// What DrelUserPayload is made with, in label order; `command` is labelled `with`. A field of type
-/// IRONMOAT_SPARSE(T) is read as an Optional<T> is (sparse_field.h).
+/// IRONMOAT_SPARSE(T) is read as an Optional<T> is (sparse_field.h). The first field of each group:
+///
+///     command               command header
+///     payload               bodies
+///     messageId             identity and delivery control
+///     KibbOwnerId           references to the attachment store
+///     contentVersion        content description
+///     token                 token and sender
+///     responseStatus        response status, times, failure report
+///     encryptionType        handling
+///     internalBuild         flags
+///     contentType           content type; HTTP header values, independent of httpHeaders
+///     dommelDeliveryStatus  delivery reports, retries, fan-out chunks
+///     webtunnelVersion      web tunnel, as in VeskCommandWebTunnelResponse
+///     writeToNimbra         flags and identifiers
+///     protocolVersion       relay allocation
+///     originalCommand       flags and codes
 struct DrelUserPayloadArguments : detail::SparseValues {
   using Sparse = DrelUserPayloadArguments;
   static constexpr std::size_t kFirstLine = __LINE__ + 1;
@@ -59,8 +75,8 @@ struct DrelUserPayloadArguments : detail::SparseValues {
   IRONMOAT_SPARSE(String) senderOpaqueId;
   IRONMOAT_SPARSE(String) mspId;
   IRONMOAT_SPARSE(Int) responseStatus;
-  IRONMOAT_SPARSE(Int64) epochTimeNanos;
-  IRONMOAT_SPARSE(Int64) originalEpochTimeNanos;
+  IRONMOAT_SPARSE(Int64) epochTimeNanos;          ///< nanoseconds since the epoch
+  IRONMOAT_SPARSE(Int64) originalEpochTimeNanos;  ///< nanoseconds since the epoch
   IRONMOAT_SPARSE(Int) failReason;
   IRONMOAT_SPARSE(Data) failMessageId;
   IRONMOAT_SPARSE(String) failMessageIdString;
@@ -72,8 +88,8 @@ struct DrelUserPayloadArguments : detail::SparseValues {
   IRONMOAT_SPARSE(Int) storageFlags;
   IRONMOAT_SPARSE(Int) priority;
   IRONMOAT_SPARSE(Int) senderExpectsAck;
-  List<DrelUserPayload> dstIdTokenList;
-  List<DrelUserPayload> corvelMessageList;
+  List<DrelUserPayload> dstIdTokenList;     ///< nested payloads
+  List<DrelUserPayload> corvelMessageList;  ///< nested payloads
   IRONMOAT_SPARSE(Int) storageCheckVersion;
   IRONMOAT_SPARSE(Int64) dateExpirationSeconds;
   IRONMOAT_SPARSE(Int) corvelProtocol;
@@ -89,8 +105,8 @@ struct DrelUserPayloadArguments : detail::SparseValues {
   IRONMOAT_SPARSE(String) traceId;
   IRONMOAT_SPARSE(String) splunkHint;
   IRONMOAT_SPARSE(String) asHttpHeader;
-  IRONMOAT_SPARSE(Int) dommelDeliveryStatus;
-  IRONMOAT_SPARSE(String) dommelReportId;
+  IRONMOAT_SPARSE(Int) dommelDeliveryStatus;  ///< home automation
+  IRONMOAT_SPARSE(String) dommelReportId;     ///< home automation
   IRONMOAT_SPARSE(Int) retryCount;
   IRONMOAT_SPARSE(String) testOptions;
   IRONMOAT_SPARSE(Int) fanoutChunkNumber;
@@ -101,11 +117,11 @@ struct DrelUserPayloadArguments : detail::SparseValues {
   IRONMOAT_SPARSE(String) httpUrl;
   Optional<DrelUserPayloadHttpHeaders> httpHeaders;
   IRONMOAT_SPARSE(Data) httpBody;
-  IRONMOAT_SPARSE(String) httpBodyUrl;
-  IRONMOAT_SPARSE(Data) httpBodyKey;
-  IRONMOAT_SPARSE(Int) httpResponseStatus;
+  IRONMOAT_SPARSE(String) httpBodyUrl;      ///< where the body is, if it is not in httpBody
+  IRONMOAT_SPARSE(Data) httpBodyKey;        ///< key of the body at httpBodyUrl
+  IRONMOAT_SPARSE(Int) httpResponseStatus;  ///< HTTP status code
   IRONMOAT_SPARSE(String) httpErrorMsg;
-  IRONMOAT_SPARSE(Bool) writeToNimbra;
+  IRONMOAT_SPARSE(Bool) writeToNimbra;  ///< write to the cloud
   IRONMOAT_SPARSE(Bool) pessimisticCheck;
   IRONMOAT_SPARSE(Bool) unfilteredHeaders;
   IRONMOAT_SPARSE(Int) deliveryStatusFlags;
@@ -123,10 +139,10 @@ struct DrelUserPayloadArguments : detail::SparseValues {
   IRONMOAT_SPARSE(Int) reason;
   IRONMOAT_SPARSE(Int) prevErrorCode;
   IRONMOAT_SPARSE(Data) prevAccessToken;
-  IRONMOAT_SPARSE(Data) prevRelayIp;
+  IRONMOAT_SPARSE(Data) prevRelayIp;  ///< address as bytes
   IRONMOAT_SPARSE(Int) prevTimestamp;
   IRONMOAT_SPARSE(Data) activeAccessToken;
-  IRONMOAT_SPARSE(Data) activeRelayIp;
+  IRONMOAT_SPARSE(Data) activeRelayIp;  ///< address as bytes
   IRONMOAT_SPARSE(Int) selfAllocTokenCountOld;
   IRONMOAT_SPARSE(Int) selfAllocTokenCount;
   List<DrelHoplinePluginRequest> pluginRequests;
@@ -142,18 +158,18 @@ struct DrelUserPayloadArguments : detail::SparseValues {
   IRONMOAT_SPARSE(String) groupId;
   IRONMOAT_SPARSE(Int) groupMemberCount;
   IRONMOAT_SPARSE(Int) allocateInfoAttribute;
-  IRONMOAT_SPARSE(Data) relayIp;
-  IRONMOAT_SPARSE(Data) relayIpv6;
+  IRONMOAT_SPARSE(Data) relayIp;    ///< address as bytes
+  IRONMOAT_SPARSE(Data) relayIpv6;  ///< address as bytes
   IRONMOAT_SPARSE(Int) relayPort;
   IRONMOAT_SPARSE(Data) relayAccessToken;
   IRONMOAT_SPARSE(Data) relaySessionKey;
   IRONMOAT_SPARSE(Data) relaySessionId;
-  IRONMOAT_SPARSE(Int64) expiryEpochTimeMillis;
-  IRONMOAT_SPARSE(Data) initiatorIp;
+  IRONMOAT_SPARSE(Int64) expiryEpochTimeMillis;  ///< milliseconds since the epoch
+  IRONMOAT_SPARSE(Data) initiatorIp;             ///< address as bytes
   IRONMOAT_SPARSE(Int64) participantId;
   IRONMOAT_SPARSE(Data) softwareVersion;
   IRONMOAT_SPARSE(String) relayBuildVersion;
-  IRONMOAT_SPARSE(Int64) allocationEpochTimeMillis;
+  IRONMOAT_SPARSE(Int64) allocationEpochTimeMillis;  ///< milliseconds since the epoch
   IRONMOAT_SPARSE(Int) allocationStatus;
   List<DrelHoplineAllocationStatus> allocationStatuses;
   List<DrelHoplineSelfAllocToken> selfAllocTokenList;

@@ -14,13 +14,13 @@ struct VeskCommandWebTunnelResponseArguments {
   Optional<Data> messageUUID;
   Optional<Int> responseStatus;
   Optional<String> contentType;
-  Optional<Int64> epochTimeNanos;
+  Optional<Int64> epochTimeNanos;  ///< nanoseconds since the epoch
   Optional<String> httpUrl;
   Optional<DrelUserPayloadHttpHeaders> httpHeaders;
   Optional<Data> httpBody;
-  Optional<String> httpBodyUrl;
-  Optional<Data> httpBodyKey;
-  Optional<Int> httpResponseStatus;
+  Optional<String> httpBodyUrl;      ///< where the body is, if it is not in httpBody
+  Optional<Data> httpBodyKey;        ///< key of the body at httpBodyUrl
+  Optional<Int> httpResponseStatus;  ///< HTTP status code; responseStatus is that of the command
   Optional<String> httpErrorMsg;
 
   using R = VeskCommandWebTunnelResponseArguments;

@@ -1,31 +1,36 @@
 """The records' tables as pages: doc/records.md for people, doc/records.json for programs.
 
-A record is shown under its output record's name; the n-th argument of the initialiser is the n-th
+The notes are the comments on fields in include/ironmoat/. A record is shown under its output record's name; the n-th argument of the initialiser is the n-th
 field of the wire record.
 """
 
 import json
+import pathlib
+import re
 
 from message_model import LIST_OF, RECORDS
+
+ROOT = pathlib.Path(__file__).resolve().parents[2]
 
 INTRODUCTION = """\
 # Records
 
-The fields of all records, in the order in which they are decoded, in which the initialisers take
-them, and in which they lie in a reply ([protocol.md](protocol.md)). Printed from the tables in the code
-by `scripts/refresh`; [records.json](records.json) holds the same for programs.
+The fields of all records, in the order in which a message is decoded and a reply holds them
+([protocol.md](protocol.md)). `scripts/refresh` generates this page, and [records.json](records.json)
+for programs, from the tables and comments in the code.
 
-- *key*: under which the message's dictionary has it. Keys are compared byte by byte. An entry under
-  an unknown key is ignored, whatever its value.
-- *type*: `Int` and `Int64` are both 64 bits, signed. An integer of any size beyond that is
-  `outOfRange`, a value of another kind a `typeMismatch`.
-- *in a message*: a *required* key must be there, or the message is refused with `keyNotFound`.
-- *in the record*: an *optional* field may be absent; a list that is *always* there is empty where
-  the message has none.
-- *label*: of the initialiser's argument.
+- The service checks the type of a value and carries the value without interpretation. It checks
+  neither ranges nor formats, nor one field against another.
+- *key*: the key in the message's dictionary, compared byte by byte. The service ignores an entry
+  under an unknown key, whatever its value.
+- *type*: `Int` and `Int64` are both signed 64-bit integers. A larger integer is `outOfRange`, a value
+  of another type a `typeMismatch`.
+- A message without a *required* key is rejected with `keyNotFound`. Without another key, a list of
+  records is empty, and any other field is absent.
+- In an initialiser the first argument is labelled `with`, and each other one as its field.
 
-Some values fit in no field. Under a known key they are a `typeMismatch` (a wide integer under an
-integer's key: `outOfRange`), under an unknown key they are ignored like any other value:
+Some values fit no field. Under a known key they are a `typeMismatch` (a wide integer under an
+integer's key: `outOfRange`), under an unknown key they are ignored:
 
 | value | binary | XML |
 |---|---|---|
@@ -36,10 +41,27 @@ integer's key: `outOfRange`), under an unknown key they are ignored like any oth
 | null, which is not absence | 0x00 | none |
 | set | counted as an array | none |
 
-Other bytes are not a property list, and `malformed` wherever they stand: integers of more than 16
-bytes, the fill byte 0x0F where an object should be, and the URLs, UUIDs, UTF-8 texts and ordered
-sets of later versions of the binary format.
+Other objects are `malformed` under any key: integers of more than 16 bytes, the fill byte 0x0F in
+place of an object, and the URLs, UUIDs, UTF-8 texts and ordered sets of later versions of the binary
+format.
 """
+
+
+def comments():
+    """(record, field) to the comment on the field, and to the group that begins with it."""
+    notes, groups = {}, {}
+    for header in sorted((ROOT / "include/ironmoat").glob("*.h")):
+        begun = {}
+        for line in header.read_text(encoding="utf-8").splitlines():
+            if group := re.match(r"///     (\w+) {2,}(.+)", line):
+                begun[group[1]] = group[2]
+            elif struct := re.match(r"struct (\w+)Arguments\b", line):
+                record = struct[1]
+                groups.update({(record, field): group for field, group in begun.items()})
+                begun = {}
+            elif note := re.search(r"(\w+);\s+///< (.+)", line):
+                notes[record, note[1]] = note[2]
+    return notes, groups
 
 
 class Page:
@@ -62,20 +84,20 @@ class Page:
 
     def markdown(self):
         parts = [INTRODUCTION]
+        notes, groups = comments()
         for name, record in self.records.items():
             parts.append(f"\n## {name}\n\nThe wire record is `{record['wireRecord']}`")
             if name in self.output_types:
                 kind, = (kind for kind, (_, output) in RECORDS.items() if output == name)
                 parts.append(f"; a message of type `{kind}`")
             parts.append(f". {len(record['fields'])} field{'s' * (len(record['fields']) > 1)}.\n\n"
-                         "| | field | type | key | in a message | in the record | label |\n"
-                         "|---|---|---|---|---|---|---|\n")
+                         "| | field | type | key | note |\n|---|---|---|---|---|\n")
             for place, field in enumerate(record["fields"]):
-                link = self.link(field["type"])
-                parts.append(f"| {place} | {field['name']} | {link} | `{field['key']}` "
-                             f"| {'required' if field['required'] else ''} "
-                             f"| {'optional' if field['optional'] else 'always'} "
-                             f"| {field['label']} |\n")
+                if group := groups.get((name, field["name"])):
+                    parts.append(f"| | *{group}* |\n")
+                note = "required" if field["required"] else notes.get((name, field["name"]), "")
+                parts.append(f"| {place} | {field['name']} | {self.link(field['type'])} "
+                             f"| `{field['key']}` |{note and f' {note} |'}\n")
         return "".join(parts)
 
     def link(self, type_name):
