@@ -95,14 +95,10 @@ def verdict(reply):
 
 
 def short(verdicts):
-    """A summary of verdicts."""
-    counts = collections.Counter(
-        v.partition(" at offset")[0].replace("limitExceeded: ", "limit: ").replace("malformed: ", "")
-        for v in verdicts)
-    words = [f"{count} × {word}" if len(verdicts) > 1 else word
-             for word, count in counts.most_common(3)]
-    left = sum(counts.values()) - sum(count for _, count in counts.most_common(3))
-    return "; ".join(words) + (f"; {left} others" if left else "")
+    """The outcomes, with their numbers if there are several messages."""
+    counts = collections.Counter(verdict.partition(":")[0] for verdict in verdicts)
+    return "; ".join(f"{count} × {kind}" if len(verdicts) > 1 else kind
+                     for kind, count in counts.most_common())
 
 
 class Run:
