@@ -2,7 +2,7 @@
 
 #include <functional>
 #include <string>
-#include <string_view>
+#include <vector>
 
 #include "support/binary_builder.h"
 #include "support/show_document.h"
@@ -21,7 +21,7 @@ const std::string kZero = bigEndianBytes(0, 8);
 
 /// What becomes of a message whose only object is `object`.
 std::string outcomeOf(const std::string& object) {
-  return readOutcome(BinaryBuilder().add(object).data());
+  return readOutcome(BinaryBuilder().add(object).text());
 }
 
 TEST(BinaryReader, ReadsEveryKindOfObject) {
@@ -52,7 +52,7 @@ TEST(BinaryReader, ReadsEveryKindOfObject) {
     EXPECT_EQ(outcomeOf(row.object), row.tree) << ::testing::PrintToString(row.object);
   }
   const std::string longLength = "\x4F\x13"s + bigEndianBytes(2, 8) + "ab";
-  EXPECT_EQ(readOutcome(BinaryBuilder().add("\xC2\x01\x02"s).add(longLength).integer(7).data()),
+  EXPECT_EQ(readOutcome(BinaryBuilder().add("\xC2\x01\x02"s).add(longLength).integer(7).text()),
             "set [data \"ab\", 7]");
 }
 
@@ -71,46 +71,36 @@ TEST(BinaryReader, AcceptsOnlyTheMarkersOfTheFormat) {
 }
 
 TEST(BinaryReader, RejectsMalformedObjectsWithReasonAndOffset) {
-  const std::string tooLong = "object exceeds the object area at offset 8";
-  const std::string badLength = "not a valid length at offset 9";
+  const std::string many(32, 'x');
   const std::string badPair = "not a valid surrogate pair at offset 9";
   const struct {
-    std::string object;
     std::string reason;
+    std::vector<std::string> objects;
   } rows[] = {
-      {"\x43"s + "ab", tooLong},
-      {"\x80"s, tooLong},
-      {"\x4F"s, tooLong},
-      {"\x4F\x10"s, tooLong},
-      {"\x4F\x23"s + "12345678", badLength},
-      {"\x4F\x0F"s + "12345678", badLength},
-      {"\x4F\x14"s + kZero + kZero, badLength},
-      {"\x6F\x23" + std::string(32, 'x'), badLength},
-      {"\xAF\x23" + std::string(32, 'x'), badLength},
-      {"\x6F\x13" + kTopBit, tooLong},
-      {"\xAF\x13" + kMax, tooLong},
-      {"\xA3\x00"s, tooLong},
-      {"\xDF\x13" + kTopBit, tooLong},
-      {"\xA1\x01"s, "not a valid reference at offset 9"},
-      {"\xA3\x00\x01\x00"s, "not a valid reference at offset 10"},
-      {"\xA3\x00\x00\x01"s, "not a valid reference at offset 11"},
-      {"\x61\xD8\x3D"s, badPair},
-      {"\x62\xD8\x3D\x00\x41"s, badPair},
-      {"\x62\xDE\x00\xDE\x00"s, badPair},
-      {"\x62\xDF\xFF\xDE\x00"s, badPair},
-      {"\x62\x00\x41\xDE\x00"s, "not a valid surrogate pair at offset 11"},
-      {"\xA1\x00"s, "reference cycle not allowed at offset 8"},
-      {"\xC1\x00"s, "reference cycle not allowed at offset 8"},
-      {"\xD1\x00\x00"s,
-       "not a valid dictionary key: expected string, found dictionary at offset 8"},
+      {"object exceeds the object area at offset 8",
+       {"\x43"s + "ab", "\x80", "\x4F", "\x4F\x10", "\x6F\x13" + kTopBit, "\xAF\x13" + kMax,
+        "\xA3\x00"s, "\xDF\x13" + kTopBit}},
+      {"not a valid length at offset 9",
+       {"\x4F\x23" + many, "\x4F\x0F" + many, "\x4F\x14" + kZero + kZero, "\x6F\x23" + many,
+        "\xAF\x23" + many}},
+      {"not a valid reference at offset 9", {"\xA1\x01"}},
+      {"not a valid reference at offset 10", {"\xA3\x00\x01\x00"s}},
+      {"not a valid reference at offset 11", {"\xA3\x00\x00\x01"s}},
+      {badPair,
+       {"\x61\xD8\x3D", "\x62\xD8\x3D\x00\x41"s, "\x62\xDE\x00\xDE\x00"s, "\x62\xDF\xFF\xDE\x00"s}},
+      {"not a valid surrogate pair at offset 11", {"\x62\x00\x41\xDE\x00"s}},
+      {"reference cycle not allowed at offset 8", {"\xA1\x00"s, "\xC1\x00"s}},
+      {"not a valid dictionary key: expected string, found dictionary at offset 8",
+       {"\xD1\x00\x00"s}},
   };
   for (const auto& row : rows) {
-    EXPECT_EQ(outcomeOf(row.object), "malformed: " + row.reason)
-        << ::testing::PrintToString(row.object);
+    for (const std::string& object : row.objects) {
+      EXPECT_EQ(outcomeOf(object), "malformed: " + row.reason) << ::testing::PrintToString(object);
+    }
   }
   // The bytes behind a text complete no pair.
   const std::string dc = "\xDC"s.append(24, '\x02');
-  EXPECT_EQ(readOutcome(BinaryBuilder().add("\x61\xD8\x3D"s).add(dc).ascii("k").data()),
+  EXPECT_EQ(readOutcome(BinaryBuilder().add("\x61\xD8\x3D"s).add(dc).ascii("k").text()),
             "malformed: " + badPair);
 }
 
@@ -118,12 +108,12 @@ TEST(BinaryReader, RejectsForeignBytesInAsciiAtEveryPosition) {
   for (std::size_t length = 1; length <= 40; ++length) {
     const std::string text(length, 'x');
     // The byte behind the text is not part of it.
-    EXPECT_EQ(readOutcome(BinaryBuilder().ascii(text).add("\x80z").data()), "\""s + text + "\"");
+    EXPECT_EQ(readOutcome(BinaryBuilder().ascii(text).add("\x80z").text()), "\""s + text + "\"");
     for (std::size_t at = 0; at < length; ++at) {
       std::string wrong = text;
       wrong[at] = '\x80';
       const std::size_t offset = (length < 15 ? 9 : 11) + at;
-      EXPECT_EQ(readOutcome(BinaryBuilder().ascii(wrong).data()),
+      EXPECT_EQ(readOutcome(BinaryBuilder().ascii(wrong).text()),
                 "malformed: not a valid ASCII character at offset " + std::to_string(offset));
     }
   }
@@ -143,12 +133,12 @@ TEST(BinaryReader, ReadsOffsetsAndReferencesOfEverySize) {
         builder.add('\x12' + bigEndianBytes(builder.objects.size(), 4));
       }
       const auto number = [](std::size_t value) { return std::to_string(value); };
-      EXPECT_EQ(readOutcome(builder.data()),
+      EXPECT_EQ(readOutcome(builder.text()),
                 "[[" + number(last - 1) + ", " + number(last - 2) + "], " + number(last) + ", 2]");
     }
     BinaryBuilder stray;  // in its highest byte
     stray.referenceSize = size;
-    EXPECT_EQ(readOutcome(stray.array({1ULL << (8 * (size - 1))}).data()),
+    EXPECT_EQ(readOutcome(stray.array({1ULL << (8 * (size - 1))}).text()),
               "malformed: not a valid reference at offset 9");
   }
 }
@@ -182,12 +172,11 @@ TEST(BinaryReader, RejectsMalformedTrailersWithReasonAndOffset) {
   for (const auto& row : rows) {
     BinaryBuilder builder;
     row.change(builder.integer(1));
-    EXPECT_EQ(readOutcome(builder.data()), "malformed: " + row.reason);
+    EXPECT_EQ(readOutcome(builder.text()), "malformed: " + row.reason);
   }
   std::string other = BinaryBuilder().integer(1).text();
   other[7] = '1';
-  EXPECT_EQ(readOutcome(testing::tightMessage(other)),
-            "malformed: not a valid version of the binary format at offset 6");
+  EXPECT_EQ(readOutcome(other), "malformed: not a valid version of the binary format at offset 6");
 }
 
 // S8.
@@ -195,7 +184,8 @@ TEST(BinaryReader, NestingLimitHoldsForSharedSubgraphsAndCycles) {
   // Containers in a row, each `times` in the one before, with parents first or last, which are
   // measured differently. The top one may also hold the last but one, whose height is then known
   // before the long way to it is measured.
-  const auto chain = [](std::size_t containers, std::size_t times, bool parentsFirst, bool both) {
+  const auto isTooDeep = [](std::size_t containers, std::size_t times, bool parentsFirst,
+                            bool both) {
     BinaryBuilder builder;
     builder.referenceSize = 2;
     const auto position = [&](std::size_t depth) {
@@ -211,43 +201,42 @@ TEST(BinaryReader, NestingLimitHoldsForSharedSubgraphsAndCycles) {
     }
     Document document;
     const auto rejection = read(builder.data(), document);  // the tree may have 2^512 leaves
-    return rejection ? testing::inWords(*rejection) : "accepted";
+    return rejection && rejection->kind() == DecodingError::Kind::limitExceeded;
   };
-  const std::string tooDeep = "limitExceeded: nesting exceeds the limit of 512 containers";
   for (const bool parentsFirst : {true, false}) {
     for (const bool both : {false, true}) {
-      EXPECT_EQ(chain(512, 2, parentsFirst, both), "accepted");
-      EXPECT_EQ(chain(513, 1, parentsFirst, both), tooDeep);
-      EXPECT_EQ(chain(20000, 1, parentsFirst, both), tooDeep);
+      EXPECT_FALSE(isTooDeep(512, 2, parentsFirst, both));
+      EXPECT_TRUE(isTooDeep(513, 1, parentsFirst, both));
+      EXPECT_TRUE(isTooDeep(20000, 1, parentsFirst, both));
     }
   }
   // A chain to a container whose only child was measured on another way.
   for (const std::size_t length : {310U, 311U}) {
-    const auto row = [](BinaryBuilder& builder, std::size_t containers) {
+    BinaryBuilder builder;
+    const auto row = [&](std::size_t containers) {
       for (std::size_t i = 1; i < containers; ++i) builder.array({builder.objects.size() + 1});
     };
-    BinaryBuilder builder;
     builder.referenceSize = 2;
     builder.array({1, 201, 202});
-    row(builder, 200);
+    row(200);
     builder.array({}).array({1});
-    row(builder, length);
+    row(length);
     builder.array({201});
-    EXPECT_EQ(readOutcome(builder.data()).starts_with("limitExceeded"), length == 311);
+    EXPECT_EQ(readOutcome(builder.text()).starts_with("limitExceeded"), length == 311);
   }
   BinaryBuilder loop;
   loop.root = 2;
-  EXPECT_EQ(readOutcome(loop.array({1}).array({0}).array({0}).data()),
+  EXPECT_EQ(readOutcome(loop.array({1}).array({0}).array({0}).text()),
             "malformed: reference cycle not allowed at offset 8");
 }
 
 TEST(Reader, RejectsMessagesThatExceedTheSizeLimit) {
   const std::size_t limit = std::size_t{16} << 20;
-  EXPECT_EQ(readOutcome(Data(std::string(limit + 1, ' '))),
+  EXPECT_EQ(readOutcome(std::string(limit + 1, ' ')),
             "limitExceeded: message size exceeds the limit of 16777216 bytes: 16777217");
-  EXPECT_EQ(readOutcome(Data(std::string(limit, ' '))),
+  EXPECT_EQ(readOutcome(std::string(limit, ' ')),
             "malformed: unexpected end of message at offset 16777216");
-  EXPECT_EQ(readOutcome(Data()), "malformed: unexpected end of message at offset 0");
+  EXPECT_EQ(readOutcome(""), "malformed: unexpected end of message at offset 0");
 }
 
 }  // namespace

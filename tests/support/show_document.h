@@ -1,10 +1,12 @@
 #pragma once
 
 #include <string>
+#include <string_view>
 
 #include "plist/document.h"
 #include "plist/reader.h"
 #include "support/rejection.h"
+#include "support/tight_message.h"
 
 namespace ironmoat::plist {
 
@@ -65,9 +67,9 @@ inline std::string show(const Document& document) {
 }
 
 /// The tree that a message holds, or its rejection as "kind: description".
-inline std::string readOutcome(const Data& message) {
+inline std::string readOutcome(std::string_view message) {
   Document document;
-  const auto rejection = read(message, document);
+  const auto rejection = read(testing::tightMessage(message), document);
   return rejection ? testing::inWords(*rejection) : show(document);
 }
 
