@@ -9,12 +9,14 @@
 #include "frames/frame_assembler.h"
 #include "ironmoat/limits.h"
 #include "support/tight_message.h"
+#include "support/written.h"
 
 namespace ironmoat::frames {
 namespace {
 
 using namespace std::string_literals;
 using testing::tightMessage;
+using testing::written;
 using Kind = DecodingError::Kind;
 
 std::string number(std::uint64_t value, std::size_t bytes) {
@@ -23,14 +25,6 @@ std::string number(std::uint64_t value, std::size_t bytes) {
   return text;
 }
 std::string frame(const std::string& body) { return number(body.size(), 4) + body; }
-
-/// The bytes that `append` appends.
-template <class Append>
-std::string written(Append append) {
-  BlockBuilder out;
-  append(out);
-  return std::string(out.bytes(), out.size());
-}
 
 /// `error` as a reply carries it.
 DecodingError carried(const DecodingError& error) {
@@ -138,12 +132,11 @@ TEST(FrameAssembler, SplitsFramesWhereverReadsEnd) {
   std::string stream;
   // Around the buffer's size, and small frames before and after large ones.
   for (const std::size_t size :
-       {0, 1, 5, 65531, 65532, 65533, 3, 65536, 200000, 0, 0, 7, 40000, 40000, 100, 1000000, 1}) {
-    const std::string body(size, static_cast<char>('a' + expected.size()));
-    expected.emplace_back(body);
-    stream += frame(body);
+       {0, 1, 5, 65531, 65532, 65533, 3, 65536, 200000, 0, 7, 40000, 40000, 100, 1000000, 1}) {
+    expected.emplace_back(std::string(size, static_cast<char>('a' + expected.size())));
+    stream += frame(std::string(expected.back().view()));
   }
-  for (const std::size_t piece : {1, 2, 3, 7, 1000, 65535, 65536, 4000000}) {
+  for (const std::size_t piece : {1, 3, 1000, 65535, 65536, 4000000}) {
     std::vector<Data> bodies;
     {
       FrameAssembler assembler(1000000, Sharing::oneThread);

@@ -11,6 +11,7 @@
 #include "ironmoat/user_payload.h"
 #include "ironmoat/web_tunnel_response.h"
 #include "support/tight_message.h"
+#include "support/written.h"
 
 namespace ironmoat {
 
@@ -23,11 +24,8 @@ using Response = VeskCommandResponse;
 using Tunnel = VeskCommandWebTunnelResponse;
 using Payload = DrelUserPayload;
 
-template <class R>
-std::string encoded(const R& record) {
-  BlockBuilder out;
-  encodeRecord(record, out);
-  return std::string(out.bytes(), out.size());
+std::string encoded(const auto& record) {
+  return testing::written([&](BlockBuilder& out) { encodeRecord(record, out); });
 }
 
 /// The description of the error that rejects `body`; empty if it is encoded as it was.
@@ -90,48 +88,42 @@ TEST(RecordCodec, LimitsNestingAndElements) {
     }
     return encoded(record);
   };
-  EXPECT_EQ(rejection<Payload>(nested(limits::nestedContainers)), "");
+  const std::string deepest = nested(limits::nestedContainers);
+  EXPECT_EQ(rejection<Payload>(deepest), "");
   EXPECT_THROW(static_cast<void>(nested(limits::nestedContainers + 1)), RecordError);
-  const std::string two = nested(2);
+  std::string two = nested(2);
   const std::string opening = two.substr(0, two.find(nested(1), 1));
-  std::string deep;
-  for (std::uint32_t i = 0; i < limits::nestedContainers; ++i) deep += opening;
-  EXPECT_EQ(rejection<Payload>(deep + nested(1)), "nesting exceeds the limit of 512 records");
-  std::string announced = two;  // two elements, and the bytes of one
-  announced.replace(opening.size() - 4, 4, "\2\0\0\0"s);
-  EXPECT_EQ(rejection<Payload>(announced), "list exceeds the rest of the record");
+  EXPECT_EQ(rejection<Payload>(opening + deepest), "nesting exceeds the limit of 512 records");
+  two.replace(opening.size() - 4, 4, "\2\0\0\0"s);  // elements, of which it has one
+  EXPECT_EQ(rejection<Payload>(two), "list exceeds the rest of the record");
 }
 
 TEST(RecordCodec, LimitsMemoryOfAllLists) {
   DrelUserPayloadArguments arguments;
   arguments.dstIdTokenList.push_back(Payload::with({}));  // counts with the other list
   const std::size_t max = limits::recordBytes / sizeof(Payload);
-  while (arguments.corvelMessageList.size() < max - 1) {
-    arguments.corvelMessageList.push_back(Payload::with({}));
-  }
+  arguments.corvelMessageList.assign(max - 1, Payload::with({}));
   EXPECT_EQ(rejection<Payload>(encoded(Payload::with(arguments))), "");
   arguments.corvelMessageList.push_back(Payload::with({}));
   EXPECT_EQ(rejection<Payload>(encoded(Payload::with(std::move(arguments)))),
             "memory of lists exceeds the limit of 67108864 bytes");
 }
 
-TEST(RecordCodec, LimitsTextAndDataOfAllFields) {
+TEST(RecordCodec, LimitsTextDataAndBytesOfReply) {
   VeskCommandResponseArguments arguments;
   arguments.token = Data(std::string(limits::deliveredBytes - 1, 'x'));
   arguments.applicationId = String("y");
   EXPECT_EQ(rejection<Response>(encoded(Response::with(arguments))), "");
   arguments.applicationId = String("yz");
   EXPECT_NE(rejection<Response>(encoded(Response::with(arguments))), "");
-}
 
-TEST(RecordCodec, LimitsBytesOfReply) {
   constexpr std::size_t kRest = 2 + 8 + 3 * 4;  // presence, command, lengths
-  VeskCommandResponseArguments arguments;
+  arguments.applicationId.reset();
   arguments.token = arguments.messageUUID = Data(std::string(limits::deliveredBytes, 'x'));
-  const std::size_t last = limits::replyBytes - kRest - 2 * limits::deliveredBytes;
-  arguments.veskSessionId = Data(std::string(last, 'x'));
+  const std::string last(limits::replyBytes - kRest - 2 * limits::deliveredBytes, 'x');
+  arguments.veskSessionId = Data(last);
   EXPECT_EQ(encoded(Response::with(arguments)).size(), limits::replyBytes);
-  arguments.veskSessionId = Data(std::string(last + 1, 'x'));
+  arguments.veskSessionId = Data(last + 'x');
   EXPECT_THROW(encoded(Response::with(arguments)), RecordError);
 }
 
