@@ -102,11 +102,9 @@ class CommandLine(InFolder):
         for arguments in (["-", "-"], ["-", "--files-from=-"], ["--files-from=missing"]):
             self.assertEqual(unpack(*arguments, input=b"good").returncode, 2)
 
-    def test_reads_nothing_when_option_is_unknown(self):
+    def test_prints_usage_help_and_version(self):
         self.expect(unpack("good", "--nonsense"), 2, "", "vesk-unpack: not a valid option: "
                     "'--nonsense'\nTry 'vesk-unpack --help'.\n")
-
-    def test_prints_help_and_version(self):
         for arguments, text in ((["--help", "good"], rb"([^\n]{0,80}\n)+"), (
                 ["--version"], rb"vesk-unpack \d+\.\d+\.\d+, frames version \d+\n")):
             result = unpack(*arguments)
@@ -114,24 +112,17 @@ class CommandLine(InFolder):
             self.assertRegex(result.stdout, b"^" + text + b"$")
 
     def test_reports_why_service_is_unavailable(self):
-        script = b"#!/bin/sh\nprintf 'last ~\\177' >&2; exit %d\n"
-        for status, why in ((64, "system call filter"), (73, "ends with parent"),
-                            (77, "full memory"), (78, "exited with status 78 (last ~")):
-            self.write(f"exits{status}", script % status, 0o755)
-            self.assertIn(why, lines("--service", f"./exits{status}", "good")[0]["error"]["message"])
-        for program, why in (("/nonexistent/service", "No such file"), ("/bin/true", "status 0")):
+        self.write("dies", b"#!/bin/sh\nprintf 'last ~\177' >&2; exit 78\n", 0o755)
+        for program, why in (("./dies", "exited with status 78 (last ~"), ("/bin/true", "status 0")):
             for line in lines("--service", program, "good", "bad"):
                 self.assertEqual(line["error"]["kind"], "unavailable")
                 self.assertIn(why, line["error"]["message"])
             self.assertEqual(unpack("--service", program, "good").returncode, 2)
 
-    def test_starts_no_service_that_other_users_can_replace(self):
+    def test_starts_no_service_of_others_without_proc(self):
         self.write("open/VeskIronmoatService", b"#!/bin/sh\ntouch ran\n", 0o755)
         os.chmod("open", 0o777)
         tool = os.path.abspath(shutil.copy(TOOL, "open"))
-        result = run(tool, "good")
-        self.assertEqual(result.returncode, 2)
-        self.assertRegex(result.stderr.decode(), "other users can replace '.*/open/VeskIronmoatServ")
         hidden = ["unshare", "-m", "sh", "-c", 'mount -t tmpfs none /proc && exec "$@"', "sh"]
         if run(*hidden, "true").returncode == 0:
             result = run(*hidden, tool, "../good", cwd="open")
@@ -147,11 +138,6 @@ class CommandLine(InFolder):
         errors = [line["error"] for line in lines("huge", "/dev/zero", "longest")]
         self.assertEqual([(each["kind"], each["message"]) for each in errors[:2]], [too_long] * 2)
         self.assertEqual(errors[2]["kind"], "malformed")
-
-    def test_accepts_file_name_that_is_not_text(self):
-        self.write(b'n\xff\n"\xc3\xa9\x1b', binary({"c": 1}))
-        self.assertEqual(lines(b'n\xff\n"\xc3\xa9\x1b'),
-                         [{"file": 'n\ufffd\n"é\x1b', "record": {"command": 1}}])
 
     def test_exits_with_2_when_output_cannot_be_written(self):
         for arguments in (["good"], ["good", "bad"], ["--help"]):
@@ -197,19 +183,18 @@ class Positions(InFolder):
                 '<key><![CDATA[<s>]]></key><?a <b>?><array ><data/><true/></array>'
                 '<key>é&lt;</key><dict/>\n%s</dict></plist>')
         one = "<dict><key>c</key><integer>1</integer></dict>"
-        for before, value, kind, path in (
-                ("<key>U</key>\r\n\t", "<array/>", "typeMismatch", "U"),
-                ("<key>s</key>", "<integer>9223372036854775808</integer>", "outOfRange", "s"),
-                ("<key>mml</key><array>" + one, "<dict/></array>", "keyNotFound", "mml[1].c")):
+        for before, value, path in (
+                ("<key>U</key>\r\n\t", "<array/>", "U"),
+                ("<key>s</key>", "<integer>9223372036854775808</integer>", "s"),
+                ("<key>mml</key><array>" + one, "<dict/></array>", "mml[1].c")):
             text = body % (before + value)
             ahead = text[:text.index(before) + len(before)]
             for mark, encoding in (("", "utf-8"), ("\ufeff", "utf-8"), ("\ufeff", "utf-16-le"),
                                    ("\ufeff", "utf-16-be")):
                 found = error((mark + text).encode(encoding), "--type=payload")
-                del found["message"]
-                self.assertEqual(found, {
-                    "kind": kind, "path": path, "offset": len((mark + ahead).encode(encoding)),
-                    "line": 1 + ahead.count("\n"), "column": len(ahead) - ahead.rindex("\n")})
+                self.assertEqual([found[name] for name in ("path", "offset", "line", "column")],
+                                 [path, len((mark + ahead).encode(encoding)),
+                                  1 + ahead.count("\n"), len(ahead) - ahead.rindex("\n")])
 
     def test_are_offset_of_value_at_fault_in_binary_message(self):
         filler = {str(number): number for number in range(300)}  # for offsets of two bytes
@@ -220,13 +205,6 @@ class Positions(InFolder):
             found = error(content, "--type=payload")
             self.assertEqual((found["path"], found["offset"]), (path, content.index(marker)))
             self.assertNotIn("line", found)
-
-    def test_come_with_hint_when_key_differs_only_in_case(self):
-        for message, hinted in (({"C": 5}, True), ({"d": 1, "cc": 1, "\u0421": 1}, False)):
-            for content in (binary(message), xml(message)):
-                found = error(content)
-                self.assertEqual((found["kind"], "only in case" in found["message"]),
-                                 ("keyNotFound", hinted))
 
 
 class Types(InFolder):
@@ -250,20 +228,15 @@ class Types(InFolder):
                              sum(len(record["fields"]) for record in records))
 
     def test_auto_takes_record_with_most_values(self):
-        rows = [
-            ({"c": 5}, "command-response", ["web-tunnel-response", "payload"]),
-            ({"c": 5, "i": 7}, "command-response", ["web-tunnel-response"]),
-            ({"c": 5, "i": "seven"}, "payload", []),
-            ({"c": 5, "qrss": True}, "command-response", ["payload"]),
-            ({"c": 5, "hs": 200}, "web-tunnel-response", ["payload"]),
-        ]
-        for number, (message, _, _) in enumerate(rows):
-            self.write(str(number), binary(message))
-        found = lines("--type=auto", *map(str, range(len(rows))))
-        self.assertEqual([(line["type"], line["asWell"]) for line in found],
-                         [(kind, as_well) for _, kind, as_well in rows])
-        self.expect(unpack("--type=auto", "0"), 0,
-                    "0 (command-response; also fits: web-tunnel-response, payload)\n  command  5\n")
+        for message, kind, as_well in (
+                ({"c": 5}, "command-response", ["web-tunnel-response", "payload"]),
+                ({"c": 5, "i": 7}, "command-response", ["web-tunnel-response"]),
+                ({"c": 5, "i": "seven"}, "payload", []),
+                ({"c": 5, "hs": 200}, "web-tunnel-response", ["payload"])):
+            line, = lines("--type=auto", input=binary(message))
+            self.assertEqual((line["type"], line["asWell"]), (kind, as_well))
+        self.expect(unpack("--type=auto", input=binary({"c": 5})), 0,
+                    "- (command-response; also fits: web-tunnel-response, payload)\n  command  5\n")
 
     def test_auto_reports_all_rejections_when_they_differ(self):
         found = error(xml({"c": 5, "i": True}), "--type=auto")
@@ -272,9 +245,8 @@ class Types(InFolder):
                          [("command-response", "i", "expected integer, found boolean"),
                           ("web-tunnel-response", "i", "expected integer, found boolean"),
                           ("payload", "i", "expected string, found boolean")])
-        for content, kind, service in ((b"", "malformed", []), (xml({"C": 1}), "keyNotFound", []),
-                                       (b"", "unavailable", ["--service=/bin/true"])):
-            found = error(content, "--type=auto", *service)  # the same for all types
+        for content, kind in ((b"", "malformed"), (xml({"C": 1}), "keyNotFound")):
+            found = error(content, "--type=auto")  # the same for all types
             self.assertEqual((found["kind"], "types" in found), (kind, False))
 
     def test_are_hinted_at_when_default_type_rejects(self):
@@ -364,9 +336,6 @@ $""")
                                (63, ": expected data, found\n    string")):
             shown = self.on_terminal("bad", columns=columns, NO_COLOR="1")
             self.assertIn("vesk-unpack: bad: typeMismatch at U" + words + "\n  line 8", shown)
-        shown = self.on_terminal("--service=/bin/true", "good", columns=40, NO_COLOR="1").splitlines()
-        self.assertGreater(len(shown), 2)
-        self.assertLessEqual(max(map(len, shown)), 40)
 
     def test_erases_progress_line_on_terminal(self):
         os.mkfifo("slow")
@@ -375,8 +344,7 @@ $""")
         output = self.on_terminal("slow", "good")
         feeder.join()
         self.assertIn("1 of 2 messages", output)
-        on_screen = re.sub(".*\r\x1b\\[K", "", output)
-        self.assertNotIn("of 2 messages", on_screen)
+        self.assertNotIn("of 2 messages", re.sub(".*\r\x1b\\[K", "", output))
 
 
 class SelfTest(InFolder):

@@ -13,16 +13,16 @@ namespace ironmoat::inspect {
 
 // Fields of all types that records have.
 
+template <class A>
+struct RecordOf : A {
+  using Arguments = A;
+};
 struct PartArguments {
   Optional<String> name;
   Optional<Int> number;
 
   using Fields = FieldList<PartArguments, &PartArguments::name, &PartArguments::number>;
 };
-struct Part : PartArguments {
-  using Arguments = PartArguments;
-};
-
 struct Whole;
 struct WholeArguments {
   Int command = 0;
@@ -31,34 +31,18 @@ struct WholeArguments {
   Optional<String> text;
   Optional<Data> bytes;
   Optional<List<String>> texts;
-  Optional<Part> part;
+  Optional<RecordOf<PartArguments>> part;
   List<Whole> listOfWholes;  // the longest name: widens the column only when it is shown
 
   using R = WholeArguments;
   using Fields = FieldList<R, &R::command, &R::time, &R::flag, &R::text, &R::bytes, &R::texts,
                            &R::part, &R::listOfWholes>;
 };
-struct Whole : WholeArguments {
-  using Arguments = WholeArguments;
-};
+struct Whole : RecordOf<WholeArguments> {};
 
 namespace {
 
 using namespace std::literals;
-
-Whole fullRecord() {
-  Whole whole;
-  whole.command = 32;
-  whole.time = Int64{9007199254740993};
-  whole.flag = true;
-  whole.bytes = Data("0123456789");
-  whole.texts = List<String>{"one", "two"};
-  whole.part = Part{{.name = String("n"), .number = -7}};
-  whole.listOfWholes.resize(2);
-  whole.listOfWholes[0].part = Part{};
-  whole.listOfWholes[1].texts = List<String>{};
-  return whole;
-}
 
 std::string view(const Whole& whole, const Style& style = {}) {
   std::string out;
@@ -67,7 +51,19 @@ std::string view(const Whole& whole, const Style& style = {}) {
 }
 
 TEST(TextView, AlignsFieldsAndIndentsNestedFields) {
-  EXPECT_EQ(view(fullRecord()),
+  Whole whole;
+  whole.command = 32;
+  whole.time = Int64{9007199254740993};
+  whole.flag = true;
+  whole.bytes = Data("0123456789");
+  whole.texts = List<String>{"one", "two"};
+  whole.part = RecordOf<PartArguments>();
+  whole.part->name = String("n");
+  whole.part->number = -7;
+  whole.listOfWholes.resize(2);
+  whole.listOfWholes[0].part = RecordOf<PartArguments>();
+  whole.listOfWholes[1].texts = List<String>{};
+  EXPECT_EQ(view(whole),
             "  command       32\n"
             "  time          9007199254740993\n"
             "  flag          true\n"
@@ -119,16 +115,6 @@ TEST(TextView, ColoursLabelsAndEscapesQuotes) {
             "  \033[36mcommand\033[0m  0\n"
             "  \033[36mtext\033[0m     \"\\u{1b}[31m\\\" (4 bytes)\\\\\"\n"
             "  \033[36mbytes\033[0m    78 \033[2m(1 byte)\033[0m\n");
-}
-
-TEST(JsonWriter, WritesIntegersAsStringsWhenAsked) {
-  std::string out;
-  JsonWriter(out, Integers::strings).value(fullRecord());
-  EXPECT_EQ(out, R"({"command": "32", "time": "9007199254740993", "flag": true, )"
-                 R"("bytes": "MDEyMzQ1Njc4OQ==", "texts": ["one", "two"], )"
-                 R"("part": {"name": "n", "number": "-7"}, )"
-                 R"("listOfWholes": [{"command": "0", "part": {}, "listOfWholes": []}, )"
-                 R"({"command": "0", "texts": [], "listOfWholes": []}]})");
 }
 
 TEST(Text, IsEscapedWhenItWouldControlATerminal) {
@@ -225,9 +211,9 @@ TEST(Position, ShowsPartOfLineThatFitsWhenLineIsLong) {
   EXPECT_EQ(position(line, 1000, 33),
             "line 1, column 1001\n  ...aaaaaaaaaaaaaaa!bbbbbbbb...\n                    ^\n");
   const std::string fits = "<a>" + std::string(19, 'b') + "<c/></a>";
-  EXPECT_EQ(position(fits, 3, 33), "line 1, column 4\n  " + fits + "\n     ^\n");
-  EXPECT_EQ(position(fits + "d", 3, 33),
-            "line 1, column 4\n  " + fits.substr(0, 27) + "...\n     ^\n");
+  const std::string start = "line 1, column 4\n  " + fits.substr(0, 27);
+  EXPECT_EQ(position(fits, 3, 33), start + "/a>\n     ^\n");
+  EXPECT_EQ(position(fits + "d", 3, 33), start + "...\n     ^\n");
   std::string marks = "a";
   for (int i = 0; i < 3000; ++i) marks += "\xCC\x81";  // takes no column
   for (const std::string& wide : {marks, std::string(3000, '\xF0'), std::string(3000, '\x80')}) {
