@@ -1,6 +1,6 @@
 #!/usr/bin/env python3
-"""chart.py UNPACK.json FOLDER: the ratios to peers of one run of unpack_bench as bars, each with its
-limit as a line: unpacking_binary.svg and unpacking_xml.svg for doc/performance.md."""
+"""chart.py UNPACK.json FOLDER: draws the ratios of one run of unpack_bench as bars, each with its limit
+as a line, in unpacking_binary.svg and unpacking_xml.svg, for doc/performance.md."""
 
 import pathlib
 import sys
@@ -12,7 +12,7 @@ ROW, LEFT, WIDTH, LARGEST = 22, 90, 480, 2.5  # pixels; a longer bar is cut off 
 
 
 def ratios(found, column):
-    """Message, ratio and limit, which may be none."""
+    """Yields message, ratio and limit, or None if the ratio has no limit."""
     for messages, columns in ((table.MESSAGES, table.COLUMNS), (table.STREAMS, table.STREAM_COLUMNS)):
         measured, against, limits = columns[column]
         for message, limit in zip(messages, limits):

@@ -1,5 +1,5 @@
-// What the service would be if unpacking were free: as sandboxed, waits as it does, reads requests
-// through the same assembler and answers each with the reply that a typical message gets.
+// A stand-in for a service that unpacks in no time: it enters the same sandbox, waits and reads
+// requests by the same code, and answers each with the reply to a typical message.
 
 #include <fcntl.h>
 #include <sys/select.h>
@@ -27,7 +27,7 @@ namespace {
 
 using namespace ironmoat;
 
-// Calls that sandbox allows, on a socket that does not block.
+// Waits until the non-blocking descriptor is ready, by a call that the sandbox allows.
 void waitFor(int descriptor, bool toRead) {
   fd_set only;
   FD_ZERO(&only);
@@ -74,7 +74,7 @@ int main() {
   BlockBuilder out;
   frames::FrameAssembler assembler(frames::kMaxRequestBody, Sharing::oneThread);
   frames::Hello hello = frames::Hello::ours();
-  hello.sandbox = sandbox::enter();  // its filter is part of what a call costs
+  hello.sandbox = sandbox::enter();  // the filter is part of the cost of each call
   frames::appendHello(out, hello);
   while (writeAll({out.bytes(), out.size()})) {
     out.truncate(0);

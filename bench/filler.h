@@ -13,13 +13,13 @@
 
 namespace ironmoat::bench {
 
-/// Gives the fields of a record values, unlike those of any other field.
+/// Sets the fields of records, each to a value that no other field has.
 class Filler {
  public:
   explicit Filler(std::uint64_t number = 0) : number_(number) {}
   virtual ~Filler() = default;
 
-  /// The fields that `wanted(place in the table)` asks for, and the required ones.
+  /// Sets the required fields, and those for which `wanted(place in the table)` is true.
   template <class R, class Wanted>
   void fill(R& record, Wanted wanted) {
     using Fields =

@@ -1,10 +1,11 @@
-// growth SMALLEST LARGEST [time]: what unpacking costs, as JSON lines for each sample, what is
-// refused at its end, each stream, and each shape in several sizes; in each form: messages, and for
-// one of them bytes, allocations and, of a shape and when asked, the least CPU nanoseconds of
-// several runs; and peak bytes of heap.
+// growth SMALLEST LARGEST [time]: prints what unpacking costs, one JSON line for each format of
+// each sample, of each message that is rejected at its end, of each stream, and of each shape in
+// several sizes from SMALLEST to LARGEST bytes. A line has the number of messages; for one message
+// its bytes, its allocations and, with `time`, for shapes, the least CPU nanoseconds of several
+// runs; and the peak bytes of heap.
 //
-// Every unpacking to be counted goes through `measured`, once, in the order of the lines: under
-// callgrind with --toggle-collect and --dump-after on it, instructions come out in the same order.
+// `measured` unpacks each line's messages once, in the order of the lines, so that callgrind with
+// --toggle-collect and --dump-after on it counts instructions in the same order.
 
 #include <time.h>
 
@@ -42,7 +43,8 @@ double cpuNanoseconds() {
   return 1e9 * static_cast<double>(now.tv_sec) + static_cast<double>(now.tv_nsec);
 }
 
-/// Of one unpacking, in batches that take long enough for the clock.
+/// The least CPU nanoseconds of one unpacking, measured in batches that are long enough for the
+/// clock.
 double leastTime(const Data& message) {
   constexpr double kBatch = 1e5;
   constexpr double kEnough = 5e7;
@@ -64,7 +66,7 @@ double leastTime(const Data& message) {
 
 void report(std::string_view kind, std::string_view name, plist::Format form,
             std::span<const Data> messages, bool timed) {
-  // What happens once in a process, and what the processor soon learns.
+  // Warms up: initialisation that happens once, caches and branch predictor.
   for (int i = 0; i < 3; ++i) unpackOnce(messages[0]);
   std::size_t bytes = 0;
   for (const Data& message : messages) bytes += message.size();
@@ -87,7 +89,7 @@ void report(std::string_view kind, std::string_view name, plist::Format form,
 
 void run(std::size_t smallest, std::size_t largest, bool timed) {
   constexpr plist::Format kForms[] = {plist::Format::binary, plist::Format::xml};
-  constexpr std::size_t kStream = 256;  // messages: enough for counts
+  constexpr std::size_t kStream = 256;  // messages, which suffice for counts
   const auto one = [timed](std::string_view kind, std::string_view name, plist::Format form,
                            const Data& message) {
     report(kind, name, form, {&message, 1}, timed);

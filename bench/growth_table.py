@@ -1,5 +1,5 @@
 #!/usr/bin/env python3
-"""growth_table.py GROWTH.jsonl: what `growth` found, as the tables of doc/performance.md."""
+"""growth_table.py GROWTH.jsonl: prints the results of `growth` as a table of doc/performance.md."""
 
 import json
 import math
@@ -15,7 +15,7 @@ def read(path):
 
 
 def slope(points):
-    """Of the straight line through (log x, log y), by least squares."""
+    """The slope of the straight line through (log x, log y), by least squares."""
     logs = [(math.log(x), math.log(y)) for x, y in points]
     middle_x = sum(x for x, _ in logs) / len(logs)
     middle_y = sum(y for _, y in logs) / len(logs)
@@ -24,7 +24,7 @@ def slope(points):
 
 
 def curves(lines):
-    """(shape, form) to its lines, smallest message first."""
+    """Maps (shape, form) to its lines, smallest message first."""
     found = defaultdict(list)
     for line in lines:
         if line["kind"] == "shape":
@@ -38,7 +38,7 @@ def main():
           "and largest | peak heap per byte of the largest |\n|---|---|---|---|---|---|---|")
     for (name, form), points in curves(lines).items():
         first, last = points[0], points[-1]
-        # The message's own block included: what is not copied out of it costs nothing besides.
+        # Includes the message's own block, to which slices of it add nothing.
         memory = slope([(p["bytes"], p["bytes"] + p["peak"]) for p in points])
         time = slope([(p["bytes"], p["nanoseconds"]) for p in points])
         mark = " **over**" if max(time, memory) > STEEPEST else ""

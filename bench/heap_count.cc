@@ -23,7 +23,7 @@ void removing(void* block) noexcept {
 
 }  // namespace
 
-// glibc's own, under the names that it keeps for replacements like this one.
+// glibc's own allocator, under the names that it exports for replacements such as this one.
 extern "C" {
 void* __libc_malloc(std::size_t size);
 void* __libc_calloc(std::size_t count, std::size_t size);

@@ -4,13 +4,12 @@
 
 namespace ironmoat::bench {
 
-/// What this process's heap has been asked for: linking heap_count.cc puts it in the place of
-/// malloc and all that goes through it. For one thread.
+/// Counts of this process's heap. Linking heap_count.cc replaces malloc and its relatives. One
+/// thread only.
 struct HeapCount {
-  std::size_t allocations =
-      0;                  ///< malloc, calloc and aligned ones; a realloc that is its own block
-  std::size_t bytes = 0;  ///< held now
-  std::size_t peak = 0;   ///< the most that was held since `restartPeak`
+  std::size_t allocations = 0;  ///< calls of malloc, calloc, realloc and aligned ones
+  std::size_t bytes = 0;        ///< allocated now
+  std::size_t peak = 0;         ///< largest `bytes` since `restartPeak`
 };
 
 HeapCount heapCount() noexcept;

@@ -132,7 +132,8 @@ Data brokenAtLast(const Data& message, plist::Format form) {
   if (form == plist::Format::xml) {
     bytes.at(bytes.rfind('>') - 1) = '-';
   } else {
-    constexpr std::size_t kTrailer = 32;  // its byte 6: the size of an offset, the last before it
+    constexpr std::size_t kTrailer =
+        32;  // bytes; byte 6 is the size of an offset in the table before it
     const std::size_t trailer = bytes.size() - kTrailer;
     bytes.at(trailer - static_cast<unsigned char>(bytes.at(trailer + 6))) = '\xFF';
   }

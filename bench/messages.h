@@ -12,7 +12,7 @@
 
 namespace ironmoat::bench {
 
-/// The messages that everything is measured with.
+/// The messages of all measurements.
 struct Sample {
   std::string_view name;
   VeskCorvelProtocolPayload record;
@@ -24,20 +24,21 @@ struct Sample {
 const std::vector<Sample>& samples();
 const Sample& sample(std::string_view name);
 
-/// No two payloads of different `number` share a text, data or large integer.
+/// Payloads of different `number` have no text, data or large integer in common.
 VeskCorvelProtocolPayload typicalPayload(unsigned number);
 
-/// Bytes that look like a token's, and hexadecimal digits: the same for the same number, always.
+/// Bytes as in a token, and hexadecimal digits; both depend only on the number.
 std::string noise(std::size_t size, std::uint64_t number);
 std::string hex(std::size_t digits, std::uint64_t number);
 
-/// The bytes as a message that one thread has to itself, which is how the host makes them.
+/// The bytes as a message in a block that only one thread uses, as in the host.
 Data inOneThreadBlock(std::string_view bytes);
 
-/// A message of our own writer as others put it: with a DOCTYPE, and data in lines of 76 columns.
+/// Rewrites XML of the library's writer as other writers put it: with a DOCTYPE, and data in lines
+/// of 76 columns.
 std::string asOrdinaryWriters(std::string_view xml);
 
-/// The record as a message, ready to be unpacked.
+/// The record as a message.
 template <class R>
 Data messageOf(const R& record, plist::Format form) {
   const Data message = plist::PropertyListEncoder(form).encode(record);
@@ -45,8 +46,8 @@ Data messageOf(const R& record, plist::Format form) {
   return inOneThreadBlock(asOrdinaryWriters(message.view()));
 }
 
-/// The record with a last field of the wrong kind: the document is read by then, and the other
-/// fields are decoded.
+/// A record with a last field of the wrong kind. A reader finds the error only after it has read
+/// the document and decoded the other fields.
 struct WrongAtLast {
   const VeskCorvelProtocolPayload& record;
   void encode(plist::Encoder& encoder) const {
@@ -58,8 +59,8 @@ struct WrongAtLast {
   }
 };
 
-/// The message with its last object out of bounds or its last end tag misspelt: all else is read by
-/// then.
+/// The message with its last object out of bounds or its last end tag misspelt. A reader finds the
+/// error only after everything else.
 Data brokenAtLast(const Data& message, plist::Format form);
 
 constexpr std::string_view nameOf(plist::Format form) {

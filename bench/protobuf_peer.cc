@@ -20,7 +20,7 @@ using google::protobuf::FieldDescriptor;
 using google::protobuf::Message;
 using google::protobuf::Reflection;
 
-/// Copies a record into a message field by field, by the place of the field in its table.
+/// Copies a record into a message. Field number N is the Nth field of the record's table.
 class Copier {
  public:
   template <class R>
@@ -73,7 +73,7 @@ class Copier {
 using Payload = peer::VeskCorvelProtocolPayload;
 
 long long parseInto(Payload& message, const std::string& bytes) {
-  // What ParseFromArray does, but that goes no deeper than 100 messages.
+  // As ParseFromArray, which rejects messages nested deeper than 100.
   constexpr int kDeepest = 1000;
   const char* at = nullptr;
   google::protobuf::internal::ParseContext context(kDeepest, false, &at, bytes);

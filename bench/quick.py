@@ -1,11 +1,15 @@
 #!/usr/bin/env python3
-"""quick.py GROWTH-PROGRAM: has unpacking become worse in a way that shows on any machine?
+"""quick.py GROWTH-PROGRAM [grant]: checks costs of unpacking that are the same on any machine.
 
-Counts allocations and, where there is valgrind, instructions, branches and, as a simple processor
-would, mispredictions; looks at no clock. Fails when a message needs more than it is granted below,
-when refusing it at its end takes more than twice the instructions of accepting it and those of an
-exception, when instructions or memory grow faster than the message, or when allocations come with
-the number of texts or with more than one for each payload and each list.
+Counts allocations and, with valgrind, instructions, branches and the mispredictions of a simple
+processor. Fails if
+- a count for one message exceeds its limit below,
+- rejecting a message at its end takes more than twice the instructions of accepting it, without those
+  of one exception,
+- instructions or memory grow faster than the message, or
+- allocations grow with the number of texts, or faster than one for each payload and each list.
+
+With `grant`, prints limits from the counts of this run instead.
 """
 
 import math
@@ -19,10 +23,9 @@ import tempfile
 import growth_table
 
 COUNTS = ("allocations", "instructions", "branches", "mispredictions")
-# message, form: what one message may take of each, on average over a stream. It is what was counted
-# last (g++ 12, -O3) and a tenth more; of mispredictions a quarter, for they depend on where in
-# memory the branches lie. Lower them when they have become far too many: `quick.py GROWTH-PROGRAM
-# grant` prints them anew.
+# Limits for one message, on average over a stream, by message and form: the last counts (g++ 12, -O3)
+# plus 10 %, for mispredictions plus 25 %, because these depend on the addresses of branches. If counts
+# have fallen far below, replace them by what `grant` prints.
 GRANTED = {
     ("min", "binary"): (0, 1610, 210, 19),
     ("min", "xml"): (0, 3070, 546, 37),
@@ -51,19 +54,19 @@ GRANTED = {
     ("unknown", "binary"): (3, 757000, 107000, 453),
     ("unknown", "xml"): (17, 2240000, 609000, 16100),
 }
-REFUSED_AT_MOST = 2.0  # against accepted
-THROWN = 22_000  # one exception through three frames: about 18,000 were counted
+REFUSED_AT_MOST = 2.0  # times accepted
+THROWN = 22_000  # instructions; one exception through three frames takes about 18,000
 SIZES = (4096, 262144)
-# Buffers double: so many allocations for each doubling of a message, and these to begin with.
+# Allocations for each doubling of a message, because buffers double, and for the smallest message.
 PER_DOUBLING, AT_FIRST = 6, 12
-# These have a payload for so many bytes, and so many allocations for each: its values, and where
-# each payload is in a list of its own, that list in each of the two records.
+# Shapes of nested payloads: bytes of a payload, and allocations for each: one for its values and, if
+# each payload is in a list of its own, one for that list in each of the two records.
 PAYLOAD_BYTES = 850
 PER_PAYLOAD = {"wide": 1, "nested": 3}
 
 
 def count(program):
-    """The lines that the program prints, each with its instructions if they can be counted."""
+    """The lines that the program prints, with instruction counts if valgrind is installed."""
     with tempfile.TemporaryDirectory() as folder:
         out = pathlib.Path(folder) / "calls"
         sizes = [str(size) for size in SIZES]
@@ -83,7 +86,7 @@ def count(program):
             dump = pathlib.Path(f"{out}.{number}").read_text(encoding="utf-8")
             events, totals = (re.search(rf"^{what}: (.*)", dump, re.MULTILINE)[1].split()
                               for what in ("events", "totals"))
-            # callgrind leaves out what is 0 at the end.
+            # callgrind omits trailing zeros.
             of = dict(zip(events, map(int, totals + ["0"] * len(events))))
             for what, parts in (("instructions", ("Ir",)), ("branches", ("Bc", "Bi")),
                                 ("mispredictions", ("Bcm", "Bim"))):
@@ -125,7 +128,7 @@ def faults(lines):
 
 
 def grants(lines):
-    """The table above as it would be now."""
+    """Prints GRANTED from the counts of this run."""
     for line in lines:
         if line["kind"] in ("sample", "stream"):
             mean = line["allocations"]

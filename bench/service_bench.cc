@@ -1,6 +1,6 @@
-// Time through the client and the service's process, beside an echo of the same frames and sizes,
-// and of unpacking in this process. Wall time: most of it is spent in other threads. Compiles with
-// older builds of the client, too (scripts/bench against).
+// Measures the path through the client and the service's process, an echo of the same frames and
+// sizes, and unpacking in this process. Measures wall time, because other threads and processes do
+// most of the work. Must compile with older builds of the client, too (scripts/bench against).
 
 #include <benchmark/benchmark.h>
 #include <fcntl.h>
@@ -37,7 +37,7 @@ using benchmark::State;
 constexpr char kEcho[] = ECHO_SERVICE;
 constexpr char kService[] = SERVICE;
 
-// What a benchmark's threads share; made before they start and destroyed when they are gone.
+// Shared by a benchmark's threads: created before they start and destroyed after they have ended.
 std::unique_ptr<Client> client;
 std::vector<pid_t> neighbours;
 
@@ -57,8 +57,8 @@ void submitMany(const Data& message) {
 
 enum class Use { unpack, submit };
 
-/// `client` becomes one of services that have been at work for a while: their start is measured by
-/// itself, and the kernel may take 30 ms to put two processes on two processors.
+/// Replaces `client` by one whose services have worked for 50 ms, so that their start does not
+/// count and the kernel has put them on processors of their own.
 template <const char* program, Use use = Use::unpack>
 void settle(const State& state) {
   using Clock = std::chrono::steady_clock;
@@ -75,7 +75,7 @@ void settle(const State& state) {
   }
 }
 
-/// As many processes in endless loops as the benchmark's argument says.
+/// Starts as many processes with an endless loop as the benchmark's argument says.
 void addNeighbours(const State& state) {
   for (int i = 0; i < state.range(0); ++i) {
     const pid_t child = ::fork();
@@ -118,7 +118,7 @@ void roundTrip(State& state) { unpackAgainAndAgain(state, typicalMessage()); }
 void large(State& state) {
   VeskCorvelProtocolPayload record = typicalPayload(0);
   const auto size = static_cast<std::size_t>(state.range(0)) << 20;
-  record.payload = Data(std::string(size - 4096, 'p'));  // so that the whole is within the limit
+  record.payload = Data(std::string(size - 4096, 'p'));  // leaves the message below its limit
   unpackAgainAndAgain(state, Data(messageOf(record, plist::Format::binary).view()));
 }
 
@@ -135,7 +135,7 @@ void refused(State& state) {
   }
 }
 
-/// Always as many requests in flight for each thread as the argument says.
+/// Keeps as many requests of each thread in flight as the benchmark's argument says.
 void pipelined(State& state) {
   const auto window = static_cast<std::size_t>(state.range(0));
   const Data message = typicalMessage();
@@ -150,7 +150,7 @@ void pipelined(State& state) {
   for (auto& each : inFlight) benchmark::DoNotOptimize(each.get().command);
 }
 
-/// The least that a round trip to another process costs when both sides block.
+/// A round trip to a process that echoes bytes, where both sides block without spinning.
 void blockingEcho(State& state) {
   std::string bytes(typicalMessage().size(), 'b');
   int ends[2];
@@ -176,7 +176,7 @@ void blockingEcho(State& state) {
   ::waitpid(child, nullptr, 0);
 }
 
-/// Nanoseconds of processor time that this process and its children have taken.
+/// Processor time of this process and its children, in nanoseconds.
 double processorTime() {
   std::vector<pid_t> all = {::getpid()};
   for (const auto& task : std::filesystem::directory_iterator("/proc/self/task")) {
@@ -185,7 +185,7 @@ double processorTime() {
   }
   double sum = 0;
   for (const pid_t process : all) {
-    clockid_t clock = {};  // to the nanosecond, where /proc/PID/stat has hundredths of a second
+    clockid_t clock = {};  // in nanoseconds; /proc/PID/stat has hundredths of a second
     timespec time = {};
     if (::clock_getcpuclockid(process, &clock) != 0 || ::clock_gettime(clock, &time) != 0) {
       throw std::runtime_error("cannot tell a process's processor time");
@@ -195,18 +195,18 @@ double processorTime() {
   return sum;
 }
 
-/// What a client that was used in both ways takes while it is not.
+/// Processor time of an idle client that has used both unpack and submit.
 void idle(State& state) {
   submitMany(typicalMessage());
   const double last = processorTime();
-  std::this_thread::sleep_for(std::chrono::seconds(2));  // the services wipe their memory
+  std::this_thread::sleep_for(std::chrono::seconds(2));  // the services clear their memory
   const double rested = processorTime();
   for (auto _ : state) std::this_thread::sleep_for(std::chrono::seconds(10));
   state.counters["going_to_rest"] = rested - last;
   state.counters["at_rest"] = processorTime() - rested;
 }
 
-/// A process of the same size that reads the end of its input at once and leaves.
+/// Starts a process of the service's size, which finds its input at the end and exits.
 void spawnAndWait(State& state) {
   for (auto _ : state) {
     posix_spawn_file_actions_t actions;
@@ -228,7 +228,7 @@ void startToFirstReply(State& state, const char* program) {
   for (auto _ : state) {
     auto starting = std::make_unique<Client>(options(program));
     benchmark::DoNotOptimize(starting->unpack<DrelUserPayload>(message).command);
-    state.PauseTiming();  // its end is not what is measured
+    state.PauseTiming();  // the end of the service does not count
     starting.reset();
     state.ResumeTiming();
   }

@@ -1,6 +1,6 @@
 #!/usr/bin/env python3
-"""service_table.py RUN.json... [against RUN.json...]: what service_bench found, pooled, against what
-it is held to; with the runs of an older build, against those, too."""
+"""service_table.py RUN.json... [against RUN.json...]: prints the pooled results of service_bench with
+their limits, and their ratios to the runs of an older build after `against`."""
 
 import itertools
 import statistics
@@ -10,7 +10,7 @@ import table
 
 
 class Runs:
-    """Of one build."""
+    """The pooled runs of one build."""
 
     def __init__(self, paths):
         self.found = {}
@@ -19,7 +19,7 @@ class Runs:
                 self.found.setdefault(name.replace("/real_time", ""), []).extend(runs.values())
 
     def all(self, name, field="real_time"):
-        """Nanoseconds of an iteration, one for each repetition."""
+        """Nanoseconds for one iteration, of each repetition."""
         scale = {"ns": 1, "us": 1e3, "ms": 1e6}
         return [run[field] * scale[run["time_unit"]] for run in self.found[name]]
 
@@ -47,8 +47,8 @@ def of_one_build(runs):
     time = runs.time
     alone, echo, service = time("inProcess/threads:1"), time("roundTrip/echo"), time(SERVICE + "1")
     one, two = time("pipelined/service/64"), time("pipelined/two/64/threads:2")
-    processors = alone / time("inProcess/threads:2")  # what two do, by what one does
-    # Below, the two sides waited for each other's processor.
+    processors = alone / time("inProcess/threads:2")  # rate of two threads / rate of one
+    # Below 1.8, other programs used the processors, and the two sides waited for each other.
     table_of("through the service", [
         ("round trip / (echo + unpacking)", service / (echo + alone), "≤ 1.15"),
         ("rejected / accepted, round trip", time("refused") / service, "≤ 2"),
@@ -67,7 +67,7 @@ def of_one_build(runs):
             for name, peer in [("protobuf over pipes", "protobufOverPipes"),
                                ("gRPC over a Unix socket", "grpcOverUnixSocket")]])
 
-    # Means, since what a wait beside others costs is rare and large.
+    # Means, because waits beside other processes are rare and long.
     waits = []
     for busy in (0, 1, 2, 4):
         trips = runs.all(f"neighbours/service/{busy}")

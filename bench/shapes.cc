@@ -16,8 +16,8 @@ namespace {
 
 using Payload = VeskCorvelProtocolPayload;
 
-/// Each nested payload brings so many bytes of its own: with fewer, a message of 16 MiB would be
-/// over limits::recordBytes.
+/// Bytes of content of each nested payload. With fewer, a message of 16 MiB would exceed
+/// limits::recordBytes.
 Payload heavyPayload(std::size_t number) {
   Payload payload;
   payload.command = static_cast<Int>(number);
@@ -59,7 +59,8 @@ Data blob(plist::Format form, std::size_t count) {
   return messageOf(top, form);
 }
 
-/// A dictionary of so many integers, which no record can be made to encode.
+/// A dictionary of `count` integers under unknown keys. Written by hand, because no record encodes
+/// to it.
 template <class Key>
 Data manyEntries(plist::Format form, std::size_t count, Key key) {
   plist::Document document;
@@ -111,7 +112,7 @@ Data utf16(plist::Format form, std::size_t count) {
   return inOneThreadBlock(bytes);
 }
 
-/// Arrays in which everything is shared: each is in two others, and one text is in all.
+/// Arrays that share everything: two others refer to each array, and all refer to one text.
 std::optional<Data> shared(plist::Format form, std::size_t count) {
   if (form == plist::Format::xml) return std::nullopt;
   constexpr std::size_t kGroup = 200;

@@ -11,18 +11,18 @@
 
 namespace ironmoat::bench {
 
-/// A way for a message to be large. Each grows with a count of its own.
+/// A way for a message to be large. Its size grows with a count.
 struct Shape {
   std::string_view name;
-  /// About how many bytes of message one more of the count is; says where to start.
+  /// Roughly the bytes of message for each unit of the count; the start of the search.
   std::size_t step;
-  /// Nothing where the form has no such shape.
+  /// Returns nothing if the format has no such shape.
   std::function<std::optional<Data>(plist::Format form, std::size_t count)> make;
 };
 
 const std::vector<Shape>& shapes();
 
-/// A message of the shape of about so many bytes, and at most limits::messageBytes.
+/// A message of the shape with about `bytes` bytes, and at most limits::messageBytes.
 std::optional<Data> messageOfSize(const Shape& shape, plist::Format form, std::size_t bytes);
 
 }  // namespace ironmoat::bench

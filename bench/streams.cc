@@ -19,15 +19,15 @@ namespace {
 
 using Payload = VeskCorvelProtocolPayload;
 using Keys = Payload::CodingKeys;
-using Choice = std::array<double, Keys::count>;  // how likely each field is, by its place
+using Choice = std::array<double, Keys::count>;  // probability of each field, in table order
 
-/// The same on every machine, which the standard's distributions are not.
+/// Random numbers that are the same on every machine, unlike those of the standard's distributions.
 class Chance {
  public:
   explicit Chance(std::uint64_t seed) : engine_(seed) {}
   std::uint64_t bits() { return engine_(); }
   std::size_t below(std::size_t limit) { return engine_() % limit; }
-  /// Over 0, up to 1.
+  /// Above 0, at most 1.
   double share() { return (static_cast<double>(engine_() >> 11) + 1) * 0x1p-53; }
 
  private:
@@ -43,7 +43,7 @@ class VaryingFiller : public Filler {
   VaryingFiller(std::uint64_t number, Chance& chance) : Filler(number), chance_(chance) {}
 
  protected:
-  /// A half has at most 14 bytes, a hundredth more than 300.
+  /// Half of the lengths are at most 14 bytes, one in a hundred exceeds 300.
   std::size_t length(std::size_t) override {
     return static_cast<std::size_t>(std::min(8 * std::pow(chance_.share(), -1 / 1.25), 4000.0));
   }
@@ -77,7 +77,7 @@ std::vector<std::size_t> placesInAnyOrder(Chance& chance) {
   return places;
 }
 
-/// The typical ones mostly, every other one now and then: the later in a fixed mixture the rarer.
+/// The typical fields are likely; all others are rarer, each by its place in a fixed shuffle.
 Choice byFrequency() {
   Choice choice = typicalFields();
   Chance chance(1);
@@ -123,7 +123,7 @@ Payload deep() {
   return inner;
 }
 
-/// A record with its keys in another order, and with unknown ones.
+/// A record with its keys in another order and with unknown keys added.
 struct Mixed {
   const Payload& record;
   const std::vector<std::size_t>& places;

@@ -10,25 +10,30 @@
 
 namespace ironmoat::bench {
 
-/// Messages that come one after the other, no two alike: what one message that is repeated does not
-/// show, because a processor learns it by heart.
+/// Different messages to unpack one after the other. They show the cost of mispredicted branches,
+/// which one repeated message hides.
 struct Stream {
   std::string_view name;
   std::vector<VeskCorvelProtocolPayload> records;
-  bool anyOrder = false;        ///< of the keys, another one in each message
-  std::size_t unknownKeys = 0;  ///< besides, in each
-  bool compact = false;         ///< no white space in XML
+  bool anyOrder = false;        ///< the keys have another order in each message
+  std::size_t unknownKeys = 0;  ///< added to each message
+  bool compact = false;         ///< without white space in XML
 };
 
-/// Of about 16 fields, those of a typical payload unless it says otherwise. lengths: heavy-tailed
-/// lengths of texts and data, integers of any size. kinds: ten choices of fields, mixed. some: each
-/// field of the table by its own frequency. order: keys in any order. varied: lengths, some and
-/// order at once.
+/// Streams of `count` messages with about 16 fields, by default those of a typical payload:
 ///
-/// And of one message each: deep: 200 payloads inside one another; its XML is compact, for its
-/// indentation would be 60 times as much. unknown: 90 KB of unknown keys.
+///     lengths  heavy-tailed lengths of texts and data, integers of any size
+///     kinds    one of ten sets of fields
+///     some     each field of the table with a probability of its own
+///     order    keys in any order
+///     varied   lengths, some and order at once
 ///
-/// The same ones for the same `count`, always.
+/// and of one message:
+///
+///     deep     200 nested payloads; its XML is compact, because indentation would dominate it
+///     unknown  3,300 unknown keys
+///
+/// The result depends only on `count`.
 std::vector<Stream> streams(std::size_t count);
 
 std::vector<Data> messagesOf(const Stream& stream, plist::Format form);

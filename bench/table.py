@@ -1,9 +1,9 @@
 #!/usr/bin/env python3
-"""table.py UNPACK.json: the ratios of one run of unpack_bench, as the tables of
+"""table.py UNPACK.json: prints the ratios of one run of unpack_bench as the tables of
 doc/performance.md.
 
-Each figure is the median over the run's repetitions of one time divided by another's. CPU time, not
-wall time: it moves less on a machine that does other things as well.
+A ratio divides the medians of two CPU times over the run's repetitions. CPU time varies less than
+wall time on a busy machine.
 """
 
 import json
@@ -17,7 +17,7 @@ STREAM_LIMITS = {
     "XML / pugixml DOM": [1.25, 1.25, 1.25, 1.25, 1.25, None, 0.75],
 }
 
-# column: (measured, against, the most it may be, message by message)
+# Column to (measured, against, limit for each message).
 COLUMNS = {
     "binary / protobuf arena": ("binary/unpack", "protobuf_arena", [1.15, 1.0, 0.85, 0.8, 1.1, 1.3]),
     "XML / expat events": ("xml/unpack", "expat", [0.15, 0.25, 0.25, 0.33, 0.2, 0.3]),
@@ -38,7 +38,7 @@ STREAM_COLUMNS = {
 
 
 def times(path):
-    """Benchmark name to CPU nanoseconds, one for each repetition."""
+    """Maps benchmark names to runs by repetition."""
     found = {}
     with open(path, encoding="utf-8") as file:
         for run in json.load(file)["benchmarks"]:
@@ -59,8 +59,8 @@ def human(nanoseconds):
 
 
 def rows(found, messages, columns):
-    """Prints a row of ratios for each message; how many there are over their limit, and of how
-    many."""
+    """Prints a row of ratios for each message. Returns how many exceed their limit, and how many have
+    one."""
     over = judged = 0
     print("| message | " + " | ".join(columns) + " |")
     print("|---" * (len(columns) + 1) + "|")

@@ -1,5 +1,5 @@
-// Time of unpacking each sample and each stream, and of what other parsers need for the same
-// content, in one process and one run: scripts/bench runs it and makes the table.
+// Measures unpacking each sample and each stream, and other parsers on the same content, in one
+// process and one run. scripts/bench runs it and prints the tables.
 
 #include <benchmark/benchmark.h>
 
@@ -18,7 +18,7 @@
 namespace ironmoat::bench {
 namespace {
 
-/// `once(message)` for each of the messages in turn.
+/// Calls `once(message)` for each of the messages in turn.
 template <class Message, class Function>
 void add(std::string_view name, std::string_view what, std::vector<Message> messages,
          Function once) {
@@ -61,7 +61,8 @@ void addSample(const Sample& sample) {
     addForm(sample.name, {message}, form);
     const auto addRefused = [&](const char* what, const Data& bad) {
       add(sample.name, std::string(nameOf(form)) + what, std::vector{bad}, [](const Data& refused) {
-        // What depends on the message: throwing takes the same time for each.
+        // Measures up to the error, which depends on the message; throwing it takes the same time
+        // for each.
         VeskCorvelProtocolPayload wire;
         return plist::PropertyListDecoder().decode(refused, wire).value().kind();
       });
@@ -87,7 +88,7 @@ void addStream(const Stream& stream) {
 }  // namespace ironmoat::bench
 
 int main(int argc, char** argv) {
-  // For everyone alike: large blocks are kept, not given back to the kernel after each message.
+  // For all parsers alike: malloc keeps large blocks instead of returning them after each message.
   ironmoat::sandbox::prepareMemory();
   constexpr std::size_t kStream = 2048;
   for (const auto& sample : ironmoat::bench::samples()) ironmoat::bench::addSample(sample);

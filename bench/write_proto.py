@@ -1,6 +1,6 @@
 #!/usr/bin/env python3
-"""write_proto.py TABLES.json > records.proto: one protobuf message per wire record, out of what
-dump_tables prints. The field numbers are places in the record's table, from 1."""
+"""write_proto.py TABLES.json > records.proto: prints one protobuf message for each wire record in the
+output of dump_tables. Field numbers are places in the record's table, from 1."""
 
 import json
 import sys
