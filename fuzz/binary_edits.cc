@@ -110,7 +110,7 @@ void BinaryEditor::addEntry(GraphObject& dictionary, std::uint64_t key, std::uin
   references.insert(references.begin() + static_cast<std::ptrdiff_t>(place), key);
 }
 
-/// A known key with, mostly, a value of the kind that its field holds.
+/// Adds a known key, in most cases with a value of its field's kind.
 void BinaryEditor::editEntries() {
   std::size_t which = graph_.objects.size();
   for (int tries = 0; tries < 8 && which == graph_.objects.size(); ++tries) {
@@ -187,7 +187,7 @@ void BinaryEditor::editObject() {
     case 2:
       object.lengthBytes = std::size_t{1} << below(4);
       break;
-    case 3: {  // the same text in the other encoding, or as data
+    case 3: {  // the same bytes as text of the other encoding, or as data
       constexpr std::uint8_t kMarkers[] = {0x40, 0x50, 0x60};
       object.marker = kMarkers[below(3)];
       break;
@@ -208,7 +208,7 @@ void BinaryEditor::editOrder() {
   const std::uint64_t a = someObject();
   const std::uint64_t b = someObject();
   std::swap(graph_.objects[a], graph_.objects[b]);
-  if (oneIn(8)) return;  // what was meant for one now meets the other
+  if (oneIn(8)) return;  // references meant for one message now lead into the other
   const auto follow = [&](std::uint64_t& reference) {
     reference = reference == a ? b : reference == b ? a : reference;
   };
@@ -245,7 +245,7 @@ void BinaryEditor::editTrailer() {
   }
 }
 
-/// Shared subtrees: one value in many places, doubling at each level, a long chain, a cycle.
+/// Adds shared subtrees: one value in many places, doubling at each level, a long chain, a cycle.
 void BinaryEditor::share() {
   std::uint64_t* reference = someReference();
   if (reference == nullptr) return editEntries();

@@ -9,15 +9,15 @@
 
 namespace ironmoat::fuzz {
 
-/// Random edits that keep a message close to the boundary between valid and invalid.
+/// Random edits, after most of which a message is nearly valid.
 class BinaryEditor {
  public:
-  /// `mutate` changes plain bytes.
+  /// `mutate` is the mutator for plain bytes.
   BinaryEditor(BinaryGraph& graph, unsigned seed, std::function<void(std::string&)> mutate)
       : graph_(graph), random_(seed), mutate_(std::move(mutate)) {}
 
   void edit();
-  /// Appends the objects of another message, and refers to its root.
+  /// Appends the objects of another message and adds a reference to its root.
   void adopt(const BinaryGraph& other);
 
  private:

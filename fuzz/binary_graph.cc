@@ -16,7 +16,7 @@ constexpr std::size_t kMaxObjects = 5000;
 constexpr std::size_t kHeader = plist::binary::kHeader.size();
 constexpr std::size_t kTrailer = plist::binary::kTrailerSize;
 
-/// Up to `count` bytes of `bytes` from `at`: what there is of them.
+/// At most `count` bytes of `bytes` from `at`, as many as exist.
 std::string_view piece(std::string_view bytes, std::uint64_t at, std::uint64_t count) {
   if (at >= bytes.size()) return {};
   return bytes.substr(static_cast<std::size_t>(at), static_cast<std::size_t>(count));
@@ -68,7 +68,7 @@ GraphObject parseObject(std::string_view area, std::uint64_t at, std::size_t ref
 
 BinaryGraph BinaryGraph::parse(std::string_view bytes) {
   BinaryGraph graph;
-  if (bytes.size() < kHeader + kTrailer) {  // the smallest message
+  if (bytes.size() < kHeader + kTrailer) {  // substitutes the smallest message
     graph.objects = {
         {0xD0, {}, {1, 2}, {}, 0, {}}, {0x50, "c", {}, {}, 0, {}}, {0x10, {1}, {}, {}, 0, {}}};
     return graph;

@@ -11,12 +11,12 @@ namespace ironmoat::fuzz {
 
 /// One object of a binary property list, which may be malformed.
 struct GraphObject {
-  std::uint8_t marker = 0x08;  ///< the kind in the high four bits
+  std::uint8_t marker = 0x08;  ///< kind in the high four bits
   std::string body;            ///< the bytes after marker and length, except in containers
   std::vector<std::uint64_t> references;  ///< of containers
-  std::optional<std::uint64_t> length;    ///< in units, if not the true one
-  std::size_t lengthBytes = 0;            ///< 0: the fewest; in the marker if the length fits
-  std::optional<std::size_t> sameAs;      ///< has that object's offset, and writes nothing
+  std::optional<std::uint64_t> length;    ///< to write; absent: the true one
+  std::size_t lengthBytes = 0;            ///< 0: as few as possible
+  std::optional<std::size_t> sameAs;      ///< object that it shares bytes with
 
   [[nodiscard]] unsigned kind() const { return marker >> 4U; }
   [[nodiscard]] bool isContainer() const { return kind() == 0xA || kind() == 0xC || kind() == 0xD; }
@@ -30,14 +30,14 @@ struct BinaryGraph {
   std::size_t offsetSize = 1;
   std::size_t referenceSize = 1;
   std::uint64_t root = 0;
-  // False values in the trailer and the table.
+  // False values to write into the trailer and the offset table.
   std::optional<std::uint64_t> count;
   std::optional<std::uint64_t> table;
   std::optional<std::uint8_t> saidOffsetSize;
   std::optional<std::uint8_t> saidReferenceSize;
-  std::optional<std::pair<std::size_t, std::uint64_t>> offset;  ///< of one object
+  std::optional<std::pair<std::size_t, std::uint64_t>> offset;  ///< {object, offset}
 
-  /// Makes what it can of any bytes.
+  /// Accepts any bytes, and keeps as many objects as it can read.
   static BinaryGraph parse(std::string_view bytes);
   [[nodiscard]] std::string write() const;
 };

@@ -1,5 +1,5 @@
-// The mutator of binary messages for libFuzzer. Half of the changes are to the graph of objects,
-// and half to plain bytes, which reaches messages that no writer produces.
+// libFuzzer's mutator for binary messages. Half of the mutations change the graph of objects; the
+// other half change plain bytes, which reaches messages that no writer produces.
 
 #include <algorithm>
 #include <cstdint>
@@ -25,7 +25,7 @@ std::string_view textOf(const std::uint8_t* data, std::size_t size) {
   return {reinterpret_cast<const char*>(data), size};
 }
 
-/// Or so little that it may become one.
+/// True also for input so short that it may become a binary message.
 bool isBinary(std::string_view message) {
   return message.size() < 8 || message.starts_with("bplist");
 }
@@ -36,7 +36,7 @@ void mutateBytes(std::string& bytes) {
   bytes.resize(LLVMFuzzerMutate(reinterpret_cast<std::uint8_t*>(bytes.data()), size, bytes.size()));
 }
 
-/// Writes the graph, unless it is too large.
+/// Writes the graph, or nothing if it is too large.
 std::size_t write(const BinaryGraph& graph, std::uint8_t* out, std::size_t maxSize) {
   const std::string bytes = graph.write();
   if (bytes.size() > maxSize) return 0;

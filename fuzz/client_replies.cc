@@ -1,5 +1,5 @@
-// A client's channel between requests and a service that answers, lies, dies and stalls at any
-// point: each byte is an event of ChannelGame, which checks the channel's promises. (S15)
+// Target: a client's channel. Each byte is an event of ChannelGame: a request, or a service that
+// answers, lies, dies or stalls. ChannelGame checks the channel's promises. (S15)
 
 #include <algorithm>
 #include <cstddef>

@@ -17,7 +17,7 @@
 
 namespace ironmoat::fuzz {
 
-/// The rejection of a reader, "kind: description", or nothing when it accepted the message.
+/// The rejection of a reader as "kind: description"; nothing if it accepted the message.
 template <class Read>
 std::string rejectionOf(Read read, const Data& message, plist::Document& document) {
   const std::optional<DecodingError> rejection = read(message, document);
@@ -28,14 +28,14 @@ std::string rejectionOf(Read read, const Data& message, plist::Document& documen
   return testing::inWords(*rejection);
 }
 
-/// The tree that a document stands for, walked without trust: shared nodes are counted each time,
-/// up to `most`.
+/// Walks the tree of a document and trusts no index in it. Counts a shared node each time, up to
+/// `most`.
 struct Walk {
   const plist::Document& document;
   std::size_t most;
   std::size_t nodes = 0;
   std::size_t bytes = 0;
-  bool writable = true;  ///< only kinds that are written occur
+  bool writable = true;  ///< the writers can write all kinds in the tree
 
   [[nodiscard]] bool tooLarge() const { return nodes > most || bytes > 256 * most; }
 
@@ -93,8 +93,8 @@ inline Walk walk(const plist::Document& document) {
   return walk;
 }
 
-/// Requires that the same bytes give the same outcome, and that the tree comes back equal from
-/// either format.
+/// Requires that the same bytes give the same outcome, and that the tree is equal after a round
+/// trip through either format.
 template <class Read>
 void checkReading(Read read, const Data& message) {
   plist::Document document;

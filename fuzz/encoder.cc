@@ -1,5 +1,5 @@
-// Encodes records made of the input in both formats and decodes them: each must come back equal.
-// The first byte chooses the type, the second how many fields are present. (S10)
+// Target: the encoders. A record made of the input, encoded in either format and decoded again,
+// must be equal. The first byte chooses the type, the second how many fields are present. (S10)
 
 #include "plist/encoder.h"
 
@@ -19,8 +19,8 @@ namespace {
 
 using namespace ironmoat;
 
-/// The input as a source of random numbers; all zero past its end, which makes fields absent and
-/// lists empty.
+/// The input as a source of random numbers. Past its end all are zero, which makes fields absent
+/// and lists empty.
 class InputNumbers {
  public:
   using result_type = std::uint64_t;
@@ -38,7 +38,7 @@ class InputNumbers {
   std::span<const std::uint8_t> left_;
 };
 
-/// The way to the first field in which two records differ, or nothing.
+/// The path of the first field in which two records differ, or nothing.
 template <class T>
 std::string difference(const T& a, const T& b) {
   std::string found;

@@ -1,8 +1,6 @@
-// The frame assembler and every frame's parser. The first byte chooses how the rest, one
-// connection's bytes, is split into reads.
-//
-// Oracles: how bytes arrive changes nothing, and what parses is appended again as the same bytes.
-// (S14)
+// Target: the frame assembler and the parsers of all frames. The first byte chooses how the rest,
+// the bytes of one connection, is split into reads. The split must not change the outcome, and a
+// parsed frame, written again, must be the same bytes. (S14)
 
 #include <algorithm>
 #include <cstdint>
@@ -31,7 +29,8 @@ struct Outcome {
   bool midFrame = false;
 };
 
-/// Reads sizes from a small generator seeded with `seed`; 0: as much as fits each time.
+/// Sizes of reads, from a random number generator seeded with `seed`. If it is 0, each read takes
+/// as much as fits.
 Outcome assemble(std::string_view stream, std::uint32_t seed) {
   FrameAssembler assembler(kMaxBody, Sharing::anyThread);
   Outcome outcome;
@@ -58,7 +57,7 @@ Outcome assemble(std::string_view stream, std::uint32_t seed) {
   return outcome;
 }
 
-/// What `parse` makes of `body`, if anything, `append` writes as the frame that `body` came in.
+/// Requires that `append` writes what `parse` returns, if anything, as the frame of `body`.
 template <class Parse, class Append>
 void expectSame(const Data& body, Parse parse, Append append) {
   std::optional<decltype(parse(body))> parsed;

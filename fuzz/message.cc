@@ -1,6 +1,6 @@
-// Decodes any bytes as each type of message, with the outcome and the costs of a second, slow
-// decoder. The record must survive a reply. Written in both formats, record and tree must give the
-// same outcome again. (S1, S2, S4, S9-S11)
+// Target: decoding as each type of message. The outcome and the costs must be those of a second,
+// slow decoder. The record must be equal after a round trip through a reply. Record and tree,
+// written in either format, must give the same outcome. (S1, S2, S4, S9-S11)
 
 #include <cstddef>
 #include <cstdint>
@@ -27,7 +27,7 @@ using namespace ironmoat;
 using fuzz::Outcome;
 using fuzz::require;
 
-/// What the service may spend, in the small: so that a message of a few bytes can go over it.
+/// Limits so small that a message of a few bytes can exceed them.
 constexpr plist::Budget kSmallBudget{
     .recordBytes = 100'000, .deliveredBytes = 20'000, .scannedEntries = 2'000};
 
@@ -35,7 +35,7 @@ Outcome rejected(const DecodingError& error) {
   return {false, std::string(nameOf(error.kind())) + " " + error.path() + ": " + error.what()};
 }
 
-/// The reply's body, or the rejection in words.
+/// The body of the reply, or the rejection as text.
 template <class Unpacker>
 Outcome unpack(const Data& message) {
   try {
@@ -49,7 +49,7 @@ Outcome unpack(const Data& message) {
   }
 }
 
-/// The record in the slow decoder's words, or the rejection; `left` is what the budget still has.
+/// The slow decoder's record as text, or its rejection; sets `left` to the rest of the budget.
 template <class Wire>
 Outcome decode(const plist::Document& document, plist::Budget& left) {
   plist::Decoding decoding{.document = document, .budget = left};
@@ -76,7 +76,7 @@ void unpackAs(const Data& message, const plist::Document& document) {
   require(left.recordBytes <= kSmallBudget.recordBytes &&
           left.deliveredBytes <= kSmallBudget.deliveredBytes &&
           left.scannedEntries <= kSmallBudget.scannedEntries);
-  // Over the small budget: the whole one costs much time, and a few messages show enough.
+  // The message exceeds the small budget. The full one takes much time, so few messages get it.
   const bool costly = decoded.text.starts_with("limitExceeded");
   if (costly && std::hash<std::string_view>()(message.view()) % 64 != 0) return;
 
@@ -90,7 +90,7 @@ void unpackAs(const Data& message, const plist::Document& document) {
     require(std::string_view(carried.bytes(), carried.size()) == first.text);
   }
   const fuzz::Walk walked = fuzz::walk(document);
-  if (walked.tooLarge()) return;  // shared values written out take the fun out of fuzzing
+  if (walked.tooLarge()) return;  // writing out many shared values would slow fuzzing down
 
   const auto check = [&](auto write, plist::Format form) {
     try {

@@ -1,6 +1,6 @@
-// Replays a corpus without libFuzzer: each file named on the command line, or below a folder named
-// there, goes to the fuzz target. So do some changes of it by the target's mutator, if it has one,
-// and after --damaged each beginning of a short file and the file with each bit flipped.
+// Replays a corpus without libFuzzer. Passes each file, or each file below a folder, of the command
+// line to the fuzz target, with some mutations of it if the target has a mutator. After --damaged,
+// passes also each prefix of a short file, and the file with each single bit flipped.
 
 #include <cstdint>
 #include <cstdio>
@@ -19,7 +19,7 @@ extern "C" __attribute__((weak)) std::size_t LLVMFuzzerCustomMutator(std::uint8_
                                                                      std::size_t maxSize,
                                                                      unsigned seed);
 
-/// libFuzzer's, when it is there, knows more.
+/// Stands in for libFuzzer's function, which has more kinds of mutations.
 extern "C" std::size_t LLVMFuzzerMutate(std::uint8_t* data, std::size_t size, std::size_t) {
   if (size != 0) data[size / 2] ^= 0x11;
   return size;
@@ -30,7 +30,7 @@ namespace {
 using Bytes = std::vector<std::uint8_t>;
 
 void run(std::span<const std::uint8_t> bytes) {
-  // Exactly as large as the input, so that a sanitizer sees the first byte read past it.
+  // The block has exactly the size of the input, so that a sanitizer notices a read past it.
   const auto exact = std::make_unique<std::uint8_t[]>(bytes.size());
   std::copy(bytes.begin(), bytes.end(), exact.get());
   LLVMFuzzerTestOneInput(exact.get(), bytes.size());

@@ -1,7 +1,5 @@
-// Decoding a reply's record. The first byte chooses the record's type, the rest is the encoded
-// record.
-//
-// Oracle: what decodes is encoded as the same bytes. (S14)
+// Target: decoding the record of a reply. The first byte chooses the record's type, the rest is the
+// encoded record. A decoded record must be encoded as the same bytes. (S14)
 
 #include <cstdint>
 #include <cstdlib>

@@ -4,7 +4,7 @@
 
 namespace ironmoat::fuzz {
 
-/// What always holds; libFuzzer shows where it did not.
+/// Aborts if `holds` is false, so that libFuzzer reports the input.
 inline void require(bool holds) {
   if (!holds) std::abort();
 }

@@ -11,13 +11,13 @@
 #include "plist/document.h"
 #include "support/wire_fields.h"
 
-/// Decoding once more, in the plainest way: each field looks its key up by itself and is written
-/// down as text. No container, no index, no record is involved.
+/// A second decoder, for comparison, as plain as possible: it looks up each field's key separately
+/// and appends the value to a text. It shares no container, index or record with the first one.
 namespace ironmoat {
 
 namespace fuzz {
 
-/// A record as text, or why there is none: "kind path: description".
+/// A record as text, or its rejection as "kind path: description".
 struct Outcome {
   bool accepted = false;
   std::string text;
@@ -53,7 +53,7 @@ void describe(std::string& out, const Optional& value) {
     describe(out, *value);
   }
 }
-/// A record that was decoded, in the words of SlowDecoder.
+/// Writes a decoded record as SlowDecoder does.
 template <class R>
 requires requires { typename R::CodingKeys; }
 void describe(std::string& out, const R& record) {
@@ -106,7 +106,7 @@ class SlowDecoder {
     left -= amount;
   }
 
-  /// One more than the place of the last entry under `key`, or 0.
+  /// The index of the last entry under `key`, plus 1; 0 if there is none.
   std::uint32_t lastEntry(const plist::Node& node, std::string_view key) {
     std::uint32_t entry = node.count;
     while (entry > 0 && document_.text(document_.node(document_.keys(node)[entry - 1])) != key) {

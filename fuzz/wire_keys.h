@@ -13,7 +13,7 @@ struct WireKey {
   Holds holds;
 };
 
-/// The keys of all records, straight from their tables; one that several records have, once each.
+/// The distinct keys of all records, from their tables.
 std::span<const WireKey> wireKeys();
 
 }  // namespace ironmoat::fuzz

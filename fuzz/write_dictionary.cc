@@ -1,5 +1,5 @@
-// Prints the words of a format for libFuzzer: `write_dictionary binary` or `xml`. Wire keys come
-// from the records' tables.
+// write_dictionary binary|xml: prints libFuzzer's dictionary for the format, with the wire keys of
+// the records' tables.
 
 #include <cstdio>
 #include <set>

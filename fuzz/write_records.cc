@@ -1,8 +1,6 @@
-// Writes generated records of the three types of message in both formats, for other readers:
-//
-//     write_records FOLDER
-//
-// A file is KIND-NUMBER.FORMAT. Two large payloads make offsets and references wide.
+// write_records FOLDER: writes generated records of all types in both formats, as
+// KIND-NUMBER.FORMAT, to test other readers. Two payloads are large enough for wide offsets and
+// references.
 
 #include <cstdint>
 #include <cstdlib>

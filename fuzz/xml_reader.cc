@@ -1,5 +1,5 @@
-// Reads any bytes as XML. The same bytes must give the same tree or rejection every time,
-// indices must be in bounds, and the tree must come back equal from both formats. (S1, S2, S8-S10)
+// Target: the reader of XML. The same bytes must give the same tree or rejection, indices must be
+// in bounds, and the tree must be equal after a round trip through either format. (S1, S2, S8-S10)
 
 #include <cstddef>
 #include <cstdint>
