@@ -1,15 +1,15 @@
 # shellcheck shell=bash
-# Sourced by the other scripts: what they need on the machine and how they talk.
+# Sourced by the other scripts: installs packages, builds, and keeps commands quiet.
 
 root=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
 
-# Debian packages: to build and test, and what the checks of .ci/run need besides.
+# Debian packages to build and test, and those that only the checks of .ci/run need.
 packages=(cmake g++ libgtest-dev libseccomp-dev ninja-build pkg-config python3)
-# shellcheck disable=SC2034 # used by those who source this
+# shellcheck disable=SC2034 # used by the scripts that source this file
 check_packages=("${packages[@]}" clang clang-format clang-tidy doxygen dpkg-dev file golang-go
   libclang-rt-dev libsystemd-dev mandoc rustc systemd valgrind)
 
-# Runs a command that has nothing to say unless it fails.
+# Runs a command, and prints its output only if it fails.
 quietly() {
   local log
   log=$(mktemp)
@@ -22,10 +22,10 @@ quietly() {
   rm -f "$log"
 }
 
-# Installs those of the packages that are missing, or says which they are to who may not.
+# Installs the missing packages if root runs it, and otherwise prints the command that does.
 require_packages() {
   local package missing=()
-  command -v dpkg-query >/dev/null || return 0 # not Debian: the build says what it lacks
+  command -v dpkg-query >/dev/null || return 0 # not Debian: the build reports missing packages
   for package in "$@"; do
     [[ $(dpkg-query -W -f '${db:Status-Status}' "$package" 2>/dev/null) == installed* ]] ||
       missing+=("$package")

@@ -1,8 +1,6 @@
-"""The files in this tree that are made from the records' tables.
+"""generated_files.py DUMP_TABLES [--check]: generates files of this tree from the records' tables.
 
-    generated_files.py DUMP_TABLES [--check]
-
-writes them, or with --check fails when one of them is not as it would be written.
+Prints the names of files that change. With --check, changes nothing and fails if a file would change.
 """
 
 import json
@@ -27,7 +25,7 @@ def vector_files(model):
 
 
 def main():
-    sys.setrecursionlimit(10_000)  # for what is nested too deep
+    sys.setrecursionlimit(10_000)  # for messages that are nested too deep
     model = Model(sys.argv[1])
     page = Page(model.tables)
     wanted = dict(vector_files(model)) | {

@@ -1,7 +1,7 @@
-"""The rules by which a message becomes a record or is refused, told a second time.
+"""A second implementation of the rules by which a message becomes a record or is rejected.
 
-Knows no field: works on the tables that dump_tables prints, and on messages as plistlib reads them
-(dict, list, str, bytes, bool, int of any size; whatever else is a value that fits no field).
+Takes the fields from the tables that dump_tables prints, and messages as plistlib reads them (dict,
+list, str, bytes, bool, int of any size; other types are values that fit no field).
 """
 
 import base64
@@ -20,12 +20,12 @@ RECORDS = {
 
 
 class BinaryWriter(plistlib._BinaryPlistWriter):
-    """plistlib's own stops at 2**64."""
+    """plistlib's writer, extended to integers beyond 2**64."""
 
     def _write_object(self, value):
         try:
             super()._write_object(value)
-        except OverflowError:  # nothing but the object's offset was written
+        except OverflowError:  # only the object's offset has been written
             self._fp.write(b"\x14" + value.to_bytes(16, "big", signed=True))
 
 
@@ -63,14 +63,14 @@ class Model:
                           for record in self.tables["outputRecords"]}
 
     def outcome(self, kind, message):
-        """What comes of a message: {"record": ...} or {"error": {"kind": ..., "path": ...}}."""
+        """The outcome of a message: {"record": ...} or {"error": {"kind": ..., "path": ...}}."""
         try:
             return {"record": self.record(*RECORDS[kind], message, "")}
         except Refusal as refusal:
             return {"error": dict(zip(("kind", "path"), refusal.args))}
 
     def record(self, wire, output, value, path):
-        """The n-th argument shows the n-th field, under the field's name."""
+        """The output record: the n-th argument has the n-th field's value and name."""
         if not isinstance(value, dict):
             raise Refusal("typeMismatch", path)
         fields, arguments = self.fields[wire], self.arguments[output]
@@ -84,7 +84,7 @@ class Model:
                 shown[name] = self.value(field["type"], argument["type"], value[key], way)
             elif not field["optional"]:
                 raise Refusal("keyNotFound", way)
-            elif not argument["optional"]:  # a list that is always there
+            elif not argument["optional"]:  # a list that is never absent
                 shown[name] = []
         return shown
 
@@ -109,7 +109,7 @@ class Model:
 
 
 def shown(line):
-    """A line of vesk-unpack as an outcome."""
+    """The outcome in a line of vesk-unpack."""
     if "error" not in line:
         return {"record": line["record"]}
     if not line["error"]["message"]:

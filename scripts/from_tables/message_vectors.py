@@ -1,4 +1,4 @@
-"""The messages of tests/vectors/, and what comes of them: few, and the same each time."""
+"""The messages of tests/vectors/ and their outcomes. Each run generates the same ones."""
 
 import functools
 import json
@@ -9,7 +9,7 @@ import re
 from message_model import KINDS, LIST_OF, RECORDS, binary, xml
 
 ROOT = pathlib.Path(__file__).resolve().parents[2]
-AT = "^"  # in a malformed message: where it is refused
+AT = "^"  # marks the offset of the error in a malformed message
 
 
 class Vectors:
@@ -34,7 +34,7 @@ class Vectors:
                         for content in files.values()}
             self.entries.append(("an example", kind, files, json.loads(outcome)))
 
-    # Messages that plistlib writes in both forms.
+    # Messages that plistlib writes in both formats.
 
     def add(self, kind, name, about, message, forms=(".bplist", ".plist")):
         write = {".bplist": binary, ".plist": plain_xml}
@@ -58,7 +58,7 @@ class Vectors:
         return message
 
     def some(self, record, field, place):
-        """A value that tells the field from its neighbours."""
+        """A value that differs from those of neighbouring fields."""
         kind = field["type"]
         if kind.startswith(LIST_OF):
             kind = kind[len(LIST_OF):]
@@ -111,7 +111,7 @@ class Vectors:
             self.entries.append((about, "command-response", {
                 f"command-response/{name}.plist": encoded}, {"record": record}))
 
-    # Refused messages.
+    # Rejected messages.
 
     def wrong_kinds(self):
         """A wrong value for the first field of each type."""
@@ -187,8 +187,8 @@ class Vectors:
         self.refuse("no-utf-8.plist", "bytes that are no text", content, content.index(b"\xc3"))
 
     def malformed_binary(self):
-        """Bytes of one good message, changed. Its objects: at 8 the dictionary with two keys and two
-        values, at 13 the key, at 15 the other one, at 17 the integer, at 19 the list of it."""
+        """A good message with changed bytes. Its objects: at 8 a dictionary with two keys and two
+        values, at 13 and 15 the keys, at 17 an integer, at 19 a list of that integer."""
         good = binary({"c": 96, "l": [96]})
         assert good[8:21] == b"\xd2\1\2\3\4\x51c\x51l\x10\x60\xa1\3", good
         trailer = len(good) - 32
