@@ -6,7 +6,7 @@
 
 namespace ironmoat::inspect {
 
-// A value or name follows another one unless it comes first in its brackets or behind a name.
+// Appends a comma, unless the value or name is the first in its brackets or follows a name.
 void JsonWriter::separate() {
   static constexpr std::string_view kNoComma = "{[ \n";
   if (!out_.empty() && kNoComma.find(out_.back()) == kNoComma.npos) out_ += ", ";

@@ -15,26 +15,26 @@ namespace ironmoat::inspect {
 /// Whether integers become JSON numbers or strings.
 enum class Integers : std::uint8_t { numbers, strings };
 
-/// Appends JSON to a string, with commas where they belong. Output never contains a character that
-/// ends a line or controls a terminal; bytes that are not UTF-8 become U+FFFD.
+/// Appends JSON to a string, with commas as needed. Escapes characters that end a line or control a
+/// terminal, and replaces bytes that are not UTF-8 by U+FFFD.
 class JsonWriter {
  public:
-  /// `out` must outlive the writer. Several writers may take turns on it.
+  /// `out` must outlive the writer. Several writers may append to it in turns.
   explicit JsonWriter(std::string& out, Integers integers = Integers::numbers)
       : out_(out), integers_(integers) {}
 
-  /// `bracket`: one of `{ [`
+  /// `bracket` is `{` or `[`.
   JsonWriter& open(char bracket) {
     separate();
     out_ += bracket;
     return *this;
   }
-  /// `bracket`: one of `} ]`
+  /// `bracket` is `}` or `]`.
   JsonWriter& close(char bracket) {
     out_ += bracket;
     return *this;
   }
-  /// Names the value that comes next.
+  /// Appends the name of the next value.
   JsonWriter& name(std::string_view name) {
     text(name);
     out_ += ": ";
@@ -45,7 +45,7 @@ class JsonWriter {
     return this->name(name).value(value);
   }
 
-  /// A record is an object of its present fields; bytes are in base64.
+  /// Writes a record as an object of its present fields, and bytes in base64.
   template <class T>
   JsonWriter& value(const T& value) {
     if constexpr (std::same_as<T, bool>) {

@@ -21,9 +21,8 @@ namespace {
 
 namespace fs = std::filesystem;
 
-/// Reads `file` into `buffer`, which it only makes longer, up to one byte more than `limit`;
-/// returns the number of bytes. Asks for at most twice what came, so that a small file costs a
-/// small buffer.
+/// Reads at most `limit` + 1 bytes of `file` into `buffer` and returns their number. Doubles the
+/// buffer as needed, so that a small file needs only a small one, and never shrinks it.
 std::size_t readInto(std::string& buffer, const std::string& file, std::size_t limit) {
   constexpr std::size_t kFirstRead = std::size_t{64} << 10;
   process::FileDescriptor opened;
@@ -57,8 +56,8 @@ void addListed(std::vector<std::string>& files, const std::string& list) {
   }
 }
 
-/// Appends the files in `folder`. Symbolic links are left out, so that whoever fills the folder
-/// cannot point at files elsewhere; so are FIFOs and devices, which might block.
+/// Appends the regular files in `folder`. Omits symbolic links, which could lead to files
+/// elsewhere, and FIFOs and devices, which could block.
 void addFolder(std::vector<std::string>& files, const fs::path& folder) {
   std::vector<std::string> found;
   for (std::vector<fs::path> folders = {folder}; !folders.empty();) {

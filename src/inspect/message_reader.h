@@ -9,21 +9,21 @@
 
 namespace ironmoat::inspect {
 
-/// Reads messages. Keeps its buffer from one to the next; not thread-safe.
+/// Reads messages into one buffer, which it reuses. Not thread-safe.
 class MessageReader {
  public:
   /// The bytes of `file`, or of standard input for `-`. Throws std::system_error if it cannot be
-  /// read, and DecodingError `limitExceeded` as soon as it proves longer than a message may be.
+  /// read, and DecodingError `limitExceeded` if it is longer than limits::messageBytes.
   Data read(const std::string& file);
 
  private:
   std::string buffer_;
 };
 
-/// The files that `options` name, in order: folders are replaced by the regular files in them and
-/// in their folders, sorted by path, if it asks for that. A folder that cannot be listed stays, so
-/// that reading it fails. Throws std::system_error if the list of files cannot be read, UsageError
-/// if standard input would be read twice.
+/// The files that `options` name, in order. With `--recursive`, replaces each folder by the regular
+/// files below it, sorted by path, but keeps a folder that it cannot list, so that reading it
+/// fails. Throws std::system_error if it cannot read the list of files, UsageError if standard
+/// input would be read twice.
 std::vector<std::string> filesOf(const Options& options);
 
 }  // namespace ironmoat::inspect

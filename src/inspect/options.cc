@@ -45,7 +45,7 @@ using Value = std::string_view;
 
 struct KnownOption {
   const char* name;
-  char letter;  // or 0
+  char letter;  // 0: none
   bool hasValue;
   void (*set)(Options&, Value);
 };
@@ -65,7 +65,7 @@ constexpr KnownOption kKnown[] = {
     {"help", 'h', false, [](Options& o, Value) { o.action = Action::showHelp; }},
     {"version", 0, false, [](Options& o, Value) { o.action = Action::showVersion; }},
 };
-constexpr int kFirstCode = 256;  // getopt's of the first row; above all letters
+constexpr int kFirstCode = 256;  // getopt's code of the first row; above all letters
 
 void checkFiles(Options& options) {
   const bool none = options.files.empty() && options.filesFrom.empty();
@@ -77,7 +77,8 @@ void checkFiles(Options& options) {
   }
 }
 
-/// Sets what getopt has found; `code` is its result, `last` the argument that it took last.
+/// Sets the option that getopt has found. `code` is getopt's result, `last` the last argument that
+/// it consumed.
 void take(Options& options, int code, const char* last) {
   const Value value = ::optarg == nullptr ? "" : ::optarg;
   const int subject = code == '?' || code == ':' ? ::optopt : code;
@@ -103,14 +104,14 @@ void take(Options& options, int code, const char* last) {
 
 Options parseOptions(std::span<const char* const> arguments) {
   std::vector<option> known;
-  std::string letters = "-:";  // files in their order, a code of its own for missing values
+  std::string letters = "-:";  // `-`: return files in order; `:`: return ':' for missing values
   for (const KnownOption& row : kKnown) {
     const int code = kFirstCode + static_cast<int>(known.size());
     known.push_back({row.name, row.hasValue ? required_argument : no_argument, nullptr, code});
     if (row.letter != 0) letters += row.letter;
   }
   known.push_back({});
-  std::vector<char*> argv = {const_cast<char*>("")};  // getopt_long() writes to none of them
+  std::vector<char*> argv = {const_cast<char*>("")};  // getopt_long() does not write to them
   for (const char* argument : arguments) argv.push_back(const_cast<char*>(argument));
   argv.push_back(nullptr);
   const int count = static_cast<int>(argv.size()) - 1;
@@ -119,7 +120,7 @@ Options parseOptions(std::span<const char* const> arguments) {
   };
   Options options;
   ::opterr = 0;
-  ::optind = 0;  // how glibc starts anew
+  ::optind = 0;  // resets glibc's getopt
   for (int code = getopt(); code >= 0; code = getopt()) {
     take(options, code, argv[static_cast<std::size_t>(::optind) - 1]);
     if (options.action == Action::showHelp || options.action == Action::showVersion) return options;

@@ -17,20 +17,20 @@ enum class Action : std::uint8_t { unpack, showSchema, selfTest, showHelp, showV
 enum class Output : std::uint8_t { each, summary, nothing };
 
 inline constexpr std::string_view kStandardInput = "-";
-/// In place of a type's name: all types are tried.
+/// The name that stands for trying all types.
 inline constexpr std::string_view kAutoType = "auto";
 
 struct Options {
   Action action = Action::unpack;
   std::string type = "payload";
   bool typeGiven = false;
-  std::string schema;  ///< name of the type to show
+  std::string schema;  ///< type to show; empty: none
   Format format = Format::text;
   Integers integers = Integers::numbers;  ///< in JSON
   Output output = Output::each;
   std::string service;  ///< empty: serviceProgram()
   bool recursive = false;
-  std::string filesFrom;           ///< a list of further files; may be `-`; empty: none
+  std::string filesFrom;           ///< file with a list of further files; may be `-`; empty: none
   std::vector<std::string> files;  ///< `-` for standard input if the command line names none
 };
 
@@ -40,8 +40,8 @@ class UsageError : public std::runtime_error {
   using std::runtime_error::runtime_error;
 };
 
-/// `arguments` without the program's name. Options may stand between files. Throws UsageError.
-/// Not thread-safe.
+/// Parses `arguments`, which lack the program's name. Options may stand between files. Throws
+/// UsageError. Not thread-safe.
 Options parseOptions(std::span<const char* const> arguments);
 
 std::string_view helpText() noexcept;

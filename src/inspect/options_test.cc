@@ -8,7 +8,7 @@
 namespace ironmoat::inspect {
 namespace {
 
-/// All options that differ from the default, or the error.
+/// The options that differ from the default, or the error.
 std::string parsed(const std::vector<const char*>& arguments) {
   try {
     const Options options = parseOptions(arguments);

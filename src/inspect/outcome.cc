@@ -8,7 +8,7 @@ namespace ironmoat::inspect {
 
 namespace {
 
-/// Numbers, texts and so on in a record and in those in it: how much of the message it got.
+/// Counts the values in a record and in its nested records.
 template <class T>
 std::size_t valuesIn(const T& value) {
   std::size_t values = 0;

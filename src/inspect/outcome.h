@@ -19,13 +19,13 @@ enum ExitStatus : int {
   cannotWork = 2,    ///< wrong usage, unreadable file, no service, output not writable
 };
 
-/// Why there is no record. `path` and `description` are untrusted: a service that a sender has
-/// taken over can make them up.
+/// The reason why there is no record. `path` and `description` are untrusted, because a compromised
+/// service can forge them.
 struct Failure {
   std::string_view kind;
   std::string path;
   std::string description;
-  std::optional<std::uint64_t> offset;  ///< into the message, which may be shorter
+  std::optional<std::uint64_t> offset;  ///< in the message; untrusted, may exceed its size
   ExitStatus status;
 
   friend bool operator==(const Failure&, const Failure&) = default;
@@ -44,7 +44,7 @@ struct Outcome {
   std::optional<AnyRecord> record;
   std::vector<std::string_view> types;  ///< of the record, then those that fit equally well
   std::optional<Failure> failure;
-  std::vector<Rejection> rejections;  ///< if types rejected it for different reasons: all
+  std::vector<Rejection> rejections;  ///< of all types, if their reasons differ
 
   [[nodiscard]] ExitStatus status() const { return failure ? failure->status : allUnpacked; }
 };
@@ -54,9 +54,9 @@ struct Attempt {
   Types::Pending record;
 };
 
-/// Waits for all `attempts`, of which there is at least one. Of several records it takes the one
-/// with the most values, of equals the first. If the service failed on one attempt, so did the
-/// message, whatever became of the others.
+/// Waits for all `attempts`; requires at least one. Returns the record with the most values, the
+/// first of equals. If the service failed on an attempt, returns that failure, also if others
+/// succeeded.
 Outcome outcomeOf(std::vector<Attempt>& attempts);
 
 }  // namespace ironmoat::inspect

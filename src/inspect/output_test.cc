@@ -11,7 +11,7 @@
 
 namespace ironmoat::inspect {
 
-// Fields of all types that records have.
+// A record with fields of all types.
 
 template <class A>
 struct RecordOf : A {
@@ -194,7 +194,7 @@ TEST(Position, IsLineAndColumnOrByteAndShowsBytesThere) {
        "line 2, column 2\n  \xF0\x9F\x98\x80<>\n    ^\n"},
       {"\xFE\xFF\0<"sv, 0, "line 1, column 1\n  <\n  ^\n"},
       {"\xFE\xFF\0\x80\0x"sv, 4, "line 1, column 2\n  \\u{80}x\n        ^\n"},
-      // Halves of surrogate pairs, and of a unit.
+      // Halves of surrogate pairs, and half a UTF-16 unit.
       {"\xFE\xFF\xDC\0\xDC\0"sv, 6,
        "line 1, column 3, the end\n  \xEF\xBF\xBD\xEF\xBF\xBD\n    ^\n"},
       {"\xFE\xFF\xD8\0\xD8\0"sv, 4, "line 1, column 2\n  \xEF\xBF\xBD\xEF\xBF\xBD\n   ^\n"},
@@ -215,7 +215,7 @@ TEST(Position, ShowsPartOfLineThatFitsWhenLineIsLong) {
   EXPECT_EQ(position(fits, 3, 33), start + "/a>\n     ^\n");
   EXPECT_EQ(position(fits + "d", 3, 33), start + "...\n     ^\n");
   std::string marks = "a";
-  for (int i = 0; i < 3000; ++i) marks += "\xCC\x81";  // takes no column
+  for (int i = 0; i < 3000; ++i) marks += "\xCC\x81";  // combining marks take no column
   for (const std::string& wide : {marks, std::string(3000, '\xF0'), std::string(3000, '\x80')}) {
     EXPECT_LT(position(wide, 2001).size(), 600U);
   }

@@ -13,12 +13,12 @@ const std::string kCut = "...";
 bool isContinuation(char c) { return (c & 0xC0) == 0x80; }
 bool isLineEnd(char c) { return c == '\n' || c == '\r'; }
 
-/// A message in UTF-8, without its byte-order mark; any bytes may be wrong.
+/// A message as UTF-8, without its byte-order mark. Bytes may be invalid.
 struct Text {
-  std::string converted;  // from UTF-16: up to some characters behind `mark`
+  std::string converted;  // from UTF-16, up to some characters after `mark`
   std::string_view utf8;
-  std::size_t mark = 0;       // what the offset is in `utf8`
-  std::size_t lineStart = 0;  // of the mark's line
+  std::size_t mark = 0;       // the offset in `utf8`
+  std::size_t lineStart = 0;  // start of the line of `mark`
   TextPosition position{1, 1};
 
   Text(const Data& message, std::size_t offset) : utf8(message.view()), mark(offset) {
@@ -66,7 +66,7 @@ struct Text {
   static constexpr char32_t kReplacement = 0xFFFD;
 };
 
-/// Columns for the lines that show bytes, which are indented by two more than the position.
+/// Columns for the lines that show bytes. These are indented by two more than the position.
 std::size_t roomFor(const Style& style, std::size_t indent) {
   constexpr std::size_t kUsual = 80;
   constexpr std::size_t kMin = 20;
@@ -89,10 +89,10 @@ std::string shown(std::string_view character) {
   return out;
 }
 
-/// Appends the mark's line from its first visible character on, cut to the room that there is.
+/// Appends the line of the mark, without leading spaces, cut to the width of the screen.
 void appendLine(std::string& out, const Text& text, const Style& style, std::size_t indent) {
   const std::size_t room = roomFor(style, indent);
-  const std::size_t maxBytes = 4 * room;  // of characters that may take no columns
+  const std::size_t maxBytes = 4 * room;  // bound, because characters can take no columns
   std::size_t columns = 0;
   std::size_t start = text.mark;
   std::string line;
@@ -113,7 +113,7 @@ void appendLine(std::string& out, const Text& text, const Style& style, std::siz
     line.erase(0, line.find_first_not_of(' '));
   }
   const std::size_t before = columns = columnsOf(line);
-  std::size_t cutAt = line.size();  // where the mark of a cut still fits
+  std::size_t cutAt = line.size();  // end of the last character after which kCut fits
   for (std::size_t end = text.mark; end < text.utf8.size() && !isLineEnd(text.utf8[end]);) {
     const std::size_t length = firstCodePoint(text.utf8.substr(end)).length;
     const std::string character = shown(text.utf8.substr(end, length));

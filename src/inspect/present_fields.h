@@ -7,7 +7,7 @@
 namespace ironmoat::inspect {
 
 /// Calls `visit(name, value)` for each field that is present, in the order of the initialiser's
-/// arguments. The first field, whose label is `with`, goes by its own name like the others.
+/// arguments. The name of the first field is its own, not its label `with`.
 template <Record R, class Visit>
 void forEachPresentField(const R& record, const Visit& visit) {
   R::Arguments::Fields::forEach([&](auto field) {

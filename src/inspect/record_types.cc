@@ -33,7 +33,7 @@ constexpr std::string_view typeName() {
   if constexpr (Record<T>) return WireTable<T>::name;
 }
 
-/// Appends the record `R` and those in it, each once.
+/// Appends the schemas of the record `R` and of its nested records, each once.
 template <Record R>
 void collectSchemas(std::vector<RecordSchema>& records) {
   for (const RecordSchema& known : records) {
@@ -54,7 +54,7 @@ void collectSchemas(std::vector<RecordSchema>& records) {
   });
 }
 
-/// The schemas of the record `R` and of those in it.
+/// The schemas of the record `R` and of its nested records.
 template <Record R>
 std::vector<RecordSchema> schemasOf() {
   std::vector<RecordSchema> records;

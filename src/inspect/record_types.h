@@ -23,9 +23,9 @@ using Types = TypesOf<VeskCommandResponse, VeskCommandWebTunnelResponse, DrelUse
 using AnyRecord = Types::Record;
 
 struct RecordType {
-  std::string_view name;  ///< as after `--type`
+  std::string_view name;  ///< value of `--type`
   Types::Pending (*submit)(Client& client, const Data& message);
-  std::vector<RecordSchema> (*schemas)();  ///< of the record, then of those in it
+  std::vector<RecordSchema> (*schemas)();  ///< of the record, then of its nested records
 };
 
 /// All types that messages can have. Of types that fit a message equally well, `--type auto`

@@ -19,7 +19,7 @@ class Report {
   Report& operator=(const Report&) = delete;
   virtual ~Report() = default;
 
-  /// `message` is what was read of the file; empty if it could not be read.
+  /// `message` is the content of the file; empty if it could not be read.
   virtual void add(const std::string& file, const Data& message, const Outcome& outcome) = 0;
   virtual void finish() {}
 };

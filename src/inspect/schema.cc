@@ -8,7 +8,7 @@ namespace ironmoat::inspect {
 
 namespace {
 
-/// The few longer keys do not widen their column.
+/// Longer keys are few and do not widen the column.
 constexpr std::size_t kMaxKeyColumns = 12;
 
 std::string padded(std::string_view text, std::size_t width) {

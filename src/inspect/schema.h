@@ -14,7 +14,7 @@ struct FieldSchema {
   std::string_view name;  ///< in the record, and in this tool's output
   std::string_view type;  ///< Int, Int64, Bool, String, Data, or a record's name
   bool list;
-  bool required;  ///< the service rejects messages without it
+  bool required;  ///< if true, the service rejects messages without it
 };
 
 struct RecordSchema {

@@ -33,7 +33,7 @@ constexpr int kHelloTimeout = 2000;     // milliseconds
 constexpr unsigned kActionTimeout = 5;  // seconds
 constexpr int kNoSandbox = 255;         // exit status of a child; not an errno
 
-/// A system call: returns a negative number and sets errno if it fails.
+/// Makes a system call. Returns a negative number and sets errno if it fails.
 using Action = long (*)();
 
 constexpr std::string_view kKilled = "killed by SIGSYS";
@@ -95,7 +95,7 @@ std::string resultOf(Action perform) {
   if (child < 0) return "not tried: cannot start a child";
   if (child == 0) {
     ::alarm(kActionTimeout);
-    ::dup2(::open("/dev/null", O_WRONLY), STDERR_FILENO);  // the filter's own line
+    ::dup2(::open("/dev/null", O_WRONLY), STDERR_FILENO);  // discards the filter's line
     try {
       sandbox::enter();
     } catch (const sandbox::Unavailable&) {

@@ -4,9 +4,9 @@
 
 namespace ironmoat::inspect {
 
-/// The service that came with this tool: beside it as in a build tree, or where both are installed;
+/// The path of the service beside this tool, as in a build tree, or of the same installation;
 /// otherwise the client library's default. Throws std::runtime_error if other users can replace the
-/// program that it finds.
+/// program.
 std::string serviceProgram();
 
 }  // namespace ironmoat::inspect

@@ -8,7 +8,7 @@ namespace ironmoat::inspect {
 
 namespace {
 
-/// Numbers of messages by their outcomes, and how fast they came.
+/// Counts messages by outcome, and measures their rate.
 class Summary : public Report {
  public:
   Summary(const Options& options, Terminal& terminal) : options_(options), terminal_(terminal) {}

@@ -16,7 +16,7 @@ constexpr std::chrono::milliseconds kProgressDelay{300};
 constexpr std::chrono::milliseconds kProgressInterval{100};
 
 std::string_view environment(const char* name) noexcept {
-  const char* value = std::getenv(name);  // NOLINT(concurrency-mt-unsafe): nobody sets any
+  const char* value = std::getenv(name);  // NOLINT(concurrency-mt-unsafe): no code sets variables
   return value == nullptr ? "" : value;
 }
 

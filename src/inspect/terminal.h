@@ -8,13 +8,12 @@
 
 namespace ironmoat::inspect {
 
-/// Standard output and standard error of the tool, in step: what comes first shows first on a
-/// terminal.
+/// Standard output and standard error of the tool. Keeps their order on a terminal.
 class Terminal {
  public:
   Terminal();
 
-  /// For what goes to standard output, or to standard error: colours and width if it is a terminal.
+  /// The style of standard output or standard error: has colours and a width if it is a terminal.
   [[nodiscard]] Style outputStyle() const noexcept;
   [[nodiscard]] Style errorStyle() const noexcept;
 
@@ -23,7 +22,7 @@ class Terminal {
   void print(std::string_view text);
   /// Writes to standard error at once.
   void printError(std::string_view text) noexcept;
-  /// Shows how many messages are done if standard error is a terminal and the work takes a while.
+  /// Shows the number of finished messages if standard error is a terminal and the work takes long.
   void showProgress(std::size_t done, std::size_t total);
   /// Erases the progress line and writes what is buffered. Throws like print().
   void finish();
@@ -35,7 +34,7 @@ class Terminal {
 
   const bool outputIsTerminal_;
   const bool errorIsTerminal_;
-  int outputError_ = 0;  // of standard output, if printError() met one
+  int outputError_ = 0;  // errno of standard output, if printError() could not flush it; 0: none
   bool progressShown_ = false;
   Clock::time_point nextProgress_;
 };

@@ -15,10 +15,10 @@ struct Range {
   char32_t last;
 };
 
-// Controls apart.
+// Ranges besides the controls.
 constexpr Range kInvisible[] = {
     {0x00AD, 0x00AD},    // soft hyphen
-    {0x061C, 0x061C},    // reading direction, also below
+    {0x061C, 0x061C},    // reading direction, like U+200E to U+202E
     {0x180E, 0x180E},    // vowel separator
     {0x200B, 0x200B},    // zero-width space; its joining neighbours belong to visible text
     {0x200E, 0x200F},    //
@@ -40,7 +40,7 @@ bool isIn(const Range (&ranges)[N], char32_t value) noexcept {
                      [value](Range range) { return value >= range.first && value <= range.last; });
 }
 
-/// What is written in one piece: a colour or a character. Bytes, and columns.
+/// A colour or a character, which must not be split: its bytes and columns.
 struct Unit {
   std::size_t length;
   std::size_t columns;

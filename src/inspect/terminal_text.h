@@ -6,7 +6,7 @@
 
 namespace ironmoat::inspect {
 
-/// Terminal sequences that set off parts of the output; all empty where there is no terminal.
+/// Terminal sequences for parts of the output; all empty without a terminal.
 struct Colours {
   std::string_view title;
   std::string_view label;
@@ -25,35 +25,36 @@ struct Style {
   std::size_t width = 0;  ///< columns of the screen; 0: lines may have any length
 };
 
-/// As printf would print it; up to 127 bytes.
+/// Formats as printf does, up to 127 bytes.
 [[gnu::format(printf, 1, 2)]] std::string formatted(const char* format, ...);
 
 struct CodePoint {
   char32_t value;
   std::size_t length;  ///< bytes in the text
-  bool wellFormed;     ///< if not, `value` is one byte that starts no well-formed UTF-8
+  bool wellFormed;     ///< if false, `value` is a byte that does not start well-formed UTF-8
 };
 
-/// The code point at the start of `text`, which is not empty and may be any bytes: file names are.
+/// The code point at the start of `text`. Requires a text that is not empty; its bytes, as those of
+/// file names, may be invalid.
 CodePoint firstCodePoint(std::string_view text) noexcept;
 
-/// True for what can end a line or control a terminal: C0, DEL, C1, line and paragraph separators.
+/// True for characters that can end a line or control a terminal: C0, DEL, C1, line and paragraph
+/// separators.
 bool isControl(char32_t value) noexcept;
 
-/// Appends `text` with whatever does not show as itself escaped, so that it cannot control a
-/// terminal: `\n`, `\u{202e}`, or `\x{ff}` for a byte that is not UTF-8.
+/// Appends `text` and escapes invisible characters, so that it cannot control a terminal: `\n`,
+/// `\u{202e}`, or `\x{ff}` for a byte that is not UTF-8.
 void appendEscaped(std::string& out, std::string_view text);
-/// The same in single quotes.
+/// The escaped text in single quotes.
 std::string inQuotes(std::string_view text);
 
-/// Columns that escaped text takes on a terminal, where East Asian characters take two and
-/// combining marks none. Colours take none either.
+/// Columns of escaped text on a terminal: two for East Asian characters, none for combining marks
+/// and colours.
 std::size_t columnsOf(std::string_view text) noexcept;
 
-/// Appends escaped text, which starts in `column`, and breaks it into lines where `width` demands
-/// it (0: never); the lines after the first start in column `indent`. A line feed in `text` is a
-/// space that may become a line break. Text without such spaces is broken between any two
-/// characters.
+/// Appends escaped text, which starts in `column`, in lines of at most `width` columns (0: any
+/// length). Further lines start in column `indent`. A line feed in `text` is a space that may
+/// become a line break; text without them is broken between any two characters.
 void appendWrapped(std::string& out, std::string_view text, std::size_t column, std::size_t indent,
                    std::size_t width);
 

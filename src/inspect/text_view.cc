@@ -18,7 +18,7 @@ std::string cutRemark(std::size_t shown, std::size_t size) {
 
 }  // namespace
 
-// Escapes quotes and backslashes, too, so that no text passes for the view's own words.
+// Also escapes quotes and backslashes, so that no text looks like other output of the view.
 std::string TextView::shown(const String& value) const {
   const std::string_view text = value.view();
   std::string out = "\"";

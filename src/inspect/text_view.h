@@ -12,14 +12,14 @@
 
 namespace ironmoat::inspect {
 
-/// Shows records to people: one line for each field, or more where a value is wider than the
-/// screen. Leaves out empty lists of records, which every payload has.
+/// Shows records to people: a line for each field, or several if a value is wider than the screen.
+/// Omits empty lists of records, which every payload has.
 class TextView {
  public:
-  /// Appends to `out`, which must outlive the view.
+  /// `out`, to which the view appends, must outlive it.
   explicit TextView(std::string& out, const Style& style) : out_(out), style_(style) {}
 
-  /// Appends lines, each with its line end; none for a record without fields.
+  /// Appends complete lines; none for a record without present fields.
   template <Record R>
   void record(const R& record, std::size_t indent) {
     std::size_t width = 0;
@@ -40,7 +40,7 @@ class TextView {
     return false;
   }
 
-  /// Appends a label in `colour`, and from `column` on its value.
+  /// Appends a label in `colour`, then its value, which starts in `column`.
   template <class T>
   void field(std::string_view colour, std::string_view name, std::size_t indent, std::size_t column,
              const T& value) {
@@ -69,7 +69,7 @@ class TextView {
   [[nodiscard]] std::string elements(std::size_t number) const;
   [[nodiscard]] std::string aside(std::string_view remark) const;
   void label(std::string_view colour, std::string_view name, std::size_t indent);
-  /// Ends a line of which `filled` columns are written.
+  /// Ends a line that has `filled` columns.
   void line(std::string_view value, std::size_t filled, std::size_t column);
 
   std::string& out_;

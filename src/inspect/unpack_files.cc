@@ -17,12 +17,12 @@ namespace ironmoat::inspect {
 
 namespace {
 
-// Limits on requests without an outcome: many enough to keep the service busy, and few because the
+// Limits on requests without an outcome: enough to keep the service busy, but few, because the
 // record of a small message can take up to `limits::replyBytes`.
 constexpr std::size_t kMaxAttempts = 16;
 constexpr std::size_t kMaxBytes = std::size_t{32} << 20;
 
-/// Longer than the client's default: a person on a busy machine prefers to wait.
+/// Longer than the client's default, because a person on a busy machine prefers to wait.
 constexpr std::chrono::seconds kDeadline{10};
 
 std::span<const RecordType> typesNamed(const std::string& name) {
@@ -66,7 +66,7 @@ class Run {
     const std::string* file;
     Data bytes;
     std::vector<Attempt> attempts;
-    Outcome outcome;  // if there are no attempts
+    Outcome outcome;  // valid if there are no attempts
   };
 
   void submit(const std::string& file) {
@@ -102,7 +102,7 @@ class Run {
   const std::unique_ptr<Report> report_;
   Client client_;
   MessageReader reader_;
-  std::deque<Message> pending_;  // in the order of the files
+  std::deque<Message> pending_;  // not yet reported, in the order of the files
   std::size_t pendingBytes_ = 0;
   std::size_t finished_ = 0;
   ExitStatus status_ = allUnpacked;

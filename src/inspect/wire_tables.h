@@ -9,8 +9,9 @@
 
 namespace ironmoat::inspect {
 
-/// The name of an output record, and its fields' keys in messages, in label order. This module must
-/// not depend on the one that has the tables of keys, so the build generates the specialisations.
+/// The name of an output record, and its fields' keys in messages, in label order. The build
+/// generates the specialisations, because this module must not depend on the one with the tables of
+/// keys.
 template <class R>
 struct WireTable;
 
