@@ -30,7 +30,7 @@ class Runs:
 def table_of(title, rows, judged=True, unit="ratio"):
     """Prints rows of a name, a value and its limit, which is like "≤ 2", or empty."""
     print(f"| {title} | {unit} | limit |\n|---|---|---|")
-    miss = " **missed**" if judged else " (not compared: other programs used the processors)"
+    miss = " **missed**" if judged else " (not compared: the processors are not independent)"
     for name, ratio, limit in rows:
         holds = True
         if limit:
@@ -48,7 +48,7 @@ def of_one_build(runs):
     alone, echo, service = time("inProcess/threads:1"), time("roundTrip/echo"), time(SERVICE + "1")
     one, two = time("pipelined/service/64"), time("pipelined/two/64/threads:2")
     processors = alone / time("inProcess/threads:2")  # rate of two threads / rate of one
-    # Below 1.8, other programs used the processors, and the two sides waited for each other.
+    # Below 1.8, one processor slows down while the other one works, also client and service.
     table_of("through the service", [
         ("round trip / (echo + unpacking)", service / (echo + alone), "≤ 1.15"),
         ("rejected / accepted, round trip", time("refused") / service, "≤ 2"),
