@@ -1,14 +1,27 @@
 """Messages that attack: `catalogue(size)` yields (group, name, messages), payloads of at most `size`
 bytes. No property-list library would write them."""
 
+import array as arrays
 import struct
 
 HEAD = b"bplist00"
-TRAILER = 32
 
 
 def number(value, size):
     return value.to_bytes(size, "big")
+
+
+def numbers_of(values, size, marker=b""):
+    """The values in `size` bytes each, each behind the marker; of millions in no time."""
+    words = arrays.array("I", values)
+    words.byteswap()
+    columns, step = words.tobytes(), len(marker) + size
+    out = bytearray(len(words) * step)
+    for place, byte in enumerate(marker):
+        out[place::step] = bytes([byte]) * len(words)
+    for place in range(size):
+        out[len(marker) + place::step] = columns[4 - size + place::4]
+    return bytes(out)
 
 
 def head(kind, count):
@@ -24,13 +37,12 @@ def text(value):
 
 
 def array(references, width=3):
-    return head(0xA0, len(references)) + b"".join(number(r, width) for r in references)
+    return head(0xA0, len(references)) + numbers_of(references, width)
 
 
 def dictionary(entries, width=3):
     """Of {key, value} pairs of references."""
-    return (head(0xD0, len(entries)) + b"".join(number(key, width) for key, _ in entries) +
-            b"".join(number(value, width) for _, value in entries))
+    return head(0xD0, len(entries)) + b"".join(numbers_of(half, width) for half in zip(*entries))
 
 
 def repeated(kind, count, reference, width):
@@ -42,15 +54,27 @@ def trailer(offset_size, width, count, root, table):
     return bytes(6) + bytes([offset_size, width]) + struct.pack(">QQQ", count, root, table)
 
 
+class Row:
+    """Objects of one size, one behind the other."""
+
+    def __init__(self, size, content):
+        self.size, self.content = size, content
+
+
+def lists(elements):
+    """A row of lists of one element, with references of 3 bytes."""
+    return Row(4, numbers_of(elements, 3, b"\xa1"))
+
+
 def message(objects, width=3, root=0):
-    body, offsets = bytearray(HEAD), []
+    body, offsets = bytearray(HEAD), arrays.array("I")
     for item in objects:
-        offsets.append(len(body))
-        body += item
+        row = item if isinstance(item, Row) else Row(len(item), item)
+        offsets.extend(range(len(body), len(body) + len(row.content), row.size))
+        body += row.content
     table = len(body)
     size = 1 if table < 1 << 8 else 2 if table < 1 << 16 else 3 if table < 1 << 24 else 4
-    body += b"".join(number(offset, size) for offset in offsets)
-    return bytes(body) + trailer(size, width, len(offsets), root, table)
+    return bytes(body) + numbers_of(offsets, size) + trailer(size, width, len(offsets), root, table)
 
 
 ONE = b"\x10\x01"
@@ -85,8 +109,7 @@ def utf16(content):
 def reference_cycles(size):
     """Arrays, each the only element of its predecessor, the first that of the last."""
     length = (size - OVERHEAD) // 8
-    yield "one cycle of two million arrays", [
-        payload(b"?", array([5]), [array([5 + (i + 1) % length]) for i in range(length)])]
+    yield "one cycle of two million arrays", [payload(b"?", array([5]), [lists([*range(6, 5 + length), 5])])]
 
 
 def wide(entries, key):
@@ -134,7 +157,7 @@ def most_of_everything(size):
                dictionary([(1, 2), (6, 7)] + [(8, 2)] * 290), text(b"P"),
                head(0x40, 2370) + bytes(2370), text(b"?")]
     left = size - OVERHEAD - sum(map(len, objects))
-    return message(objects + [b"\x08"] * (left // 4))
+    return message([*objects, Row(1, b"\x08" * (left // 4))])
 
 
 # --- offsets and counts of the binary format
@@ -147,8 +170,7 @@ def overlapping(size):
     starts = size // 12
     area = HEAD + b"\x5f\x12\x00\x00\xff\xff" * starts
     yield "texts that overlap", [
-        area + b"".join(number(8 + 6 * i, 3) for i in range(starts)) +
-        trailer(3, 1, starts, 0, len(area))]
+        area + numbers_of(range(8, 8 + 6 * starts, 6), 3) + trailer(3, 1, starts, 0, len(area))]
 
 
 def many_objects(size):
@@ -156,28 +178,27 @@ def many_objects(size):
         HEAD + b"\x08" * (size // 2 - 40) + b"\x08" * (size // 2 - 40) +
         trailer(1, 1, size // 2 - 40, 0, 8 + size // 2 - 40)]
     count = (size - OVERHEAD) // 4
-    yield "millions of unreferenced empty arrays", [payload(b"?", ONE, [b"\xa0"] * count)]
+    yield "millions of unreferenced empty arrays", [payload(b"?", ONE, [Row(1, b"\xa0" * count)])]
     yield "one array of millions of elements", [
         payload(b"?", repeated(0xA0, size - OVERHEAD, 2, 1), width=1)]
     yield "one dictionary of millions of entries", [
         payload(b"?", repeated(0xD0, (size - OVERHEAD) // 2, 1, 1), width=1)]
     # Keys in an order that no cache foresees.
-    per = 1 + 4 + 3 + 3 + 3
-    keys = (size - OVERHEAD) // per
+    keys = (size - OVERHEAD) // (1 + 4 + 3 + 3 + 3)
     order = [3 + i * 7_368_787 % keys for i in range(keys)]
+    texts = numbers_of((0x61626364 + i % 7 for i in range(keys)), 4, b"\x54")
     yield "a million keys, shuffled", [
-        message([head(0xD0, keys + 1) + b"".join(number(key, 3) for key in order) + number(1, 3) +
-                 number(2, 3) * (keys + 1), text(b"c"), ONE] +
-                [b"\x54" + number(0x61626364 + i % 7, 4) for i in range(keys)])]
+        message([head(0xD0, keys + 1) + numbers_of(order, 3) + number(1, 3) +
+                 number(2, 3) * (keys + 1), text(b"c"), ONE, Row(5, texts)])]
 
 
 def nesting(size):
-    lists = (size - OVERHEAD) // 8
+    count = (size - OVERHEAD) // 8
     yield "two million nested arrays, outermost first or last", [
-        payload(b"?", array([5]), [array([6 + i]) for i in range(lists - 1)] + [b"\xa0"]),
-        message([b"\xa0"] + [array([i]) for i in range(lists - 1)] +
-                [dictionary([(lists + 1, lists + 2), (lists + 3, lists - 1)]), text(b"c"), ONE,
-                 text(b"?")], root=lists)]
+        payload(b"?", array([5]), [lists(range(6, 5 + count)), b"\xa0"]),
+        message([b"\xa0", lists(range(count - 1)),
+                 dictionary([(count + 1, count + 2), (count + 3, count - 1)]), text(b"c"), ONE,
+                 text(b"?")], root=count)]
     yield "XML: megabytes of unclosed arrays or dictionaries", [
         filled(size, b"<array>", b"<plist>"), filled(size, b"<dict><key/>", b"<plist>")]
 
@@ -187,7 +208,7 @@ def tiny_records(size):
         count = min(most, (size - OVERHEAD) // 50)
         yield what + ", binary", [
             payload(b"mml", array(range(5, 5 + count)),
-                    [b"\xd1" + number(1, 3) + number(2, 3)] * count)]
+                    [Row(7, (b"\xd1" + number(1, 3) + number(2, 3)) * count)])]
     yield "a million relay records", [
         payload(b"qplr", repeated(0xA0, min(size // 2, 1_100_000), 5, 3), [b"\xd0"])]
     one = b"<dict><key>c</key><integer>1</integer></dict>"
@@ -205,7 +226,7 @@ def texts(size):
         utf16(xml_payload(b"u", b"<string>" + "中".encode() * ((size - OVERHEAD) // 2)
                           + b"</string>"))]
     yield "millions of texts of one UTF-16 unit", [
-        payload(b"?", ONE, [b"\x61\x4e\x2d"] * ((size - OVERHEAD) // 6))]
+        payload(b"?", ONE, [Row(3, b"\x61\x4e\x2d" * ((size - OVERHEAD) // 6))])]
     yield "NUL bytes", [
         bytes(size), HEAD + bytes(size - 8), b"<plist>" + bytes(size // 2),
         payload(b"u", text(bytes(size // 2)))]
