@@ -107,16 +107,6 @@ TEST(TextView, CutsAndWrapsLongValues) {
                              "... the first 32 of 33 bytes\n");
 }
 
-TEST(TextView, ColoursLabelsAndEscapesQuotes) {
-  Whole whole;
-  whole.text = String("\x1B[31m\" (4 bytes)\\");
-  whole.bytes = Data("x");
-  EXPECT_EQ(view(whole, {.colours = Colours::muted()}),
-            "  \033[36mcommand\033[0m  0\n"
-            "  \033[36mtext\033[0m     \"\\u{1b}[31m\\\" (4 bytes)\\\\\"\n"
-            "  \033[36mbytes\033[0m    78 \033[2m(1 byte)\033[0m\n");
-}
-
 TEST(Text, IsEscapedWhenItWouldControlATerminal) {
   const struct {
     std::string_view text;
