@@ -52,7 +52,8 @@ Outcome unpack(const Data& message) {
 /// The slow decoder's record as text, or its rejection; sets `left` to the rest of the budget.
 template <class Wire>
 Outcome decode(const plist::Document& document, plist::Budget& left) {
-  plist::Decoding decoding{.document = document, .budget = left};
+  UnknownKeysArguments unknown;
+  plist::Decoding decoding{.document = document, .budget = left, .unknownKeys = &unknown};
   Wire record;
   const bool accepted = record.decode(plist::Decoder(decoding));
   left = decoding.budget;

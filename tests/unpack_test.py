@@ -303,10 +303,27 @@ $""")
         names = [f"\x1b[31m{name}\n" for name in ("good", "bad", "missing")]
         self.write(names[0], binary({"c": 5, "qai": nasty, "\x1b[2J": 1}))
         self.write(names[1], xml({"c": "no"}))
-        output = unpack(*names, stderr=subprocess.STDOUT).stdout.decode()
+        output = unpack("--strict", *names, stderr=subprocess.STDOUT).stdout.decode()
         self.assertNotRegex(output, "[\x00-\x09\x0b-\x1f\x7f-\x9f\u202e]")
-        self.assertEqual(len(output.splitlines()), 8)
+        self.assertEqual(len(output.splitlines()), 12)
         self.assertLess(max(map(len, output.splitlines())), 600)
+
+    def test_lists_unknown_keys_and_exits_with_3_when_strict(self):
+        self.write("extra", xml({"c": 5, "C": 6, "\x7f\u202e": {"c": 7}}))
+        self.write("inner", binary({"c": 5, "mml": [{"c": 1}, {"c": 2, "h": {"x y": 3}}]}))
+        record = "extra\n  command  5\n"
+        self.expect(unpack("extra"), 0, record + "  (2 unknown keys; --strict lists them)\n")
+        self.expect(unpack("--strict", "extra"), 3, record + "  unknown keys\n    count  2\n"
+                    '    paths  (2 elements)\n      [0] "C"\n      [1] "\\u{7f}\\u{202e}"\n')
+        line, = lines("--type=payload", "inner")
+        self.assertEqual(line["unknownKeys"], {"count": 1, "paths": ["mml[1].h.x y"]})
+        for files, status in ((["good"], 0), (["extra", "bad"], 1), (["extra", "missing"], 2)):
+            self.assertEqual(unpack("--strict", "--quiet", *files).returncode, status)
+        summary, = lines("--strict", "--summary", "extra", "good", "bad")
+        self.assertEqual((summary["accepted"], summary["withUnknownKeys"]), (2, 1))
+        self.write("many", binary({"c": 5} | {f"{i:03}" + "é" * 200: 0 for i in range(500)}))
+        self.assertEqual(lines("many")[0]["unknownKeys"],
+                         {"count": 500, "paths": [f"{i:03}" + "é" * 126 for i in range(100)]})
 
     def on_terminal(self, *arguments, columns=80, **environment):
         """Standard output and standard error as a terminal gets them."""

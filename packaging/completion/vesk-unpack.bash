@@ -19,7 +19,7 @@ _vesk_unpack() {
     --format) mapfile -t COMPREPLY < <(compgen -W 'text json' -- "$word") ;;
     *)
       if [[ $word == -* && $option != files ]]; then
-        mapfile -t COMPREPLY < <(compgen -W '--type --format --exact-integers --recursive --files-from
+        mapfile -t COMPREPLY < <(compgen -W '--type --format --exact-integers --strict --recursive --files-from
           --summary --quiet --schema --service --self-test --help --version' -- "$word")
       else
         compopt -o filenames 2>/dev/null

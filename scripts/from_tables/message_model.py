@@ -63,11 +63,16 @@ class Model:
                           for record in self.tables["outputRecords"]}
 
     def outcome(self, kind, message):
-        """The outcome of a message: {"record": ...} or {"error": {"kind": ..., "path": ...}}."""
+        """The outcome of a message: {"record": ...}, with "unknownKeys" if it has any, or
+        {"error": {"kind": ..., "path": ...}}."""
+        self.unknown = []
         try:
-            return {"record": self.record(*RECORDS[kind], message, "")}
+            outcome = {"record": self.record(*RECORDS[kind], message, "")}
         except Refusal as refusal:
             return {"error": dict(zip(("kind", "path"), refusal.args))}
+        if self.unknown:
+            outcome["unknownKeys"] = {"count": len(self.unknown), "paths": self.unknown[:100]}
+        return outcome
 
     def record(self, wire, output, value, path):
         """The output record: the n-th argument has the n-th field's value and name."""
@@ -75,6 +80,9 @@ class Model:
             raise Refusal("typeMismatch", path)
         fields, arguments = self.fields[wire], self.arguments[output]
         assert len(fields) == len(arguments)
+        known = {field["key"] for field in fields}
+        self.unknown += [(f"{path}." if path else "") + key.encode()[:255].decode(errors="ignore")
+                         for key in value if key not in known]
         shown = {}
         for field, argument in zip(fields, arguments):
             name, key = field["name"], field["key"]
@@ -96,9 +104,10 @@ class Model:
             raise Refusal("typeMismatch", path)
         if kind is list:
             wire, output = wire[len(LIST_OF):], output[len(LIST_OF):]
-            shown = []
+            shown, unknown = [], len(self.unknown)
             for index, element in enumerate(value):
-                again = index > 0 and element is value[index - 1]  # saves time for long lists
+                again = (index > 0 and element is value[index - 1]  # saves time for long lists
+                         and len(self.unknown) == unknown)
                 shown.append(shown[-1] if again else
                              self.value(wire, output, element, f"{path}[{index}]"))
             return shown
@@ -111,7 +120,7 @@ class Model:
 def shown(line):
     """The outcome in a line of vesk-unpack."""
     if "error" not in line:
-        return {"record": line["record"]}
+        return {name: line[name] for name in ("record", "unknownKeys") if name in line}
     if not line["error"]["message"]:
         raise AssertionError("an error without a message")
     return {"error": {name: line["error"][name] for name in ("kind", "path")}}

@@ -85,7 +85,7 @@ class Vectors:
             "command-response/no-field.plist":
                 b"<plist><dict><key>?</key><array><date>2024-13-32T24:60:61Z</date><integer>-0x1"
                 b"0000000000000000</integer></array><key>c</key><integer>96</integer></dict></plist>"
-        }, {"record": {"command": 96}}))
+        }, {"record": {"command": 96}, "unknownKeys": {"count": 1, "paths": ["?"]}}))
         chain = {"c": 0, "Dc": {"c": 7}, "h": {"ri": "innermost"}}
         for depth in range(1, 20):
             chain = {"c": depth, "dtl" if depth % 2 else "mml": [chain]}

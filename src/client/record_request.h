@@ -19,8 +19,8 @@ class RecordRequest final : public Request {
   using Completion = std::function<void(Outcome<R>)>;
 
   RecordRequest(Counters& counters, const Data& message, Clock::duration deadline,
-                Completion completion = {})
-      : Request(counters, R::schemaName, message, deadline), completion_(std::move(completion)) {}
+                Completion completion = {}, std::string_view outputType = R::schemaName)
+      : Request(counters, outputType, message, deadline), completion_(std::move(completion)) {}
   ~RecordRequest() override { release(); }
 
   /// The outcome, once; requires that there is one.

@@ -7,6 +7,7 @@
 #include "ironmoat/command_response.h"
 #include "ironmoat/user_payload.h"
 #include "ironmoat/web_tunnel_response.h"
+#include "values/unknown_keys.h"
 
 namespace ironmoat::frames {
 
@@ -34,5 +35,6 @@ R decodeRecord(const Data& body, std::size_t* memory) {
 IRONMOAT_CODEC_OF(VeskCommandResponse);
 IRONMOAT_CODEC_OF(VeskCommandWebTunnelResponse);
 IRONMOAT_CODEC_OF(DrelUserPayload);
+IRONMOAT_CODEC_OF(UnknownKeys);
 
 }  // namespace ironmoat::frames

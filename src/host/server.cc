@@ -24,8 +24,8 @@ IronmoatServer& IronmoatServer::service() {
   return server;
 }
 
-void IronmoatServer::add(std::string_view outputType, Handler handler) {
-  registrations_.push_back({outputType, std::move(handler)});
+void IronmoatServer::add(std::string outputType, Handler handler) {
+  registrations_.push_back({std::move(outputType), std::move(handler)});
 }
 
 void IronmoatServer::answer(const Data& request, BlockBuilder& reply) const {

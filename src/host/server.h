@@ -3,7 +3,7 @@
 #include <concepts>
 #include <cstdint>
 #include <functional>
-#include <string_view>
+#include <string>
 #include <utility>
 #include <vector>
 
@@ -11,6 +11,7 @@
 #include "host/message_unpacker.h"
 #include "ironmoat/values.h"
 #include "values/block_builder.h"
+#include "values/unknown_keys.h"
 
 namespace ironmoat {
 
@@ -33,13 +34,19 @@ class IronmoatServer {
   IronmoatServer& operator=(const IronmoatServer&) = delete;
   virtual ~IronmoatServer() = default;
 
-  /// Binds an output type to its unpacker. Must be called before `run`, once for each type.
+  /// Binds an output type to its unpacker, and to the unpacker's `unknownKeys`, if it has them, the
+  /// output type that asks for them. Must be called before `run`, once for each type.
   template <MessageSchema Output, MessageUnpacker Unpacker>
   requires std::same_as<typename Unpacker::MessageSchemaType, Output>
   void registerUnpacker(Unpacker unpacker) {
-    add(Output::schemaName, [unpacker](const Data& message, BlockBuilder& reply) {
+    add(std::string(Output::schemaName), [unpacker](const Data& message, BlockBuilder& reply) {
       frames::encodeRecord(unpacker.unpack(message), reply);
     });
+    if constexpr (requires(const Data& message) { unpacker.unknownKeys(message); }) {
+      add(unknownKeysOf(Output::schemaName), [unpacker](const Data& message, BlockBuilder& reply) {
+        frames::encodeRecord(unpacker.unknownKeys(message), reply);
+      });
+    }
   }
 
   /// Sandboxes the process for good, then serves on the calling thread until the end of input.
@@ -58,10 +65,10 @@ class IronmoatServer {
   /// Unpacks the message and appends the record. Throws what the unpacker does.
   using Handler = std::function<void(const Data& message, BlockBuilder& reply)>;
   struct Registration {
-    std::string_view outputType;
+    std::string outputType;
     Handler handler;
   };
-  void add(std::string_view outputType, Handler handler);
+  void add(std::string outputType, Handler handler);
   /// As `serve`, but throws std::bad_alloc if memory runs out and leaves `reply` as it was.
   void answer(const Data& request, BlockBuilder& reply) const;
 

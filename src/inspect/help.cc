@@ -22,6 +22,8 @@ record, or why and where the service rejected the message. Without FILE, or for
                      {"file": F, "error": {"kind": K, "path": P, "message": M}}
   --exact-integers   in JSON, write the integers of records as strings, for
                      programs that would round them to 53 bits
+  --strict           list unknown keys, which no field has, instead of only
+                     counting them, and let them set the exit status
   --recursive, -r    read all regular files in each FILE that is a folder
   --files-from LIST  read the files that LIST names, too, one a line, or
                      NUL-separated; LIST may be - for standard input
@@ -43,7 +45,8 @@ not be read).
 
 Exit status: 0 if the service accepted all messages; 1 if it rejected or failed
 on one, or its sandbox is incomplete; 2 for wrong usage, a FILE that could not
-be read, no service, or output that could not be written.
+be read, no service, or output that could not be written; otherwise, with
+--strict, 3 if a message has unknown keys.
 )";
 }
 

@@ -34,6 +34,7 @@ class JsonReport : public Report {
       json.name("record");
       std::visit([&](const auto& record) { JsonWriter(line, options_.integers).value(record); },
                  *outcome.record);
+      if (outcome.unknownKeys) json.member("unknownKeys", *outcome.unknownKeys);
     }
     json.close('}');
     terminal_.print(line += '\n');

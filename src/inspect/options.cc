@@ -54,6 +54,7 @@ constexpr KnownOption kKnown[] = {
      [](Options& o, Value v) { o.type = typeNamed(v, " auto"), o.typeGiven = true; }},
     {"format", 0, true, [](Options& o, Value v) { o.format = formatNamed(v); }},
     {"exact-integers", 0, false, [](Options& o, Value) { o.integers = Integers::strings; }},
+    {"strict", 0, false, [](Options& o, Value) { o.strict = true; }},
     {"recursive", 'r', false, [](Options& o, Value) { o.recursive = true; }},
     {"files-from", 0, true, [](Options& o, Value v) { o.filesFrom = v; }},
     {"summary", 0, false, [](Options& o, Value) { setOutput(o, Output::summary); }},

@@ -30,6 +30,7 @@ struct Options {
   Output output = Output::each;
   std::string service;  ///< empty: serviceProgram()
   bool recursive = false;
+  bool strict = false;             ///< unknown keys are listed, and set the exit status
   std::string filesFrom;           ///< file with a list of further files; may be `-`; empty: none
   std::vector<std::string> files;  ///< `-` for standard input if the command line names none
 };

@@ -19,6 +19,7 @@ std::string parsed(const std::vector<const char*>& arguments) {
     if (options.format == Format::json) out += " json";
     if (options.integers == Integers::strings) out += " exact";
     out += kOutputs[static_cast<int>(options.output)];
+    if (options.strict) out += " strict";
     if (options.recursive) out += " recursive";
     if (!options.service.empty()) out += " service " + options.service;
     if (!options.filesFrom.empty()) out += " from " + options.filesFrom;
@@ -38,7 +39,8 @@ TEST(Options, AreParsedOrRejectedWithTheirName) {
       {{"--type=payload", "--", "--type", "-x"}, "payload given [--type] [-x]"},
       {{"-q"}, "payload quiet [-]"},
       {{"-rq", "--quiet", "a"}, "payload quiet recursive [a]"},
-      {{"--recursive", "--files-from=-", "--exact-integers"}, "payload exact recursive from -"},
+      {{"--recursive", "--files-from=-", "--exact-integers", "--strict"},
+       "payload exact strict recursive from -"},
       {{"a", "--files-from", "l"}, "payload from l [a]"},
       {{"--format=json", "--summary", "--format=text"}, "payload summary [-]"},
       {{"--type=auto", "--schema", "payload"}, "auto given schema payload"},

@@ -29,6 +29,11 @@ Failure failureOf(const DecodingError& error) {
   return {nameOf(error.kind()), error.path(), error.what(), error.offset(), someRejected};
 }
 
+Failure failureOf(const ServiceError& error) {
+  const bool noService = error.kind() == ServiceError::Kind::unavailable;
+  return {nameOf(error.kind()), "", error.what(), {}, noService ? cannotWork : someRejected};
+}
+
 Failure failureOf(const std::system_error& error) {
   return {"unreadable", "", error.code().message(), {}, cannotWork};
 }
@@ -50,10 +55,8 @@ Outcome outcomeOf(std::vector<Attempt>& attempts) {
     } catch (const DecodingError& error) {
       outcome.rejections.push_back({attempt.type, failureOf(error)});
     } catch (const ServiceError& error) {
-      const bool noService = error.kind() == ServiceError::Kind::unavailable;
-      const ExitStatus status = noService ? cannotWork : someRejected;
       Outcome failed;
-      failed.failure = {nameOf(error.kind()), "", error.what(), {}, status};
+      failed.failure = failureOf(error);
       return failed;
     }
   }

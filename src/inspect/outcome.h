@@ -9,14 +9,16 @@
 
 #include "inspect/record_types.h"
 #include "ironmoat/errors.h"
+#include "values/unknown_keys.h"
 
 namespace ironmoat::inspect {
 
-/// The tool's exit status; of several, the highest counts.
+/// The tool's exit status; of several, the highest counts, but unknown keys only if no other does.
 enum ExitStatus : int {
   allUnpacked = 0,
   someRejected = 1,  ///< or the service failed on one
   cannotWork = 2,    ///< wrong usage, unreadable file, no service, output not writable
+  unknownKeysFound = 3,
 };
 
 /// The reason why there is no record. `path` and `description` are untrusted, because a compromised
@@ -32,6 +34,7 @@ struct Failure {
 };
 
 Failure failureOf(const DecodingError& error);
+Failure failureOf(const ServiceError& error);
 Failure failureOf(const std::system_error& error);
 
 /// What a message became: a record or a failure.
@@ -42,7 +45,8 @@ struct Outcome {
   };
 
   std::optional<AnyRecord> record;
-  std::vector<std::string_view> types;  ///< of the record, then those that fit equally well
+  std::vector<std::string_view> types;     ///< of the record, then those that fit equally well
+  std::optional<UnknownKeys> unknownKeys;  ///< if there are any and somebody asked
   std::optional<Failure> failure;
   std::vector<Rejection> rejections;  ///< of all types, if their reasons differ
 

@@ -21,6 +21,7 @@ class Summary : public Report {
     } else {
       ++accepted_;
       ++types_[outcome.types.front()];
+      if (outcome.unknownKeys) ++withUnknownKeys_;
     }
   }
 
@@ -51,6 +52,7 @@ class Summary : public Report {
       for (const auto& [type, count] : types_)
         line(count, colours.label, "  as " + std::string(type));
     }
+    if (options_.strict) line(withUnknownKeys_, colours.label, "  with unknown keys");
     for (const auto& [kind, count] : errors_) line(count, colours.error, kind);
     return out;
   }
@@ -64,6 +66,7 @@ class Summary : public Report {
       json.close('}');
     };
     json.open('{').member("messages", messages_).member("accepted", accepted_);
+    if (options_.strict) json.member("withUnknownKeys", withUnknownKeys_);
     if (options_.type == kAutoType) addCounts("types", types_);
     addCounts("errors", errors_);
     json.member("bytes", bytes_).name("seconds");
@@ -75,6 +78,7 @@ class Summary : public Report {
   const std::chrono::steady_clock::time_point start_ = std::chrono::steady_clock::now();
   std::size_t messages_ = 0;
   std::size_t accepted_ = 0;
+  std::size_t withUnknownKeys_ = 0;
   std::size_t bytes_ = 0;
   Counts types_;
   Counts errors_;

@@ -48,6 +48,18 @@ class TextReport : public Report {
     text_ += '\n';
     std::visit([&](const auto& record) { TextView(text_, style).record(record, 2); },
                *outcome.record);
+    if (outcome.unknownKeys) addUnknownKeys(*outcome.unknownKeys, style);
+  }
+
+  void addUnknownKeys(const UnknownKeys& unknown, const Style& style) {
+    if (options_.strict) {
+      text_.append(style.colours.error).append("  unknown keys").append(style.colours.end) += '\n';
+      TextView(text_, style).record(unknown, 4);
+    } else {
+      text_.append(style.colours.aside).append("  (").append(std::to_string(unknown.count));
+      text_.append(unknown.count == 1 ? " unknown key" : " unknown keys");
+      text_.append("; --strict lists them)").append(style.colours.end) += '\n';
+    }
   }
 
   void addFailure(const std::string& file, const Data& message, const Outcome& outcome) {

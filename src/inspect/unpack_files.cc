@@ -11,6 +11,7 @@
 #include "inspect/message_reader.h"
 #include "inspect/report.h"
 #include "inspect/service_program.h"
+#include "inspect/unknown_keys_reader.h"
 #include "ironmoat/client.h"
 
 namespace ironmoat::inspect {
@@ -38,6 +39,11 @@ std::unique_ptr<Report> makeReport(const Options& options, Terminal& terminal) {
   return makeTextReport(options, terminal);
 }
 
+ClientOptions clientOptions(const Options& options) {
+  return {.program = options.service.empty() ? serviceProgram() : options.service,
+          .deadline = kDeadline};
+}
+
 class Run {
  public:
   Run(const Options& options, Terminal& terminal)
@@ -45,8 +51,10 @@ class Run {
         terminal_(terminal),
         types_(typesNamed(options.type)),
         report_(makeReport(options, terminal)),
-        client_({.program = options.service.empty() ? serviceProgram() : options.service,
-                 .deadline = kDeadline}) {}
+        client_(clientOptions(options)),
+        strict_(options.strict),
+        wantsUnknownKeys_(options.strict || options.output == Output::each),
+        unknownKeys_(clientOptions(options)) {}
 
   ExitStatus unpackAll() {
     for (const std::string& file : files_) {
@@ -58,7 +66,7 @@ class Run {
     while (!pending_.empty()) finishOldest();
     if (report_) report_->finish();
     terminal_.finish();
-    return status_;
+    return strict_ && status_ == allUnpacked && foundUnknownKeys_ ? unknownKeysFound : status_;
   }
 
  private:
@@ -90,10 +98,22 @@ class Run {
     pending_.pop_front();
     pendingBytes_ -= message.bytes.size();
     if (!message.attempts.empty()) message.outcome = outcomeOf(message.attempts);
+    if (wantsUnknownKeys_ && message.outcome.record) addUnknownKeys(message);
     status_ = std::max(status_, message.outcome.status());
     if (!report_) return;
     report_->add(*message.file, message.bytes, message.outcome);
     terminal_.showProgress(++finished_, files_.size());
+  }
+
+  void addUnknownKeys(Message& message) {
+    try {
+      message.outcome.unknownKeys = unknownKeys_.read(*message.outcome.record, message.bytes);
+      foundUnknownKeys_ |= message.outcome.unknownKeys.has_value();
+    } catch (const DecodingError& error) {
+      if (strict_) message.outcome.failure = failureOf(error);
+    } catch (const ServiceError& error) {
+      if (strict_) message.outcome.failure = failureOf(error);
+    }
   }
 
   const std::vector<std::string> files_;
@@ -101,6 +121,10 @@ class Run {
   const std::span<const RecordType> types_;
   const std::unique_ptr<Report> report_;
   Client client_;
+  const bool strict_;
+  const bool wantsUnknownKeys_;
+  UnknownKeysReader unknownKeys_;
+  bool foundUnknownKeys_ = false;
   MessageReader reader_;
   std::deque<Message> pending_;  // not yet reported, in the order of the files
   std::size_t pendingBytes_ = 0;

@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "plist/position.h"
+#include "values/utf8.h"
 
 namespace ironmoat::plist {
 
@@ -71,6 +72,15 @@ void Decoder::rejectMissing(const std::string_view& key) const {
     description += "; found a key that differs only in case";
   }
   Decoder(*this, key, node_).reject(DecodingError::Kind::keyNotFound, description);
+}
+
+void Decoder::addUnknownKey(std::string_view key) const {
+  UnknownKeysArguments& found = *decoding_.unknownKeys;
+  ++found.count;  // at most limits::scannedEntries
+  if (found.paths.size() == UnknownKeys::kMaxPaths) return;
+  key = key.substr(0, UnknownKeys::kMaxKeyBytes);
+  key = key.substr(0, validUtf8Prefix(key));
+  found.paths.emplace_back(Decoder(*this, key, node_).path());
 }
 
 void Decoder::rejectLimit(const char* what, std::size_t limit, const char* unit) const {

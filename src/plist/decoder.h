@@ -14,6 +14,7 @@
 #include "ironmoat/sparse_values.h"
 #include "ironmoat/values.h"
 #include "plist/document.h"
+#include "values/unknown_keys.h"
 
 namespace ironmoat::plist {
 
@@ -30,6 +31,7 @@ struct Decoding {
   const Data* message = nullptr;  ///< for the offset of a rejection; null: without an offset
   Budget budget = {};
   std::optional<DecodingError> rejection = {};  ///< set by the decoder that rejects the message
+  UnknownKeysArguments* unknownKeys = nullptr;  ///< collects them; null: nobody asks for them
 };
 
 template <class Keys>
@@ -101,6 +103,12 @@ class Decoder {
   /// Rejects a value that is not of this kind, or not within its budget.
   [[gnu::cold, gnu::noinline]] void rejectScalar(Kind expected) const;
   [[gnu::cold]] void rejectMissing(const std::string_view& key) const;
+
+  [[nodiscard]] bool collectsUnknownKeys() const noexcept {
+    return decoding_.unknownKeys != nullptr;
+  }
+  /// Requires collectsUnknownKeys().
+  [[gnu::cold]] void addUnknownKey(std::string_view key) const;
 
  private:
   bool charge(std::size_t& left, std::size_t amount, const char* what, std::size_t limit,
@@ -181,7 +189,8 @@ template <class T>
 
 /// A dictionary, seen through an enumeration of keys: `Keys::count`, `Keys::at(index)`,
 /// `index()`, `stringValue()`, and `Keys::finder()`, which maps text to a case. The last of several
-/// entries under one key counts. Entries under unknown keys are ignored.
+/// entries under one key counts. Entries under unknown keys are ignored, but for
+/// Decoding::unknownKeys.
 template <class Keys>
 class KeyedDecodingContainer {
  public:
@@ -190,7 +199,10 @@ class KeyedDecodingContainer {
   explicit KeyedDecodingContainer(const Decoder& decoder)
       : decoder_(decoder),
         open_(decoder.expect(Kind::dictionary) && decoder.chargeScanned(decoder.node().count)) {
-    if (open_) findEntries();
+    if (!open_) return;
+    findEntries();
+    if (decoder.collectsUnknownKeys()) [[unlikely]]
+      addUnknownKeys();
   }
 
   /// Whether the value is a dictionary. All other members require it.
@@ -270,6 +282,15 @@ class KeyedDecodingContainer {
       if (!key) continue;
       seen_[key->index() / 64] |= std::uint64_t{1} << (key->index() % 64);
       values_[key->index()] = values[i];
+    }
+  }
+
+  /// A pass of its own, so that the other one costs nothing more.
+  [[gnu::cold, gnu::noinline]] void addUnknownKeys() const {
+    const Document& document = decoder_.document();
+    for (const NodeIndex key : document.keys(decoder_.node())) {
+      const std::string_view text = document.text(document.node(key));
+      if (!Keys::finder()(text)) decoder_.addUnknownKey(text);
     }
   }
 

@@ -16,13 +16,14 @@ class PropertyListDecoder {
  public:
   /// Fills `record`, which must be newly made, by its `decode`. Returns the rejection if there is
   /// one; the record must then not be used. A decoded record holds a reference to the message's
-  /// block.
+  /// block. `unknownKeys` collects the unknown keys unless it is null.
   template <class R>
-  [[nodiscard]] std::optional<DecodingError> decode(const Data& message, R& record) const {
+  [[nodiscard]] std::optional<DecodingError> decode(
+      const Data& message, R& record, UnknownKeysArguments* unknownKeys = nullptr) const {
     Document document;
     std::optional<DecodingError> rejection = read(message, document);
     if (rejection) return rejection;
-    Decoding decoding{.document = document, .message = &message};
+    Decoding decoding{.document = document, .message = &message, .unknownKeys = unknownKeys};
     if (!record.decode(Decoder(decoding))) rejection = std::move(decoding.rejection);
     return rejection;
   }

@@ -14,4 +14,8 @@ VeskCommandResponse VeskCommandResponseUnpacker::unpack(const Data& message) con
   return VeskCommandResponse([&] { return argumentsFrom<VeskCommandResponse>(std::move(wire)); });
 }
 
+UnknownKeys VeskCommandResponseUnpacker::unknownKeys(const Data& message) const {
+  return unknownKeysIn<VeskCommandResponseSchema>(message);
+}
+
 }  // namespace ironmoat

@@ -79,4 +79,8 @@ DrelUserPayload VeskCorvelPayloadUnpacker::unpack(const Data& message) const {
       [&] { return argumentsFrom<DrelUserPayload>(std::move(wire), convertParts(wire)); });
 }
 
+UnknownKeys VeskCorvelPayloadUnpacker::unknownKeys(const Data& message) const {
+  return unknownKeysIn<VeskCorvelProtocolPayload>(message);
+}
+
 }  // namespace ironmoat

@@ -27,4 +27,8 @@ VeskCommandWebTunnelResponse VeskCommandWebTunnelResponseUnpacker::unpack(
   });
 }
 
+UnknownKeys VeskCommandWebTunnelResponseUnpacker::unknownKeys(const Data& message) const {
+  return unknownKeysIn<VeskCommandWebTunnelResponseSchema>(message);
+}
+
 }  // namespace ironmoat
