@@ -12,6 +12,7 @@ Last, N rejected messages must leave no memory behind. --table prints the rows o
 
 import argparse
 import collections
+import concurrent.futures
 import math
 import os
 import resource
@@ -152,11 +153,9 @@ class Run:
                 if not attack:
                     return
                 self.attack(attack)
-        workers = [threading.Thread(target=work) for _ in range(1 if self.options.table else 2)]
-        for worker in workers:
-            worker.start()
-        for worker in workers:
-            worker.join()
+        with concurrent.futures.ThreadPoolExecutor(2) as pool:
+            for worker in [pool.submit(work) for _ in range(1 if self.options.table else 2)]:
+                worker.result()
 
     def pipelined(self, service, messages):
         """Numbers and verdicts, in the order of the replies, of messages sent without waiting."""
