@@ -15,7 +15,7 @@ struct ClientOptions {
   /// was installed with this library. The static library looks where it was configured to be
   /// installed; the shared one first in its own installation, wherever that was moved to, if only
   /// root and this process's user can change what is there.
-  std::string program;
+  std::string program{};
 
   /// How long the service may work on one message, from 1 ms to a day (others become the nearest).
   /// A message that had the process to itself then fails with `timedOut`. One that shared it is
@@ -51,7 +51,7 @@ struct ClientOptions {
   /// Called with the reason when a process is lost, such as "was killed by SIGSEGV", on the thread
   /// that noticed it: for a log. The requests that it had are sent again or fail. Must not throw,
   /// block or use the client.
-  std::function<void(std::string_view)> onProcessLost;
+  std::function<void(std::string_view)> onProcessLost{};
 };
 
 }  // namespace ironmoat
