@@ -1,6 +1,6 @@
-// Round trips to another process that parses one typical message, each from raw bytes to a record
-// that can be read: through this client, and as they are usually written: a forked process that
-// reads protobuf from a pipe, and gRPC over a Unix socket. Neither of these has a sandbox.
+// Measures round trips to another process that parses one typical message, from raw bytes to a
+// record: through this client, and in two usual ways: a forked process that reads protobuf from a
+// pipe, and gRPC over a Unix socket. Neither of these has a sandbox.
 
 #include <benchmark/benchmark.h>
 #include <google/protobuf/arena.h>
@@ -39,7 +39,7 @@ pid_t forked(const Serve& serve) {
   std::_Exit(0);
 }
 
-/// Messages, each after its length, over a pipe for each direction.
+/// Sends and receives messages, each after its length, over a pipe for each direction.
 class Pipe {
  public:
   Pipe() {
@@ -52,7 +52,7 @@ class Pipe {
       std::abort();
     }
   }
-  /// False at the end.
+  /// Returns false at the end of the input.
   bool read(std::string& message) {
     frame_.resize(std::size_t{64} << 10);  // a message of the benchmark is shorter
     const ssize_t count = ::read(ends_[0], frame_.data(), frame_.size());

@@ -13,7 +13,8 @@
 
 namespace ironmoat::inspect {
 
-/// The tool's exit status; of several, the highest counts, but unknown keys only if no other does.
+/// The tool's exit status. Of several, the highest counts, but unknownKeysFound replaces only
+/// allUnpacked.
 enum ExitStatus : int {
   allUnpacked = 0,
   someRejected = 1,  ///< or the service failed on one
@@ -46,7 +47,7 @@ struct Outcome {
 
   std::optional<AnyRecord> record;
   std::vector<std::string_view> types;     ///< of the record, then those that fit equally well
-  std::optional<UnknownKeys> unknownKeys;  ///< if there are any and somebody asked
+  std::optional<UnknownKeys> unknownKeys;  ///< if requested, and there are any
   std::optional<Failure> failure;
   std::vector<Rejection> rejections;  ///< of all types, if their reasons differ
 

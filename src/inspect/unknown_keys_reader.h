@@ -16,8 +16,9 @@ class UnknownKeysReader {
  public:
   explicit UnknownKeysReader(ClientOptions options) : context_(std::move(options)) {}
 
-  /// Those of the message that became `record`, if it has any; at most UnknownKeys::kMaxPaths
-  /// paths. Untrusted like the record. Throws DecodingError, ServiceError and std::bad_alloc.
+  /// The unknown keys of the message that became `record`, with at most UnknownKeys::kMaxPaths
+  /// paths; nothing if it has none. Untrusted like the record. Throws DecodingError, ServiceError
+  /// and std::bad_alloc.
   std::optional<UnknownKeys> read(const AnyRecord& record, const Data& message);
 
  private:
