@@ -28,7 +28,7 @@ std::string inUtf16(std::string_view utf8, bool bigEndian) {
   return bytes;
 }
 
-// The generated messages of model_test.py have the spellings that writers use; these are the
+// The generated messages of fuzz/model.py have the spellings that writers use; these are the
 // others.
 TEST(XmlReader, ReadsUnusualSpellingsInAllEncodings) {
   const struct {

@@ -1,6 +1,6 @@
 """Unpacks many messages in both formats with vesk-unpack; compares each outcome with the model's.
 
-    model_test.py TOOL DUMP_TABLES WRITE_RECORDS PART [--messages N] [--seed S] [--folder FOLDER]
+    model.py TOOL DUMP_TABLES WRITE_RECORDS PART [--messages N] [--seed S] [--folder FOLDER]
 
 PART is a kind of message, generated from the seed; `faults`, each field of each record with each
 wrong kind of value; or `written`, the files of WRITE_RECORDS. By hand, 2000 messages and other
@@ -19,7 +19,7 @@ import sys
 import tempfile
 
 sys.path.append(str(pathlib.Path(__file__).resolve().parents[1] / "scripts/from_tables"))
-from message_generator import Generator, every_fault  # noqa: E402
+from model_messages import Generator, every_fault  # noqa: E402
 from message_model import RECORDS, Model, binary, shown, xml  # noqa: E402
 
 FORMATS = {"binary": plistlib.FMT_BINARY, "xml": plistlib.FMT_XML}
