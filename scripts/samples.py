@@ -1,8 +1,9 @@
 """The samples of a page.
 
     samples.py extract PAGE FOLDER    writes each program (```cpp, ```cmake, ```ini) to a file there
-    samples.py run PAGE FOLDER        runs the commands (```console) there, and compares what they
-                                      print with the page; `...` stands for anything
+    samples.py run PAGE [FOLDER]      runs the commands (```console) there, or in an empty folder, and
+                                      compares what they print with the page; `...` stands for
+                                      anything
 
 A program's name is in its first line; that of a block of CMake is CMakeLists.txt.
 """
@@ -11,6 +12,7 @@ import pathlib
 import re
 import subprocess
 import sys
+import tempfile
 
 
 def blocks(page, *languages):
@@ -46,4 +48,5 @@ def run(page, folder):
 
 
 if __name__ == "__main__":
-    {"extract": extract, "run": run}[sys.argv[1]](sys.argv[2], pathlib.Path(sys.argv[3]))
+    with tempfile.TemporaryDirectory() as empty:
+        {"extract": extract, "run": run}[sys.argv[1]](sys.argv[2], pathlib.Path([*sys.argv, empty][3]))
