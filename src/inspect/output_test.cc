@@ -5,107 +5,13 @@
 #include "inspect/json.h"
 #include "inspect/position.h"
 #include "inspect/terminal_text.h"
-#include "inspect/text_view.h"
-#include "ironmoat/fields.h"
 #include "ironmoat/values.h"
 
 namespace ironmoat::inspect {
 
-// A record with fields of all types.
-
-template <class A>
-struct RecordOf : A {
-  using Arguments = A;
-};
-struct PartArguments {
-  Optional<String> name;
-  Optional<Int> number;
-
-  using Fields = FieldList<PartArguments, &PartArguments::name, &PartArguments::number>;
-};
-struct Whole;
-struct WholeArguments {
-  Int command = 0;
-  Optional<Int64> time;
-  Optional<Bool> flag;
-  Optional<String> text;
-  Optional<Data> bytes;
-  Optional<List<String>> texts;
-  Optional<RecordOf<PartArguments>> part;
-  List<Whole> listOfWholes;  // the longest name: widens the column only when it is shown
-
-  using R = WholeArguments;
-  using Fields = FieldList<R, &R::command, &R::time, &R::flag, &R::text, &R::bytes, &R::texts,
-                           &R::part, &R::listOfWholes>;
-};
-struct Whole : RecordOf<WholeArguments> {};
-
 namespace {
 
 using namespace std::literals;
-
-std::string view(const Whole& whole, const Style& style = {}) {
-  std::string out;
-  TextView(out, style).record(whole, 2);
-  return out;
-}
-
-TEST(TextView, AlignsFieldsAndIndentsNestedFields) {
-  Whole whole;
-  whole.command = 32;
-  whole.time = Int64{9007199254740993};
-  whole.flag = true;
-  whole.bytes = Data("0123456789");
-  whole.texts = List<String>{"one", "two"};
-  whole.part = RecordOf<PartArguments>();
-  whole.part->name = String("n");
-  whole.part->number = -7;
-  whole.listOfWholes.resize(2);
-  whole.listOfWholes[0].part = RecordOf<PartArguments>();
-  whole.listOfWholes[1].texts = List<String>{};
-  EXPECT_EQ(view(whole),
-            "  command       32\n"
-            "  time          9007199254740993\n"
-            "  flag          true\n"
-            "  bytes         30313233 34353637 3839 (10 bytes)\n"
-            "  texts         (2 elements)\n"
-            "    [0] \"one\"\n"
-            "    [1] \"two\"\n"
-            "  part\n"
-            "    name    \"n\"\n"
-            "    number  -7\n"
-            "  listOfWholes  (2 elements)\n"
-            "    [0]\n"
-            "      command  0\n"
-            "      part\n"
-            "        (no fields)\n"
-            "    [1]\n"
-            "      command  0\n"
-            "      texts    (empty list)\n");
-}
-
-TEST(TextView, CutsAndWrapsLongValues) {
-  Whole whole;
-  whole.text = String("0123456789abc\n\xE6\xBC\xA2");
-  whole.bytes = Data(
-      "\x10\xFF\x1F\xA9"
-      "456789");
-  EXPECT_EQ(view(whole, {.width = 24}),
-            "  command  0\n"
-            "  text     \"0123456789ab\n"
-            "           c\\n\xE6\xBC\xA2\"\n"
-            "  bytes    10ff1fa9\n"
-            "           34353637 3839\n"
-            "           (10 bytes)\n");
-  const std::string xs(399, 'x');
-  whole.text = String(xs + "\xC3\xA9" + "y");
-  whole.bytes = Data(std::string(33, 'a'));
-  std::string groups;
-  for (int i = 0; i < 8; ++i) groups += "61616161 ";
-  EXPECT_EQ(view(whole), "  command  0\n  text     \"" + xs +
-                             "\xC3\xA9\" ... the first 401 of 402 bytes\n  bytes    " + groups +
-                             "... the first 32 of 33 bytes\n");
-}
 
 TEST(Text, IsEscapedWhenItWouldControlATerminal) {
   const struct {
