@@ -107,9 +107,12 @@ TEST(Frame, TruncatesTextAndRejectsWhatNoFrameCanHold) {
   EXPECT_THROW(appendRequestHead(out, 1, "n", kMaxRequestBody), FrameError);
   EXPECT_EQ(out.size(), 0U);
   appendRequestHead(out, 1, std::string(255, 'n'), limits::messageBytes);
+  EXPECT_EQ(out.size(), kMaxRequestHead);
+  EXPECT_EQ(out.size() - kLengthBytes + limits::messageBytes, kMaxRequestBody);
   const std::size_t start = beginReply(out, 1, Status::record);
   out.extend(limits::replyBytes);
   endReply(out, start);
+  EXPECT_EQ(out.size() - start - kLengthBytes, kMaxReplyBody);
 }
 
 /// Feeds `stream` in pieces of at most `piece` bytes; returns each body as soon as it is whole.

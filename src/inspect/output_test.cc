@@ -6,6 +6,7 @@
 #include "inspect/position.h"
 #include "inspect/terminal_text.h"
 #include "ironmoat/values.h"
+#include "values/utf8.h"
 
 namespace ironmoat::inspect {
 
@@ -41,6 +42,20 @@ TEST(Text, IsEscapedWhenItWouldControlATerminal) {
     JsonWriter(json).value(row.text);
     EXPECT_EQ(json, '"' + row.json + '"');
   }
+}
+
+TEST(Text, HasTheColumnsAndEscapesOfItsCharacters) {
+  std::uint64_t columns = 0;  // times the character
+  std::uint64_t escaped = 0;
+  for (char32_t c = 0x80; c < 0x110000; ++c) {
+    if (c == 0xD800) c = 0xE000;
+    char bytes[4];
+    const std::string_view text(bytes, writeUtf8(c, bytes));
+    columns += c * columnsOf(text);
+    if (inQuotes(text).size() != text.size() + 2) escaped += c;
+  }
+  EXPECT_EQ(columns, 647955388017U);
+  EXPECT_EQ(escaped, 3766972289U);
 }
 
 TEST(Text, IsWrappedAtLastSpaceThatFits) {
