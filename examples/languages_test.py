@@ -146,7 +146,7 @@ class Language(unittest.TestCase):
     def test_rejects_replies_that_violate_the_protocol(self):
         good = [(RESPONSE, b"\0\x01\0" + bytes(8)), (PAYLOAD, nested_payloads(512)),
                 (RESPONSE, b"\1\5" + REFUSAL[2:] + b"why"), (RESPONSE, b"\3not now")]
-        answers = outcomes_of_bytes(ROOT / "tests/lying_service.py",
+        answers = outcomes_of_bytes(ROOT / "examples/lying_service.py",
                                     good + [lie[1:] for lie in LIES])
         self.assertIn("record", answers.pop(1))
         self.assertEqual(answers[:3], [
