@@ -33,8 +33,8 @@ def provoked(folder):
     yield message("--service", "/nonexistent")
     yield message("--service", "/etc/passwd")
     yield message(preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_NOFILE, (7, 7)))
-    for kind in ("other_limits", "lacks_a_part"):
-        program = folder / kind
+    for start in ("hello smaller", "exit 65"):
+        program = folder / start
         program.symlink_to(FAKE_START)
         yield message("--service", program)
     dying = folder / "dies"

@@ -2,7 +2,7 @@
 are generated from records.json: all test vectors, a service that dies, and one that lies. That in
 Python also repeats the exchange of doc/protocol.md.
 
-    languages_test.py python|go|rust BUILD_FOLDER SERVICE TEST_SERVER
+    languages_test.py python|go|rust BUILD_FOLDER SERVICE TEST_SERVER FAKE_SERVICE
 
 Exits with 77 if there is no compiler.
 """
@@ -26,7 +26,7 @@ import ironmoat  # noqa: E402
 VECTORS = ROOT / "tests/vectors"
 RECORDS = json.loads((ROOT / "doc/records.json").read_text())["records"]
 SANITIZED = 0b10_0000_1010  # the parts of the sandbox that a service built with a sanitizer has
-LANGUAGE, BUILD, SERVICE, TEST_SERVER = sys.argv[1], *map(pathlib.Path, sys.argv[2:5])
+LANGUAGE, BUILD, SERVICE, TEST_SERVER, FAKE_SERVICE = sys.argv[1], *map(pathlib.Path, sys.argv[2:6])
 PROGRAM = BUILD / LANGUAGE / "unpack_messages"
 
 RESPONSE, PAYLOAD = "VeskCommandResponse", "DrelUserPayload"
@@ -146,8 +146,9 @@ class Language(unittest.TestCase):
     def test_rejects_replies_that_violate_the_protocol(self):
         good = [(RESPONSE, b"\0\x01\0" + bytes(8)), (PAYLOAD, nested_payloads(512)),
                 (RESPONSE, b"\1\5" + REFUSAL[2:] + b"why"), (RESPONSE, b"\3not now")]
-        answers = outcomes_of_bytes(ROOT / "examples/lying_service.py",
-                                    good + [lie[1:] for lie in LIES])
+        answers = outcomes_of_bytes(FAKE_SERVICE, [
+            (output_type, b"reply " + body)
+            for output_type, body in good + [lie[1:] for lie in LIES]])
         self.assertIn("record", answers.pop(1))
         self.assertEqual(answers[:3], [
             {"record": {"command": 0}},

@@ -1,6 +1,6 @@
-// A service that does what each message tells it, for tests of the client: it answers, refuses,
-// dies, hangs, lies. A message is a verb and a number; the record that answers it has the number as
-// its `command`. How it starts depends on the name that it is run by.
+// A service that does what each message tells it, for tests of clients: it answers, dies, hangs,
+// lies. A message is a script of steps such as `sleep 20;answer 7`; see `perform`. Its own name is
+// the script of its start, unless it is run as fake_service.
 
 #include <signal.h>
 #include <sys/socket.h>
@@ -36,18 +36,12 @@ void write(std::string_view bytes) {
   }
 }
 
-void write(BlockBuilder& frames) { write({frames.bytes(), frames.size()}); }
-
-[[noreturn]] void hang() {
-  for (;;) ::pause();
-}
-
-void reply(std::uint64_t id, int status, std::string_view body) {
+void reply(std::uint64_t id, char status, std::string_view body) {
   BlockBuilder out;
   const std::size_t start = frames::beginReply(out, id, static_cast<frames::Status>(status));
   out.append(body);
   frames::endReply(out, start);
-  write(out);
+  write({out.bytes(), out.size()});
 }
 
 void answer(std::uint64_t id, Int number) {
@@ -56,6 +50,15 @@ void answer(std::uint64_t id, Int number) {
   BlockBuilder record;
   frames::encodeRecord(VeskCommandResponse::with(std::move(arguments)), record);
   reply(id, 0, {record.bytes(), record.size()});
+}
+
+void greet(std::string_view how) {
+  frames::Hello hello = frames::Hello::ours();
+  if (how != "unsandboxed") hello.sandbox = sandbox::kRequiredParts;
+  if (how == "smaller") hello.recordBytes /= 2;
+  BlockBuilder out;
+  frames::appendHello(out, hello);
+  write({out.bytes(), out.size()});
 }
 
 /// Descriptors, environment and signal state that a service should not have been given.
@@ -75,90 +78,37 @@ Int inheritedThings() {
   return things;
 }
 
-void serve(const frames::Request& request) {
-  static bool takenOver = false;
-  if (takenOver) std::_Exit(66);
+bool lastRequest = false;
 
-  const std::string_view text = request.message.view();
-  const std::size_t space = text.find(' ');
-  const std::string_view verb = text.substr(0, space);
+/// One step of a script. `id` is the one that its answers are to have.
+void perform(std::string_view verb, std::string_view rest, std::uint64_t& id) {
   Int number = 0;
-  if (space != std::string_view::npos) {
-    std::from_chars(text.data() + space + 1, text.data() + text.size(), number);
-  }
-  const std::uint64_t id = request.id;
-  BlockBuilder out;
-  if (verb == "echo") {
-    answer(id, number);
-  } else if (verb == "refuse") {
-    const DecodingError error(DecodingError::Kind::typeMismatch, "a[1].b", "expected data");
-    frames::appendRejection(out, id, error);
-  } else if (verb == "notServed") {
-    frames::appendDescription(out, id, frames::Status::notServed, "nobody unpacks this");
-  } else if (verb == "slow") {  // so many milliseconds
-    std::this_thread::sleep_for(std::chrono::milliseconds(number));
-    answer(id, number);
-  } else if (verb == "inherited") {
-    answer(id, inheritedThings());
-  } else if (verb == "signal") {
-    ::raise(static_cast<int>(number));
-  } else if (verb == "words") {  // on standard error
-    std::fputs("last \x1b\xff\n words of it\n\n", stderr);
-    ::raise(SIGABRT);
-  } else if (verb == "exit") {
-    std::_Exit(static_cast<int>(number));
-  } else if (verb == "takeOver") {  // the next request will be the one to suffer
-    takenOver = true;
-    answer(id, number);
-  } else if (verb == "hang" || verb == "ignore") {
-    hang();
-  } else if (verb == "close") {
-    ::close(STDIN_FILENO);
-    ::close(STDOUT_FILENO);
-    hang();
-  } else if (verb == "stopReading") {  // the client's next write fails
-    ::shutdown(STDIN_FILENO, SHUT_RD);
-    std::this_thread::sleep_for(50ms);
-    ::close(STDIN_FILENO);
-    ::close(STDOUT_FILENO);
-    hang();
-  } else if (verb == "foresee") {  // a reply to what it will be asked next, it thinks
-    answer(id, number);
-    std::this_thread::sleep_for(5ms);
-    answer(id + 1, number + 40);
-  } else if (verb == "twiceOther") {  // the ids of two requests in flight, in the wrong order
-    answer(~id, number);
-  } else if (verb == "nextId") {  // asked for soon, perhaps, but not yet
-    answer(id + 1, number);
-  } else if (verb == "twice") {
-    answer(id, number);
-    answer(id, number);
-  } else if (verb == "absurdLength") {
-    write("\xff\xff\xff\xff....");
-  } else if (verb == "badRecord") {
-    reply(id, 0, "\xff\xff\xff\xff\xff\xff\xff\xff");
-  } else if (verb == "badStatus") {
-    reply(id, 4, "");
-  } else if (verb == "badText") {
-    reply(id, 2, "\xff");
-  } else if (verb == "greetAgain") {
-    frames::appendHello(out, frames::Hello::ours());
-  } else if (verb == "flood") {  // the longest reply that may be announced, and no end after it
-    const std::string plenty(std::size_t{1} << 20, '\xaa');
-    write(std::string_view("\x09\0\0\x09", 4));
-    for (;;) write(plenty);
-  } else if (verb == "drip") {  // a reply of megabytes, a byte at a time
-    write(std::string_view("\0\0\x40\0", 4));
-    for (;;) {
-      write(".");
-      std::this_thread::sleep_for(1ms);
-    }
-  } else if (verb == "unasked") {  // bytes when nothing is owed
-    answer(id, number);
-    write(std::string_view("\x20\0\0\0", 4));
-    hang();
-  }
-  if (out.size() != 0) write(out);
+  std::from_chars(rest.data(), rest.data() + rest.size(), number);
+  if (verb == "answer") answer(id, number);
+  if (verb == "inherited") answer(id, inheritedThings());
+  if (verb == "id") id += static_cast<std::uint64_t>(number);
+  if (verb == "hello") greet(rest);
+  if (verb == "write") write(rest);
+  if (verb == "say") static_cast<void>(!::write(STDERR_FILENO, rest.data(), rest.size()));
+  if (verb == "sleep") std::this_thread::sleep_for(std::chrono::milliseconds(number));
+  if (verb == "exit") std::_Exit(static_cast<int>(number));
+  if (verb == "signal") ::raise(static_cast<int>(number));
+  if (verb == "last") lastRequest = true;  // the next one is fatal
+  if (verb == "stopReading") ::shutdown(STDIN_FILENO, SHUT_RD);
+  if (verb == "close") ::close(STDIN_FILENO), ::close(STDOUT_FILENO);
+  while (verb == "hang") ::pause();
+  const std::string plenty(std::size_t{verb == "flood"} << 20, '\xaa');
+  while (verb == "flood") write(plenty);
+  for (; verb == "drip"; std::this_thread::sleep_for(1ms)) write(".");
+}
+
+/// `reply` is the last step: its status and body are all that follows.
+void perform(std::string_view script, std::uint64_t id) {
+  if (script.starts_with("reply ")) return reply(id, script[6], script.substr(7));
+  const std::string_view step = script.substr(0, script.find(';'));
+  const std::string_view verb = step.substr(0, step.find(' '));
+  perform(verb, step.substr(std::min(verb.size() + 1, step.size())), id);
+  if (step.size() < script.size()) perform(script.substr(step.size() + 1), id);
 }
 
 }  // namespace
@@ -166,26 +116,17 @@ void serve(const frames::Request& request) {
 int main(int, char** arguments) {
   ::alarm(60);  // whatever becomes of the test
   const std::string name = std::filesystem::path(arguments[0]).filename();
-  if (name == "silent") hang();
-  if (name == "leaves") return 5;
-  if (name == "lacks_a_part") return 65;
-  if (name == "late") std::this_thread::sleep_for(50ms);
-  frames::Hello hello = frames::Hello::ours();
-  if (name != "unsandboxed") hello.sandbox = sandbox::kRequiredParts;
-  if (name == "other_limits") hello.recordBytes /= 2;
-  BlockBuilder greeting;
-  frames::appendHello(greeting, hello);
-  if (name == "garbled") greeting.bytes()[4] ^= 1;
-  if (name == "chatty") greeting.push('x');
-  write(greeting);
-  if (name == "leaves_after_hello") return 0;
-
+  perform(name == "fake_service" ? "hello" : name, 0);
   frames::FrameAssembler assembler(frames::kMaxRequestBody, Sharing::oneThread);
   for (;;) {
     const auto room = assembler.room();
     const ssize_t count = ::read(STDIN_FILENO, room.data(), room.size());
     if (count <= 0) return 0;
     assembler.commit(static_cast<std::size_t>(count));
-    while (const auto body = assembler.next()) serve(frames::parseRequest(*body));
+    while (const auto body = assembler.next()) {
+      if (lastRequest) std::_Exit(66);
+      const frames::Request request = frames::parseRequest(*body);
+      perform(request.message.view(), request.id);
+    }
   }
 }

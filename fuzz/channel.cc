@@ -8,7 +8,7 @@
 #include <exception>
 #include <string_view>
 
-#include "support/channel_game.h"
+#include "channel_game.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   constexpr std::string_view kEvents = "00001234444455667788889abcdefghijklmnopqrstuvwxyzABCDEFG";
