@@ -88,6 +88,7 @@ void perform(std::string_view verb, std::string_view rest, std::uint64_t& id) {
   if (verb == "inherited") answer(id, inheritedThings());
   if (verb == "id") id += static_cast<std::uint64_t>(number);
   if (verb == "hello") greet(rest);
+  if (verb == "head") static_cast<void>(::read(0, &id, 4) + ::read(0, &id, sizeof id));
   if (verb == "write") write(rest);
   if (verb == "say") static_cast<void>(!::write(STDERR_FILENO, rest.data(), rest.size()));
   if (verb == "sleep") std::this_thread::sleep_for(std::chrono::milliseconds(number));

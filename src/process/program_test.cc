@@ -13,39 +13,42 @@ namespace {
 namespace fs = std::filesystem;
 
 TEST(TrustedPath, HoldsUnlessOthersCanReplaceTheFile) {
-  constexpr uid_t kOther = 1;
-  struct Row {
-    bool othersFile;
-    mode_t file;
-    bool othersFolder;
-    mode_t folder;
-    bool trusted;
-  };
-  const Row rows[] = {
-      {false, 0755, false, 0755, true},  {false, 0775, false, 0755, false},
-      {false, 0757, false, 0755, false}, {false, 01757, false, 0755, false},
-      {false, 0755, false, 0775, false}, {false, 0755, false, 0757, false},
-      {false, 0755, false, 01777, true}, {true, 0755, false, 0755, false},
-      {true, 0755, false, 01777, false}, {false, 0755, true, 0755, false},
-      {false, 0755, true, 01777, false},
+  const bool isRoot = ::geteuid() == 0;  // only root can try files of others
+  const uid_t self = isRoot ? 1 : ::geteuid();
+  const uid_t other = self + 1;
+  const struct {
+    uid_t owner;
+    mode_t mode;
+    bool fileIsTrusted;  // with this owner and mode
+    bool folderIsTrusted;
+  } rows[] = {
+      {self, 0755, true, true},   {self, 0775, false, false},  {self, 0757, false, false},
+      {self, 01775, false, true}, {self, 01757, false, true},  {0, 0755, true, true},
+      {0, 01777, false, true},    {other, 0755, false, false}, {other, 01777, false, false},
   };
   std::string name = fs::canonical(testing::TempDir()) / "trusted_path.XXXXXX";
-  const fs::path folder = ::mkdtemp(name.data());
-  const fs::path file = folder / "sub" / "file";
-  fs::create_directory(folder / "sub");
+  const fs::path top = ::mkdtemp(name.data());
+  ASSERT_EQ(::chmod(top.c_str(), 0755), 0);
+  const fs::path folder = top / "folder";
+  const fs::path file = folder / "file";
+  fs::create_directory(folder);
   std::ofstream(file).close();
-  for (const Row& row : rows) {
-    if ((row.othersFile || row.othersFolder) && ::geteuid() != 0) continue;
-    if (::geteuid() == 0) {
-      ASSERT_EQ(::chown(file.c_str(), row.othersFile ? kOther : 0, 0), 0);
-      ASSERT_EQ(::chown((folder / "sub").c_str(), row.othersFolder ? kOther : 0, 0), 0);
+  for (const auto& row : rows) {
+    if (row.owner != self && !isRoot) continue;
+    for (const bool isFile : {true, false}) {
+      for (const fs::path& each : {file, folder}) {
+        const bool isMeant = (each == file) == isFile;
+        ASSERT_EQ(::chown(each.c_str(), isMeant ? row.owner : self, ::getegid()), 0);
+        ASSERT_EQ(::chmod(each.c_str(), isMeant ? row.mode : 0755), 0);
+      }
+      ASSERT_EQ(isRoot ? ::seteuid(self) : 0, 0);
+      EXPECT_EQ(isOutOfOthersReach(file), isFile ? row.fileIsTrusted : row.folderIsTrusted)
+          << &row - rows;
+      ASSERT_EQ(isRoot ? ::seteuid(0) : 0, 0);
     }
-    ASSERT_EQ(::chmod(file.c_str(), row.file), 0);
-    ASSERT_EQ(::chmod((folder / "sub").c_str(), row.folder), 0);
-    EXPECT_EQ(isOutOfOthersReach(file), row.trusted) << &row - rows;
   }
-  EXPECT_FALSE(isOutOfOthersReach(folder / "missing"));
-  fs::remove_all(folder);
+  EXPECT_FALSE(isOutOfOthersReach(top / "missing"));
+  fs::remove_all(top);
 }
 
 }  // namespace
