@@ -343,6 +343,33 @@ TEST_F(ClientTest, SubmitWaitsWhileTooManyBytesAreInFlight) {
   EXPECT_EQ(submitted, 5);
 }
 
+TEST_F(ClientTest, HoldsRecordsUpToTheLimit) {
+  Client::Options all = fake();
+  all.maxBytesHeld = 1;
+  Client client(all);
+  for (const bool taken : {true, false}) {
+    auto pending = submitAll(client, "answer 1", 2);
+    pending[1].wait();
+    EXPECT_GT(client.stats().bytesHeld, 1U) << "the only one";
+    EXPECT_EQ(outcome(pending[1]), "out of memory");
+    if (taken) {
+      EXPECT_EQ(outcome(pending[0]), "1");
+    }
+    pending.clear();
+    EXPECT_EQ(client.stats().bytesHeld, 0U);
+  }
+}
+
+TEST_F(ClientTest, ReportsEveryLostProcess) {
+  Client::Options all = fake(100ms);
+  std::vector<std::string> losses;
+  all.onProcessLost = [&](std::string_view why) { losses.emplace_back(why); };
+  Client client(all);
+  for (const char* message : {"exit 3", "hang", "answer 1"}) outcome(client, message);
+  EXPECT_EQ(losses, (std::vector<std::string>{"exited with status 3", "exited with status 3",
+                                              "no reply within 100 ms"}));
+}
+
 TEST_F(ClientTest, CompletesRequestsWhicheverThreadWaits) {
   Client::Options all = fake();
   all.maxBytesInFlight = 3000;
