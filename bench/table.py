@@ -1,9 +1,10 @@
 #!/usr/bin/env python3
-"""table.py UNPACK.json: prints the ratios of one run of unpack_bench as the tables of
+"""table.py UNPACK.json...: prints the ratios of runs of unpack_bench as the tables of
 doc/performance.md.
 
-A ratio divides the medians of two CPU times over the run's repetitions. CPU time varies less than
-wall time on a busy machine.
+The ratio of a run divides the medians of two CPU times over its repetitions. CPU time varies less than
+wall time on a busy machine. A cell holds the median of the runs' ratios; if it has a limit, their
+range, too.
 """
 
 import json
@@ -58,7 +59,13 @@ def human(nanoseconds):
     return f"{nanoseconds:.3g} ns"
 
 
-def rows(found, messages, columns):
+def ratios(runs, message, measured, against):
+    """The ratio of each run, in order of size."""
+    return sorted(median(run[f"{message}/{measured}"]) / median(run[f"{message}/{against}"])
+                  for run in runs)
+
+
+def rows(runs, messages, columns):
     """Prints a row of ratios for each message. Returns how many exceed their limit, and how many have
     one."""
     over = judged = 0
@@ -67,7 +74,8 @@ def rows(found, messages, columns):
     for place, message in enumerate(messages):
         cells = []
         for measured, against, limits in columns.values():
-            ratio = median(found[f"{message}/{measured}"]) / median(found[f"{message}/{against}"])
+            all_runs = ratios(runs, message, measured, against)
+            ratio = statistics.median(all_runs)
             limit = limits and limits[place]
             if not limit:
                 cells.append(f"{ratio:.2f}")
@@ -75,25 +83,26 @@ def rows(found, messages, columns):
             judged += 1
             over += ratio > limit
             mark = " **over**" if ratio > limit else ""
-            cells.append(f"{ratio:.2f} (≤ {limit}){mark}")
+            cells.append(f"{ratio:.2f} ({all_runs[0]:.2f}–{all_runs[-1]:.2f}; ≤ {limit}){mark}")
         print(f"| {message} | " + " | ".join(cells) + " |")
     return over, judged
 
 
 def main():
-    found = times(sys.argv[1])
-    judged = rows(found, MESSAGES, COLUMNS)
+    runs = [times(path) for path in sys.argv[1:]]
+    judged = rows(runs, MESSAGES, COLUMNS)
     print("\nThe streams of 2,048 different messages, then `deep` and `unknown`:\n")
-    judged += rows(found, STREAMS, STREAM_COLUMNS)
+    judged += rows(runs, STREAMS, STREAM_COLUMNS)
 
     kinds = ["binary/unpack", "binary/copy_and_unpack", "xml/unpack", "xml/copy_and_unpack",
              "protobuf_arena", "protobuf_warm_arena", "protobuf", "expat", "pugixml"]
     print("\n| message | bytes: binary, XML, protobuf | " + " | ".join(kinds) + " |")
     print("|---" * (len(kinds) + 2) + "|")
     for message in [*MESSAGES, *STREAMS]:
-        sizes = [int(found[f"{message}/{kind}"][0]["bytes"])
+        sizes = [int(runs[0][f"{message}/{kind}"][0]["bytes"])
                  for kind in ("binary/unpack", "xml/unpack", "protobuf")]
-        cells = [human(median(found[f"{message}/{kind}"])) for kind in kinds]
+        cells = [human(statistics.median(median(run[f"{message}/{kind}"]) for run in runs))
+                 for kind in kinds]
         print(f"| {message} | {', '.join(f'{size:,}' for size in sizes)} | {' | '.join(cells)} |")
     print(f"\n{judged[0] + judged[2]} of the {judged[1] + judged[3]} ratios with a limit exceed it.")
 
