@@ -1,12 +1,10 @@
 // A sandboxed server whose unpacker obeys the message, a verb and an optional number: `hold N`
-// allocates N MiB for a moment, `crash` aborts, `stall` never returns, and `forbidden` makes a
-// forbidden system call. It answers any other message with the message as the token. The command is
-// the number.
+// allocates N MiB, `crash` aborts, `stall` never returns, and `forbidden` makes a forbidden system
+// call. It answers any other message with the message as the token. The command is the number.
 
 #include <unistd.h>
 
 #include <charconv>
-#include <chrono>
 #include <cstdlib>
 #include <memory>
 #include <string_view>
@@ -18,14 +16,6 @@
 namespace {
 
 using namespace ironmoat;
-
-void hold(std::size_t mebibytes) {
-  const auto held = std::make_unique_for_overwrite<volatile char[]>(mebibytes << 20);
-  held[0] = 1;
-  const auto end = std::chrono::steady_clock::now() + std::chrono::milliseconds(2);
-  while (std::chrono::steady_clock::now() < end) {
-  }
-}
 
 struct ObedientUnpacker {
   using MessageSchemaType = VeskCommandResponse;
@@ -39,7 +29,8 @@ struct ObedientUnpacker {
       std::from_chars(number, text.data() + text.size(), arguments.command);
     }
     if (verb == "hold") {
-      hold(static_cast<std::size_t>(arguments.command));
+      const auto mebibytes = static_cast<std::size_t>(arguments.command);
+      std::make_unique_for_overwrite<volatile char[]>(mebibytes << 20)[0] = 1;
     } else if (verb == "crash") {
       std::abort();
     } else if (verb == "stall") {
