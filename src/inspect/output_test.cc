@@ -101,6 +101,7 @@ TEST(Position, IsLineAndColumnOrByteAndShowsBytesThere) {
        "line 1, column 4\n  \xC3\xA9 \xE6\xBC\xA2x\n      ^\n"},
       {"\xEF\xBB\xBFx", 1, "line 1, column 1\n  x\n  ^\n"},
       {"\x1B[2J\xFFz", 5, "line 1, column 6\n  \\u{1b}[2J\\x{ff}z\n                 ^\n"},
+      {"\x80\x80", 1, "line 1, column 1\n  \\x{80}\\x{80}\n        ^\n"},
       {"\xFE\xFF\0\n\xD8\x3D\xDE\x00\0<\0>"sv, 8,
        "line 2, column 2\n  \xF0\x9F\x98\x80<>\n    ^\n"},
       {"\xFE\xFF\0<"sv, 0, "line 1, column 1\n  <\n  ^\n"},
