@@ -13,18 +13,14 @@
 
 #include "ironmoat/event_loop_client.h"
 #include "sandbox_parts/sandbox_parts.h"
-#include "support/client_outcome.h"
+#include "support/clients.h"
 
 namespace ironmoat {
 namespace {
 
 namespace fs = std::filesystem;
-using testing::inWords;
 using testing::optionsFor;
-
-std::string outcome(Client& client, std::string_view message) {
-  return inWords(client.tryUnpack<VeskCommandResponse>(Data(message)));
-}
+using testing::outcome;
 
 /// The outcomes of a good and of a bad message.
 std::string outcomes() {
