@@ -184,7 +184,7 @@ class Run:
         limit = f" in {address_space >> 20} MiB of address space" if address_space else ""
         print(f"the heaviest, {len(asked)} at once{limit}: {dict(counts)}, {peak:.0f} MiB, "
               f"{rest:.0f} MiB idle", flush=True)
-        return counts["without memory"]
+        return counts["notEnoughMemory"]
 
     def rejections_leave_no_memory(self, count):
         """All rejected attacks of 64 KiB, again and again."""
