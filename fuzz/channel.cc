@@ -11,7 +11,7 @@
 #include "channel_game.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  constexpr std::string_view kEvents = "00001234444455667788889abcdefghijklmnopqrstuvwxyzABCDEFG";
+  constexpr std::string_view kEvents = "00001234444455667788889abcdefghijklmnopqrstuvwxyzABCDEFG-";
   constexpr std::size_t kMaxEvents = 300;
   ironmoat::testing::ChannelGame game;
   try {

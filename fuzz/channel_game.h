@@ -26,6 +26,7 @@ namespace ironmoat::testing {
 ///     4          it answers the oldest request          5  it answers with another id
 ///     6          it dies                                7  the front's time passes
 ///     8          the socket takes one byte only         9  the process is let go, if it is idle
+///     -          half a deadline passes
 ///
 /// What can be sent is sent after each event. Events that cannot happen are ignored. Throws
 /// std::logic_error when the channel breaks one of its promises.
@@ -174,6 +175,10 @@ class ChannelGame {
         break;
       case '8':
         send(1);
+        break;
+      case '-':
+        now_ += kDeadline / 2;
+        expire();
         break;
       case '9':
         if (state == State::ready && channel_.empty() && channel_.inFlight() == 0) {

@@ -222,11 +222,11 @@ TEST(ClientAllocation, RequestGetsAnOutcomeWhicheverAllocationFails) {
       {FAKE_SERVICE, "reply \2a reason of more than a few characters"},
       {"/nowhere/that/is/longer/than/a/few/characters", ""},
   };
-  for (const auto& [program, message] : rows) {
+  for (const auto& row : rows) {
     for (const bool waits : {true, false}) {
       const auto act = [&]() -> std::string {
-        Client client(testing::optionsFor(program));
-        const Data data{std::string_view(message)};
+        Client client(testing::optionsFor(row.first));
+        const Data data{std::string_view(row.second)};
         const auto outcome = waits ? client.tryUnpack<VeskCommandResponse>(data)
                                    : client.submit<VeskCommandResponse>(data).outcome();
         if (outcome) return std::to_string(outcome->command);

@@ -220,12 +220,15 @@ TEST_F(ClientTest, IsUnavailableWithoutAUsableService) {
   for (const auto& row : rows) {
     Client client(optionsFor(row.program, 2s));
     const std::string message = "answer 2" + std::string(std::size_t{1} << 20, ' ');
+    const auto start = Clock::now();
     Pending first = submit(client, message);
     for (const std::string& got : {outcome(client, message), outcome(first)}) {
       EXPECT_TRUE(got.starts_with("unavailable: ") || row.outcome.starts_with("the")) << got;
       EXPECT_NE(got.find(row.outcome), std::string::npos) << got;
     }
     EXPECT_LE(client.stats().started, 10U) << row.program;
+    const bool isTriedAgain = row.outcome.find("before its hello") != std::string::npos;
+    EXPECT_TRUE(!isTriedAgain || Clock::now() - start >= 150ms) << "five starts";
   }
 }
 
@@ -337,7 +340,12 @@ TEST_F(ClientTest, SleepsWhileItWaits) {
   loop.submit("sleep 200;answer 1");
   for (int i = 0; i < 5; ++i) loop.submit("answer 1");
   loop.client.dispatch();
+  std::this_thread::sleep_for(30ms);
   loop.submit("answer 1");  // is held back
+  loop.client.dispatch();
+  pollfd ready = {loop.client.fd(), POLLIN, 0};
+  EXPECT_EQ(::poll(&ready, 1, 50), 0);
+  EXPECT_GT(loop.client.timeout(), 1000) << "nothing to do before the slow one has its reply";
   loop.run(8);
   EXPECT_EQ(outcome(client, "sleep 200;answer 1"), "1");
   Pending pending = submit(client, "sleep 200;answer 1");
@@ -393,10 +401,13 @@ TEST_F(ClientTest, CompletesRequestsWhicheverThreadWaits) {
   inThreads(4, [&](int i) {
     auto own = submitAll(*client, "answer 1", 20);
     Pending last = submit(*client, "sleep 20;answer 2");
-    EXPECT_EQ(last.wait_for(i * 1ms), std::future_status::timeout);
+    static_cast<void>(last.wait_for(i * 1ms));
     EXPECT_EQ(outcome(last), "2");
     expectAll(own, "1");
   });
+  const auto accepted = client->stats().accepted;
+  auto unasked = submitAll(*client, "answer 1", 1);
+  while (client->stats().accepted == accepted) std::this_thread::sleep_for(1ms);
   auto waiting = submitAll(*client, "hang", 3);
   {
     std::vector<std::jthread> late;
