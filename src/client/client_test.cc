@@ -276,15 +276,16 @@ TEST_F(ClientTest, ReplacesAProcessThatIsSlowOrSeldomUsed) {
 TEST_F(ClientTest, RunsAsManyProcessesAsAreBusyUpToTheLimit) {
   Client::Options all = fake();
   all.processes = 3;
-  all.idleTime = 300ms;
+  all.idleTime = 500ms;
   Client client(all);
   for (int i = 0; i < 5; ++i) EXPECT_EQ(outcome(client, "answer 1"), "1");
   EXPECT_EQ(client.stats().started, 1U) << "one caller at a time";
   const auto start = Clock::now();
   inThreads(6, [&](int) { EXPECT_EQ(outcome(client, "sleep 50;answer 1"), "1"); });
   EXPECT_GE(Clock::now() - start, 100ms);
+  inThreads(6, [&](int) { EXPECT_EQ(outcome(client, "sleep 5;answer 1"), "1"); });
   EXPECT_EQ(client.stats().started, 3U);
-  std::this_thread::sleep_for(300ms);
+  std::this_thread::sleep_for(500ms);
   for (int i = 0; i < 5; ++i) EXPECT_EQ(outcome(client, "answer 1"), "1");
   EXPECT_EQ(client.stats().started - client.stats().ended, 1U) << "idle ones have been ended";
 }
