@@ -49,6 +49,7 @@ class BinaryReader {
     if (!readTrailer() || !readObjects() || !checkKeys() || !measure())
       return std::move(rejection_);
     document_.root_ = root_;
+    if (side_.size() != 0) side_.reserve(Document::kReadable);
     document_.side_ = side_.finish();
     return std::nullopt;
   }

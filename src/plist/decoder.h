@@ -188,8 +188,8 @@ template <class T>
 }
 
 /// A dictionary, seen through an enumeration of keys: `Keys::count`, `Keys::at(index)`,
-/// `index()`, `stringValue()`, and `Keys::finder()`, which maps text to a case. The last of several
-/// entries under one key counts. Entries under unknown keys are ignored, but for
+/// `index()`, `stringValue()`, and `Keys::finder()`, which maps text to the index of a case. The
+/// last of several entries under one key counts. Entries under unknown keys are ignored, but for
 /// Decoding::unknownKeys.
 template <class Keys>
 class KeyedDecodingContainer {
@@ -263,25 +263,17 @@ class KeyedDecodingContainer {
   }
 
  private:
-  static constexpr std::size_t kAhead = 16;
-
   void findEntries() {
     const Document& document = decoder_.document();
     const Node& dictionary = decoder_.node();
     const auto keys = document.keys(dictionary);
     const auto values = document.values(dictionary);
-    const auto& find = Keys::finder();
+    const auto& index = Keys::finder();
     for (std::size_t i = 0; i < keys.size(); ++i) {
-      // Keys of a large dictionary may lie anywhere in memory. Prefetching avoids two dependent
-      // cache misses for each key.
-      if (keys.size() - i > 2 * kAhead) {
-        __builtin_prefetch(&document.node(keys[i + 2 * kAhead]));
-        __builtin_prefetch(document.text(document.node(keys[i + kAhead])).data());
-      }
-      const std::optional<Keys> key = find(document.text(document.node(keys[i])));
-      if (!key) continue;
-      seen_[key->index() / 64] |= std::uint64_t{1} << (key->index() % 64);
-      values_[key->index()] = values[i];
+      const std::size_t place = index.findReadable(document.text(document.node(keys[i])));
+      if (place >= Keys::count) continue;
+      seen_[place / 64] |= std::uint64_t{1} << (place % 64);
+      values_[place] = values[i];
     }
   }
 
@@ -290,7 +282,7 @@ class KeyedDecodingContainer {
     const Document& document = decoder_.document();
     for (const NodeIndex key : document.keys(decoder_.node())) {
       const std::string_view text = document.text(document.node(key));
-      if (!Keys::finder()(text)) decoder_.addUnknownKey(text);
+      if (Keys::finder().findReadable(text) >= Keys::count) decoder_.addUnknownKey(text);
     }
   }
 

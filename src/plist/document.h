@@ -51,9 +51,12 @@ static_assert(sizeof(Node) == 16);
 ///
 /// Invariants, established by BinaryReader and DocumentBuilder: indices and ranges are in bounds;
 /// keys are strings; strings are valid UTF-8; there is no cycle below the root, and no path through
-/// more than limits::nestedContainers containers. A node may have several parents.
+/// more than limits::nestedContainers containers; kReadable bytes of memory follow the beginning of
+/// each text, be it shorter. A node may have several parents.
 class Document {
  public:
+  static constexpr std::size_t kReadable = 8;
+
   Document() noexcept = default;
   Document(const Document&) = delete;
   Document& operator=(const Document&) = delete;
@@ -71,11 +74,11 @@ class Document {
     return children_.span(dictionary.payload + dictionary.count, dictionary.count);
   }
 
-  /// The bytes of a string or data node; valid as long as the document.
+  /// The bytes of a string or data node; valid as long as the document. kReadable bytes can be
+  /// read from the beginning of any.
   [[nodiscard]] std::string_view text(const Node& node) const noexcept {
     const Block* block = (node.transformed ? side_ : source_).get();
-    return block == nullptr ? std::string_view()
-                            : std::string_view(block->bytes() + node.payload, node.count);
+    return {block == nullptr ? kNothing : block->bytes() + node.payload, node.count};
   }
   /// The same as an owning slice, which outlives the document.
   [[nodiscard]] detail::Slice slice(const Node& node) const noexcept {
@@ -102,6 +105,7 @@ class Document {
 
   Nodes nodes_;
   Children children_;
+  static constexpr char kNothing[kReadable] = {};
   NodeIndex root_ = 0;
   BlockRef source_;
   BlockRef side_;

@@ -54,7 +54,10 @@ class DocumentBuilder {
   void opaque(Kind kind) { add({kind, false, 0, 0, 0}); }
 
   /// Completes the document. Nothing may be added afterwards.
-  void finish() { document_.side_ = side_.finish(); }
+  void finish() {
+    if (side_.size() != 0) side_.reserve(Document::kReadable);
+    document_.side_ = side_.finish();
+  }
 
  private:
   struct Open {

@@ -143,7 +143,10 @@ class CodingKeys {
   /// Keys have no integer form.
   [[nodiscard]] constexpr std::optional<Int> intValue() const { return std::nullopt; }
 
-  static std::optional<CodingKeys> fromStringValue(std::string_view text) { return finder()(text); }
+  static std::optional<CodingKeys> fromStringValue(std::string_view text) {
+    const std::size_t place = finder().find(text);
+    return place == kNoKey ? std::nullopt : std::optional(CodingKeys(place));
+  }
   static std::optional<CodingKeys> fromRawValue(std::string_view text) {
     return fromStringValue(text);
   }
@@ -156,22 +159,10 @@ class CodingKeys {
 
   friend constexpr bool operator==(CodingKeys a, CodingKeys b) { return a.index_ == b.index_; }
 
-  /// Maps text to a case. A short table is scanned in its order; a long one has an index, built on
-  /// first use and only read afterwards. Both give the same answer: keys are distinct.
-  class Finder {
-   public:
-    std::optional<CodingKeys> operator()(std::string_view text) const {
-      const std::size_t place = lookup_.find(text);
-      return place == kNoKey ? std::nullopt : std::optional(CodingKeys(place));
-    }
-
-   private:
-    std::conditional_t<(count <= KeyScan::kLongest), KeyScan, KeyIndex> lookup_{
-        Table<R>::rows.keys};
-  };
-  static const Finder& finder() {
-    static const Finder finder;
-    return finder;
+  /// Maps text to the position of a case. Built on first use and only read afterwards.
+  static const KeyIndex& finder() {
+    static const KeyIndex index(Table<R>::rows.keys);
+    return index;
   }
 
  private:
