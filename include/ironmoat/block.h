@@ -8,6 +8,10 @@
 
 namespace ironmoat {
 
+namespace detail {
+class RecordArena;
+}
+
 /// From which threads a block's references may be taken and given back.
 ///
 /// `oneThread` blocks count without atomic operations: the service marks the blocks of one request
@@ -15,8 +19,8 @@ namespace ironmoat {
 /// Everything handed to a daemon is `anyThread`.
 enum class Sharing : std::uint8_t { anyThread, oneThread };
 
-/// Immutable bytes with a reference count in front; the memory behind every String and Data.
-/// Written once by BlockBuilder, then only read. At most 4 GiB - 1.
+/// Bytes with a reference count in front. Those behind every String and Data are written once by
+/// BlockBuilder, then only read; at most 4 GiB - 1. Others are chunks of a RecordArena.
 class Block {
  public:
   Block(const Block&) = delete;
@@ -28,26 +32,28 @@ class Block {
   [[nodiscard]] std::uint32_t size() const noexcept { return size_; }
   [[nodiscard]] Sharing sharing() const noexcept { return sharing_; }
 
-  void retain() noexcept {
+  void retain(std::uint64_t count = 1) noexcept {
     if (sharing_ == Sharing::oneThread) {
-      references_.store(references_.load(std::memory_order_relaxed) + 1, std::memory_order_relaxed);
+      references_.store(references_.load(std::memory_order_relaxed) + count,
+                        std::memory_order_relaxed);
     } else {
-      references_.fetch_add(1, std::memory_order_relaxed);
+      references_.fetch_add(count, std::memory_order_relaxed);
     }
   }
 
-  void release() noexcept {
+  void release(std::uint64_t count = 1) noexcept {
     if (sharing_ == Sharing::oneThread) {
-      const std::uint64_t left = references_.load(std::memory_order_relaxed) - 1;
+      const std::uint64_t left = references_.load(std::memory_order_relaxed) - count;
       references_.store(left, std::memory_order_relaxed);
       if (left == 0) std::free(this);
-    } else if (references_.fetch_sub(1, std::memory_order_acq_rel) == 1) {
+    } else if (references_.fetch_sub(count, std::memory_order_acq_rel) == count) {
       std::free(this);
     }
   }
 
  private:
   friend class BlockBuilder;
+  friend class detail::RecordArena;
   explicit Block(Sharing sharing) noexcept : sharing_(sharing) {}
 
   std::atomic<std::uint64_t> references_{1};  // 64 bits: no sender can make it wrap

@@ -4,12 +4,12 @@
 #include <bit>
 #include <cstddef>
 #include <cstdint>
-#include <cstdlib>
 #include <cstring>
 #include <memory>
 #include <type_traits>
 #include <utility>
 
+#include "ironmoat/record_memory.h"
 #include "ironmoat/values.h"
 
 namespace ironmoat::detail {
@@ -128,11 +128,20 @@ class SparseValues {
     std::swap(size_, other.size_);
     std::swap(capacity_, other.capacity_);
   }
+  /// Most values are of one block, whose references go back in one step.
   void release() noexcept {
+    Block* const common = size_ == 0 ? nullptr : cells_[0].block();
+    std::uint64_t ofCommon = 0;
     for (std::size_t i = 0; i < size_; ++i) {
-      if (Block* const block = cells_[i].block(); block != nullptr) block->release();
+      Block* const block = cells_[i].block();
+      if (block == common) {
+        ++ofCommon;
+      } else if (block != nullptr) {
+        block->release();
+      }
     }
-    std::free(cells_);
+    if (common != nullptr) common->release(ofCommon);
+    freeArray(cells_);
   }
   IRONMOAT_API void growTo(std::size_t count);
 

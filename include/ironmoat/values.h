@@ -13,6 +13,7 @@
 #include "ironmoat/api.h"
 #include "ironmoat/block.h"
 #include "ironmoat/optional.h"
+#include "ironmoat/record_memory.h"
 
 namespace ironmoat {
 
@@ -24,7 +25,7 @@ using Bool = bool;
 static_assert(sizeof(Int) == 8 && sizeof(Int64) == 8);
 
 template <class T>
-using List = std::vector<T>;
+using List = std::vector<T, detail::ListAllocator<T>>;
 
 namespace detail {
 

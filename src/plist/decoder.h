@@ -14,6 +14,7 @@
 #include "ironmoat/sparse_values.h"
 #include "ironmoat/values.h"
 #include "plist/document.h"
+#include "values/record_arena.h"
 #include "values/unknown_keys.h"
 
 namespace ironmoat::plist {
@@ -32,6 +33,7 @@ struct Decoding {
   Budget budget = {};
   std::optional<DecodingError> rejection = {};  ///< set by the decoder that rejects the message
   UnknownKeysArguments* unknownKeys = nullptr;  ///< collects them; null: nobody asks for them
+  ironmoat::detail::RecordArena arena{document.sharing()};
 };
 
 template <class Keys>
@@ -96,6 +98,13 @@ class Decoder {
     return charge(decoding_.budget.scannedEntries, entries,
                   "size of shared dictionaries exceeds the limit of ", limits::scannedEntries,
                   " entries");
+  }
+
+  /// Reserves memory for `count` values of a sparse record, or elements of a list.
+  template <class Values>
+  void reserve(Values& values, std::size_t count) const {
+    const ironmoat::detail::RecordArena::Scope scope(decoding_.arena);
+    values.reserve(count);
   }
 
   [[gnu::cold]] void rejectMismatch(Kind expected) const;
@@ -179,7 +188,7 @@ template <class T>
   if (!decoder.expect(Kind::array)) return false;
   const Node& array = decoder.node();
   if (!decoder.chargeRecords(array.count, sizeof(T))) return false;
-  list.reserve(array.count);  // proven by the document, paid for by the budget
+  decoder.reserve(list, array.count);  // proven by the document, paid for by the budget
   std::uint32_t index = 0;
   for (const NodeIndex element : decoder.document().elements(array)) {
     if (!decodeInto(Decoder(decoder, index++, element), list.emplace_back())) return false;
@@ -228,15 +237,17 @@ class KeyedDecodingContainer {
                                         *(value = Optional<T>(T{})));
   }
   /// The entry under `key`, which must be one of `kind`, as the value of the sparse field of the
-  /// key's index; requires an entry, and of `values` what SparseValues::append does.
-  [[nodiscard]] bool append(ironmoat::detail::SparseValues& values, Keys key, Kind kind) const {
+  /// key's index; requires an entry, and of `values` what SparseValues::append does. Takes over one
+  /// of `references` if it holds the same block.
+  [[nodiscard]] bool append(ironmoat::detail::SparseValues& values, Keys key, Kind kind,
+                            References& references) const {
     const Document& document = decoder_.document();
     const Node& node = document.node(values_[key.index()]);
     if (node.kind != kind || !decoder_.takeDelivered(node.count)) [[unlikely]] {
       Decoder(decoder_, key.stringValue(), values_[key.index()]).rejectScalar(kind);
       return false;
     }
-    values.append(key.index(), document.cell(node));
+    values.append(key.index(), document.cell(node, references));
     return true;
   }
   /// How many of `keys` have an entry.

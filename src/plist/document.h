@@ -44,6 +44,25 @@ struct Node {
 };
 static_assert(sizeof(Node) == 16);
 
+/// References to a block, taken in one step; the destructor releases those that are left.
+class References {
+ public:
+  References(Block* block, std::size_t count) noexcept : block_(block), left_(count) {
+    if (block_ != nullptr) block_->retain(count);
+  }
+  References(const References&) = delete;
+  References& operator=(const References&) = delete;
+  ~References() {
+    if (block_ != nullptr && left_ > 0) block_->release(left_);
+  }
+  /// Requires one to be left. The caller releases it.
+  void takeOne() noexcept { --left_; }
+
+ private:
+  Block* block_;
+  std::size_t left_;
+};
+
 /// A whole property list as an array of nodes. Each container has a span of child indices; that of
 /// a dictionary has all keys, then all values. Text and data are ranges of two blocks: the source
 /// block (the message) for literal bytes, and the side block for transformed ones (UTF-16,
@@ -74,6 +93,11 @@ class Document {
     return children_.span(dictionary.payload + dictionary.count, dictionary.count);
   }
 
+  /// Which threads may use what is decoded from the document.
+  [[nodiscard]] Sharing sharing() const noexcept {
+    return source_ ? source_->sharing() : Sharing::anyThread;
+  }
+
   /// The bytes of a string or data node; valid as long as the document. kReadable bytes can be
   /// read from the beginning of any.
   [[nodiscard]] std::string_view text(const Node& node) const noexcept {
@@ -85,14 +109,25 @@ class Document {
     return {(node.transformed ? side_ : source_).get(), static_cast<std::uint32_t>(node.payload),
             node.count};
   }
-  /// The same, or the value of an integer or boolean node, for a sparse record.
-  [[nodiscard]] detail::Cell cell(const Node& node) const noexcept {
+  /// As many references to the source block as a record has values, for `cell`.
+  [[nodiscard]] References references(std::size_t count) const noexcept {
+    return {source_.get(), count};
+  }
+  /// The same as `slice`, or the value of an integer or boolean node, for a sparse record. Each
+  /// value of the source block takes over one of `references`, even a number, so that no branch
+  /// depends on what the values are.
+  [[nodiscard]] detail::Cell cell(const Node& node, References& references) const noexcept {
     const bool text = node.kind == Kind::string || node.kind == Kind::data;
-    if (text && node.count == 0) return detail::Cell::emptyText();
-    Block* const block = (node.transformed ? side_ : source_).get();
-    if (text) block->retain();
+    if (text && node.count == 0) [[unlikely]]
+      return detail::Cell::emptyText();
+    if (node.transformed) {
+      side_->retain();
+    } else {
+      references.takeOne();
+    }
     // The offset of a text fits in the lower half; the count of a number is 0.
-    return {text ? block : nullptr, node.payload | std::uint64_t{node.count} << 32};
+    return {(node.transformed ? side_ : source_).get(),
+            node.payload | std::uint64_t{node.count} << 32};
   }
 
  private:

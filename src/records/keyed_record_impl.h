@@ -81,10 +81,11 @@ template <class R>
   if (!container) return false;
   const std::size_t count = container.countOf(sparse);
   if (!decoder.chargeRecords(count, sizeof(ironmoat::detail::Cell))) return false;
-  record.reserve(count);
+  decoder.reserve(record, count);
+  plist::References references = decoder.document().references(count);
   return container.forEach(required, [&](Keys key) {
     const Way& way = ways[key.index()];
-    return way.other == nullptr ? container.append(record, key, way.kind)
+    return way.other == nullptr ? container.append(record, key, way.kind, references)
                                 : way.other(container, record, key);
   });
 }

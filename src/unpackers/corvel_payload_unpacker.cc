@@ -4,6 +4,7 @@
 #include "unpackers/conversion.h"
 #include "unpackers/decode_message.h"
 #include "unpackers/header_block.h"
+#include "values/record_arena.h"
 
 namespace ironmoat {
 
@@ -26,23 +27,28 @@ struct Converted {
                            &R::selfAllocTokenList, &R::pluginAllocations>;
 };
 
-Converted convertParts(VeskCorvelProtocolPayload& wire);
+using detail::RecordArena;
+
+Converted convertParts(VeskCorvelProtocolPayload& wire, RecordArena& arena);
 template <class Wire>
-NothingConverted convertParts(Wire&) {
+NothingConverted convertParts(Wire&, RecordArena&) {
   return {};
 }
 
 /// An absent list and an empty one both give an empty one. The wire list's memory goes back before
 /// the lists around it are converted.
 template <class Output, class Wire>
-List<Output> convertList(Optional<List<Wire>>& wire) {
+List<Output> convertList(Optional<List<Wire>>& wire, RecordArena& arena) {
   List<Output> output;
   if (!wire) return output;
   List<Wire> elements = std::move(*wire);
-  output.reserve(elements.size());
+  {
+    const RecordArena::Scope scope(arena);
+    output.reserve(elements.size());
+  }
   for (Wire& element : elements) {
     output.emplace_back(
-        [&] { return argumentsFrom<Output>(std::move(element), convertParts(element)); });
+        [&] { return argumentsFrom<Output>(std::move(element), convertParts(element, arena)); });
   }
   return output;
 }
@@ -57,16 +63,17 @@ Optional<DrelUserPayloadDeliveryContext> convertDeliveryContext(
 /// Children before parents: every record in a payload, before the arguments of its own initialiser.
 /// Recurses as deep as payloads nest: at most half of limits::nestedContainers, which the reader
 /// has checked.
-Converted convertParts(VeskCorvelProtocolPayload& wire) {
+Converted convertParts(VeskCorvelProtocolPayload& wire, RecordArena& arena) {
   return {
-      .dstIdTokenList = convertList<DrelUserPayload>(wire.dstIdTokenList),
-      .corvelMessageList = convertList<DrelUserPayload>(wire.corvelMessageList),
+      .dstIdTokenList = convertList<DrelUserPayload>(wire.dstIdTokenList, arena),
+      .corvelMessageList = convertList<DrelUserPayload>(wire.corvelMessageList, arena),
       .httpHeaders = convertHeaderBlock(wire.httpHeaders),
       .deliveryContext = convertDeliveryContext(wire.deliveryContext),
-      .pluginRequests = convertList<DrelHoplinePluginRequest>(wire.pluginRequests),
-      .allocationStatuses = convertList<DrelHoplineAllocationStatus>(wire.allocationStatuses),
-      .selfAllocTokenList = convertList<DrelHoplineSelfAllocToken>(wire.selfAllocTokenList),
-      .pluginAllocations = convertList<DrelHoplinePluginAllocation>(wire.pluginAllocations),
+      .pluginRequests = convertList<DrelHoplinePluginRequest>(wire.pluginRequests, arena),
+      .allocationStatuses =
+          convertList<DrelHoplineAllocationStatus>(wire.allocationStatuses, arena),
+      .selfAllocTokenList = convertList<DrelHoplineSelfAllocToken>(wire.selfAllocTokenList, arena),
+      .pluginAllocations = convertList<DrelHoplinePluginAllocation>(wire.pluginAllocations, arena),
   };
 }
 
@@ -75,8 +82,9 @@ Converted convertParts(VeskCorvelProtocolPayload& wire) {
 DrelUserPayload VeskCorvelPayloadUnpacker::unpack(const Data& message) const {
   VeskCorvelProtocolPayload wire;
   decodeMessage(message, wire);
+  RecordArena arena(message.slice().block()->sharing());
   return DrelUserPayload(
-      [&] { return argumentsFrom<DrelUserPayload>(std::move(wire), convertParts(wire)); });
+      [&] { return argumentsFrom<DrelUserPayload>(std::move(wire), convertParts(wire, arena)); });
 }
 
 UnknownKeys VeskCorvelPayloadUnpacker::unknownKeys(const Data& message) const {

@@ -1,8 +1,6 @@
 #include "ironmoat/sparse_values.h"
 
 #include <algorithm>
-#include <cstdlib>
-#include <new>
 #include <utility>
 
 namespace ironmoat::detail {
@@ -16,9 +14,12 @@ void releaseBlockOf(const Cell& cell) noexcept {
 }  // namespace
 
 void SparseValues::growTo(std::size_t count) {
-  void* const memory = std::realloc(static_cast<void*>(cells_), count * sizeof(Cell));
-  if (memory == nullptr) throw std::bad_alloc();
-  cells_ = static_cast<Cell*>(memory);
+  Cell* const cells = static_cast<Cell*>(allocateArray(count * sizeof(Cell)));
+  if (cells_ != nullptr) {
+    std::copy(cells_, cells_ + size_, cells);
+    freeArray(cells_);
+  }
+  cells_ = cells;
   capacity_ = static_cast<std::uint8_t>(count);
 }
 
