@@ -172,7 +172,7 @@ void Channel::lost(const Loss& loss, TimePoint now) noexcept {
     RequestList& to = request.isDone() ? finished_ : retried;
     to.splice(to.end(), suspects, suspects.begin());
     if (request.isDone()) continue;
-    if (request.losses_ < 2) ++request.losses_;
+    request.retried_ = true;
     if (restartClocks) request.due_ = {};
     counters_.add(&Stats::retried);
   }

@@ -328,11 +328,15 @@ TEST_F(ClientTest, DoesNotHoldUpSmallRequestsBehindSlowOrLargeOnes) {
   for (int i = 0; i < 20; ++i) loop.submit("answer 1");
   EXPECT_EQ(loop.run(21)[0], "") << "the slow one is the last";
   EXPECT_EQ(loop.run(22)[0], "1");
+  loop.submit("sleep 400;answer 1");
+  loop.submit("answer 2");
+  EXPECT_EQ(loop.run(23)[23], "2") << "alone behind a slow one";
 }
 
 TEST_F(ClientTest, SleepsWhileItWaits) {
   Client::Options all = fake();
   all.processes = 1;
+  all.idleTime = 0ms;
   Client client(all);
   Loop loop(all);
   loop.submit("answer 0");
@@ -352,6 +356,7 @@ TEST_F(ClientTest, SleepsWhileItWaits) {
   Pending pending = submit(client, "sleep 200;answer 1");
   EXPECT_EQ(outcome(pending), "1");
   EXPECT_LT(std::clock() - before, CLOCKS_PER_SEC / 8);
+  EXPECT_EQ(client.stats().started + loop.client.stats().started, 3U) << "the last stays";
 }
 
 TEST_F(ClientTest, HoldsRecordsUpToTheLimit) {
@@ -487,6 +492,12 @@ TEST_F(ClientTest, CancelsARequestOfALoop) {
   loop.run(4);
   EXPECT_FALSE(cancelledItself);
   EXPECT_EQ(loop.client.stats().cancelled, 1U) << "the other has not been answered yet";
+
+  const auto dying = loop.submit("sleep 20;exit 1");
+  loop.client.dispatch();
+  EXPECT_TRUE(loop.client.cancel(dying));
+  while (loop.client.stats().cancelled == 1) loop.client.dispatch();
+  EXPECT_EQ(loop.client.stats().retried, 0U);
 }
 
 TEST_F(ClientTest, GivesTheServiceNothingOfTheDaemons) {

@@ -57,7 +57,7 @@ class Request {
   [[nodiscard]] const Data& message() const noexcept { return message_; }
   [[nodiscard]] Clock::duration deadline() const noexcept { return deadline_; }
   /// It lost a process and must be alone in the next one.
-  [[nodiscard]] bool isRetried() const noexcept { return losses_ > 0; }
+  [[nodiscard]] bool isRetried() const noexcept { return retried_; }
   [[nodiscard]] bool isCancelled() const noexcept { return cancelled_; }
 
   /// Its outcome is no longer wanted: it will complete without one.
@@ -113,9 +113,9 @@ class Request {
   std::atomic<bool> done_ = false;
 
   // The channel's notes.
-  std::uint64_t id_ = 0;     // in the frames of the current attempt
-  TimePoint due_{};          // when the deadline ends; none while other requests go first
-  std::uint8_t losses_ = 0;  // processes lost while it was in flight, up to 2
+  std::uint64_t id_ = 0;  // in the frames of the current attempt
+  TimePoint due_{};       // when the deadline ends; none while other requests go first
+  bool retried_ = false;
 };
 
 /// Requests in order. Moving them between lists (`splice`) takes no memory, so that a request that
