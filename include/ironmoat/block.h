@@ -6,6 +6,8 @@
 #include <cstdlib>
 #include <utility>
 
+#include "ironmoat/tsan.h"
+
 namespace ironmoat {
 
 namespace detail {
@@ -46,9 +48,12 @@ class Block {
       const std::uint64_t left = references_.load(std::memory_order_relaxed) - count;
       references_.store(left, std::memory_order_relaxed);
       if (left == 0) std::free(this);
-    } else if (references_.fetch_sub(count, std::memory_order_acq_rel) == count) {
-      std::free(this);
+      return;
     }
+    detail::announceRelease(references_);
+    if (references_.fetch_sub(count, std::memory_order_acq_rel) != count) return;
+    detail::announceAcquire(references_);
+    std::free(this);
   }
 
  private:

@@ -26,6 +26,7 @@ class IRONMOAT_API Pending {
  public:
   Pending() noexcept = default;
   Pending(Pending&&) noexcept = default;
+  ~Pending();
   Pending& operator=(Pending&& other) noexcept {
     Pending before = std::move(other);
     request_.swap(before.request_);

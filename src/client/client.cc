@@ -112,6 +112,11 @@ void Client::submit(const Data& message, std::function<void(Outcome<R>)> complet
 Stats Client::stats() const noexcept { return core_->counters.snapshot(); }
 
 template <MessageSchema R>
+Pending<R>::~Pending() {
+  if (request_) request_->announceEnd();
+}
+
+template <MessageSchema R>
 std::future_status Pending<R>::waitUntil(Clock::time_point until) const {
   if (!request_->isDone() && core_->forkMark.isCopy()) {
     request_->fail(ServiceError(ServiceError::Kind::unavailable,

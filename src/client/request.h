@@ -15,6 +15,7 @@
 #include "client/counters.h"
 #include "frames/frame.h"
 #include "ironmoat/errors.h"
+#include "ironmoat/tsan.h"
 #include "ironmoat/values.h"
 
 namespace ironmoat::client {
@@ -50,7 +51,7 @@ class Request {
         inFlight_(std::in_place, counters, message_.size()) {}
   Request(const Request&) = delete;
   Request& operator=(const Request&) = delete;
-  virtual ~Request() = default;
+  virtual ~Request() { detail::announceAcquire(done_); }
 
   /// A record type's schemaName.
   [[nodiscard]] std::string_view outputType() const noexcept { return outputType_; }
@@ -79,13 +80,20 @@ class Request {
   void drop() noexcept { complete(); }
   /// Any thread. The outcome belongs to the thread that has seen this return true. Pairs with the
   /// release in `complete`.
-  [[nodiscard]] bool isDone() const noexcept { return done_.load(std::memory_order_acquire); }
+  [[nodiscard]] bool isDone() const noexcept {
+    if (!done_.load(std::memory_order_acquire)) return false;
+    detail::announceAcquire(done_);
+    return true;
+  }
+  /// Tells ThreadSanitizer that this thread no longer uses the request.
+  void announceEnd() const noexcept { detail::announceRelease(done_); }
   /// `deliver` has a completion to call.
   [[nodiscard]] virtual bool hasCompletion() const noexcept = 0;
   /// Calls the completion, once; until then the request counts as in flight.
   void deliver() noexcept {
     inFlight_.reset();
     callCompletion();
+    announceEnd();
   }
 
  protected:
@@ -101,6 +109,7 @@ class Request {
   void complete() noexcept {
     if (cancelled_) counters_.add(&Stats::cancelled);
     if (!hasCompletion()) inFlight_.reset();
+    detail::announceRelease(done_);
     done_.store(true, std::memory_order_release);
   }
 
@@ -110,7 +119,7 @@ class Request {
   Counters& counters_;
   std::optional<InFlight> inFlight_;
   bool cancelled_ = false;
-  std::atomic<bool> done_ = false;
+  mutable std::atomic<bool> done_ = false;
 
   // The channel's notes.
   std::uint64_t id_ = 0;  // in the frames of the current attempt
