@@ -11,7 +11,6 @@ import (
 	"net"
 	"os"
 	"os/exec"
-	"sync"
 	"syscall"
 	"time"
 )
@@ -19,9 +18,8 @@ import (
 // Sandboxed has the bits of sandbox that a service as it should be has on any kernel.
 const Sandboxed = 0b110_1111_1111
 
-var kinds = []string{
-	"malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound", "rejectedByHost",
-	"notEnoughMemory"}
+var kinds = []string{"malformed", "limitExceeded", "typeMismatch", "outOfRange", "keyNotFound",
+	"rejectedByHost", "notEnoughMemory"}
 
 // A DecodingError says that the message is bad and always will be.
 type DecodingError struct {
@@ -45,62 +43,52 @@ type schema[T any] interface {
 	outputType() string
 }
 
-// Client keeps one service process, which takes one message at a time: goroutines that are to unpack
-// at the same time need a Client each.
+// Client keeps one service process, which takes one message at a time. Not for several goroutines at
+// once: those that are to unpack at the same time need a Client each.
 type Client struct {
-	Program  string        // path of the service
-	Deadline time.Duration // for one message
+	Program   string        // path of the service
+	Deadline  time.Duration // for one message
 	Sandboxed uint32        // bits without which it goes no further
-
-	mutex   sync.Mutex
-	service *service // guarded by mutex
+	service   *service
 }
 
 // Unpack returns the record, or a *DecodingError or *ServiceError.
 func Unpack[T any, P schema[T]](client *Client, message []byte) (*T, error) {
 	var to T
-	refusal, err := client.exchange(P(&to).outputType(), message, func(reply *reader) {
-		to = record[T, P](reply)
-	})
-	if err != nil {
-		return nil, &ServiceError{err.Error()}
-	} else if refusal != nil {
-		return nil, refusal
+	read := func(reply *reader) { to = record[T, P](reply) }
+	if err := client.exchange(P(&to).outputType(), message, read); err != nil {
+		return nil, err
 	}
 	return &to, nil
 }
 
 // Close ends the process; the next message starts another one.
 func (client *Client) Close() {
-	client.mutex.Lock()
-	defer client.mutex.Unlock()
 	if client.service != nil {
 		client.service.kill()
-		client.service = nil
 	}
+	client.service = nil
 }
 
 // exchange tries a second time when the process was an old one: that may have ended for a reason of
 // its own. Alone with a new one the message is at fault.
-func (client *Client) exchange(outputType string, message []byte, read func(*reader)) (
-	refusal error, err error) {
-	client.mutex.Lock()
-	defer client.mutex.Unlock()
+func (client *Client) exchange(outputType string, message []byte, read func(*reader)) error {
+	var refusal, err error
 	for fresh := false; !fresh; {
 		if fresh = client.service == nil; fresh {
-			deadline := time.Now().Add(client.Deadline)
-			if client.service, err = start(client.Program, client.Sandboxed, deadline); err != nil {
-				return nil, err
+			client.service, err = start(client.Program, client.Sandboxed, client.Deadline)
+			if err != nil {
+				break
 			}
 		}
-		refusal, err = client.service.ask(outputType, message, read, time.Now().Add(client.Deadline))
+		client.service.socket.SetDeadline(time.Now().Add(client.Deadline))
+		refusal, err = client.service.ask(outputType, message, read)
 		if err == nil {
-			return refusal, nil
+			return refusal
 		}
-		client.service.kill()
-		client.service = nil
+		client.Close()
 	}
-	return nil, err
+	return &ServiceError{err.Error()}
 }
 
 // service is one process, with at most one request in flight.
@@ -111,14 +99,14 @@ type service struct {
 	hello   struct {
 		Name                                                  [8]byte
 		Version                                               uint16
-		Sandbox                                           uint32
+		Sandbox                                               uint32
 		MessageBytes, RecordBytes, DeliveredBytes, ReplyBytes uint64
 		NestedContainers                                      uint32
 	}
 }
 
 // start relies on Go's threads: they do not end while the program runs, and with them no service.
-func start(program string, sandboxed uint32, deadline time.Time) (*service, error) {
+func start(program string, sandboxed uint32, deadline time.Duration) (*service, error) {
 	pair, err := syscall.Socketpair(syscall.AF_UNIX, syscall.SOCK_STREAM|syscall.SOCK_CLOEXEC, 0)
 	if err != nil {
 		return nil, err
@@ -136,7 +124,7 @@ func start(program string, sandboxed uint32, deadline time.Time) (*service, erro
 		return nil, err
 	}
 	theirs.Close() // so that the end of the process is the end of what can be read
-	s.socket.SetDeadline(deadline)
+	s.socket.SetDeadline(time.Now().Add(deadline))
 	if err = s.greet(sandboxed); err != nil {
 		s.kill()
 		return nil, err
@@ -167,8 +155,7 @@ func (s *service) greet(sandboxed uint32) error {
 
 // ask sends a request and reads its reply. It does not read while it writes: the service has nothing
 // to say before it has read all of the only request. An error says that the service is of no more use.
-func (s *service) ask(outputType string, message []byte, read func(*reader), deadline time.Time) (
-	refusal error, err error) {
+func (s *service) ask(outputType string, message []byte, read func(*reader)) (refusal, err error) {
 	if uint64(len(message)) > s.hello.MessageBytes {
 		message = message[:s.hello.MessageBytes+1] // is rejected as all of it would be
 	}
@@ -176,17 +163,14 @@ func (s *service) ask(outputType string, message []byte, read func(*reader), dea
 	head := binary.LittleEndian.AppendUint32(nil, uint32(9+len(outputType)+len(message)))
 	head = binary.LittleEndian.AppendUint64(head, s.lastID)
 	head = append(append(head, byte(len(outputType))), outputType...)
-	s.socket.SetDeadline(deadline)
-	pieces := net.Buffers{head, message}
-	if _, err = pieces.WriteTo(s.socket); err != nil {
+	if _, err = (&net.Buffers{head, message}).WriteTo(s.socket); err != nil {
 		return
 	}
 	body, err := s.frame(9 + s.hello.ReplyBytes)
 	if err != nil {
 		return
 	}
-	reply := &reader{rest: body, memory: s.hello.RecordBytes, delivered: s.hello.DeliveredBytes,
-		depth: s.hello.NestedContainers}
+	reply := &reader{body, nil, s.hello.RecordBytes, s.hello.DeliveredBytes, s.hello.NestedContainers}
 	if reply.number(8) != s.lastID {
 		reply.fail("a reply to what was not asked")
 	}
@@ -212,9 +196,7 @@ func (r *reader) refusal() error {
 	refusal.Message = r.frameText(uint64(len(r.rest)))
 	if kind >= uint64(len(kinds)) {
 		r.fail("an unknown kind of rejection")
-		return refusal
-	}
-	if refusal.Kind = kinds[kind]; offset != math.MaxUint64 {
+	} else if refusal.Kind = kinds[kind]; offset != math.MaxUint64 {
 		refusal.Offset = &offset
 	}
 	return refusal
