@@ -1,7 +1,7 @@
 #pragma once
 
-/// ThreadSanitizer sees the atomic operations of instrumented code only. In a daemon that is built
-/// with it these tell it what this library synchronises, which need not be.
+/// ThreadSanitizer does not see atomic operations of code that was built without it. If the daemon
+/// was built with it, these functions announce those of this library; otherwise they are null.
 // NOLINTBEGIN(bugprone-reserved-identifier,readability-identifier-naming): the sanitizer's names
 extern "C" void __tsan_acquire(void* at) __attribute__((weak));
 extern "C" void __tsan_release(void* at) __attribute__((weak));
