@@ -67,7 +67,7 @@ TEST(Channel, KeepsItsPromisesInEveryShortGame) {
     std::string_view events;
     int length;
   } spaces[] = {
-      {"a", "0245678A9", 5}, {"ab", "045678AB", 5}, {"abc", "0467AB", 6}, {"abc0", "467C0d", 6}};
+      {"a", "0245678A9", 5}, {"ab", "045678AB", 6}, {"abc", "0467AB", 7}, {"abc0", "467C0d", 6}};
   for (const auto& [start, events, length] : spaces) {
     for (std::size_t game = 0, rest = 0; rest == 0; ++game) {
       std::string all(start);
